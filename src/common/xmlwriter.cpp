@@ -1,0 +1,282 @@
+#include "common/xmlwriter.h"
+
+#include <QDomNamedNodeMap>
+#include <QFile>
+#include <QSaveFile>
+
+#include <algorithm>
+#include <vector>
+
+namespace XmlWriter {
+namespace {
+
+// Characters XML 1.0 cannot carry at all (most C0 controls, lone surrogates)
+// become U+FFFD so that whatever a log held, the file stays well-formed.
+bool IsXmlChar(char32_t c)
+{
+    return c == 0x9 || c == 0xA || c == 0xD || (c >= 0x20 && c <= 0xD7FF)
+        || (c >= 0xE000 && c <= 0xFFFD) || (c >= 0x10000 && c <= 0x10FFFF);
+}
+
+void AppendEscaped(QString &out, const QString &text, bool attribute)
+{
+    const qsizetype n = text.size();
+    for (qsizetype i = 0; i < n; ++i) {
+        const QChar c = text.at(i);
+        if (c.isHighSurrogate() && i + 1 < n && text.at(i + 1).isLowSurrogate()) {
+            out += c;
+            out += text.at(++i);
+            continue;
+        }
+        switch (c.unicode()) {
+        case '&': out += QLatin1String("&amp;"); continue;
+        case '<': out += QLatin1String("&lt;"); continue;
+        case '>': out += QLatin1String("&gt;"); continue;
+        case '"':
+            if (attribute) { out += QLatin1String("&quot;"); continue; }
+            break;
+        case '\n':
+            if (attribute) { out += QLatin1String("&#xa;"); continue; }
+            break;
+        case '\r': out += QLatin1String("&#xd;"); continue;
+        case '\t':
+            if (attribute) { out += QLatin1String("&#x9;"); continue; }
+            break;
+        default:
+            break;
+        }
+        out += IsXmlChar(c.unicode()) && !c.isSurrogate() ? c : QChar(0xFFFD);
+    }
+}
+
+QString Quoted(const QString &value)
+{
+    const QChar quote = value.contains(QLatin1Char('"')) ? QLatin1Char('\'') : QLatin1Char('"');
+    return quote + value + quote;
+}
+
+bool IsTextLike(const QDomNode &node)
+{
+    return !node.isNull() && (node.isText() || node.isCDATASection());
+}
+
+class Writer
+{
+public:
+    explicit Writer(int indent) : m_indent(indent < 0 ? 0 : indent) {}
+
+    void Save(const QDomNode &node, int depth)
+    {
+        switch (node.nodeType()) {
+        case QDomNode::DocumentNode:
+        case QDomNode::DocumentFragmentNode:
+            SaveChildren(node, depth);
+            break;
+        case QDomNode::ElementNode:
+            SaveElement(node.toElement(), depth);
+            break;
+        case QDomNode::TextNode:
+            AppendEscaped(m_out, node.nodeValue(), false);
+            break;
+        case QDomNode::CDATASectionNode: {
+            // "]]>" cannot stand inside a section: split it across two.
+            QString value = node.nodeValue();
+            value.replace(QLatin1String("]]>"), QLatin1String("]]]]><![CDATA[>"));
+            m_out += QLatin1String("<![CDATA[") + value + QLatin1String("]]>");
+            break;
+        }
+        case QDomNode::CommentNode:
+            Indent(node, depth);
+            m_out += QLatin1String("<!--") + node.nodeValue() + QLatin1String("-->");
+            LineEnd(node);
+            break;
+        case QDomNode::ProcessingInstructionNode: {
+            const QDomProcessingInstruction pi = node.toProcessingInstruction();
+            Indent(node, depth);
+            m_out += QLatin1String("<?") + pi.target();
+            if (!pi.data().isEmpty())
+                m_out += QLatin1Char(' ') + pi.data();
+            m_out += QLatin1String("?>");
+            LineEnd(node);
+            break;
+        }
+        case QDomNode::EntityReferenceNode:
+            m_out += QLatin1Char('&') + node.nodeName() + QLatin1Char(';');
+            break;
+        case QDomNode::DocumentTypeNode:
+            SaveDocumentType(node.toDocumentType());
+            break;
+        default:
+            break;
+        }
+    }
+
+    QString Result() const { return m_out; }
+
+private:
+    void SaveChildren(const QDomNode &node, int depth)
+    {
+        for (QDomNode child = node.firstChild(); !child.isNull(); child = child.nextSibling())
+            Save(child, depth);
+    }
+
+    void Indent(const QDomNode &node, int depth)
+    {
+        if (!IsTextLike(node.previousSibling()))
+            m_out += QString(depth * m_indent, QLatin1Char(' '));
+    }
+
+    void LineEnd(const QDomNode &node)
+    {
+        if (!IsTextLike(node.nextSibling()))
+            m_out += QLatin1Char('\n');
+    }
+
+    void SaveElement(const QDomElement &element, int depth)
+    {
+        Indent(element, depth);
+        const QString name = element.tagName();
+        m_out += QLatin1Char('<') + name;
+
+        const QDomNamedNodeMap attributes = element.attributes();
+        std::vector<QDomAttr> sorted;
+        sorted.reserve(static_cast<size_t>(attributes.count()));
+        for (int i = 0; i < attributes.count(); ++i)
+            sorted.push_back(attributes.item(i).toAttr());
+        std::sort(sorted.begin(), sorted.end(), [](const QDomAttr &a, const QDomAttr &b) {
+            return a.name() < b.name();
+        });
+        for (const QDomAttr &attr : sorted) {
+            m_out += QLatin1Char(' ') + attr.name() + QLatin1String("=\"");
+            AppendEscaped(m_out, attr.value(), true);
+            m_out += QLatin1Char('"');
+        }
+
+        if (element.hasChildNodes()) {
+            m_out += QLatin1Char('>');
+            if (!IsTextLike(element.firstChild()))
+                m_out += QLatin1Char('\n');
+            SaveChildren(element, depth + 1);
+            if (!IsTextLike(element.lastChild()))
+                m_out += QString(depth * m_indent, QLatin1Char(' '));
+            m_out += QLatin1String("</") + name + QLatin1Char('>');
+        } else {
+            m_out += QLatin1String("/>");
+        }
+        LineEnd(element);
+    }
+
+    void SaveDocumentType(const QDomDocumentType &type)
+    {
+        m_out += QLatin1String("<!DOCTYPE ") + type.name();
+        if (!type.publicId().isEmpty()) {
+            m_out += QLatin1String(" PUBLIC ") + Quoted(type.publicId());
+            if (!type.systemId().isEmpty())
+                m_out += QLatin1Char(' ') + Quoted(type.systemId());
+        } else if (!type.systemId().isEmpty()) {
+            m_out += QLatin1String(" SYSTEM ") + Quoted(type.systemId());
+        }
+        const QDomNamedNodeMap entities = type.entities();
+        const QDomNamedNodeMap notations = type.notations();
+        if (entities.count() > 0 || notations.count() > 0) {
+            m_out += QLatin1String(" [\n");
+            for (int i = 0; i < entities.count(); ++i)
+                SaveEntity(entities.item(i).toEntity());
+            for (int i = 0; i < notations.count(); ++i)
+                SaveNotation(notations.item(i).toNotation());
+            m_out += QLatin1Char(']');
+        }
+        m_out += QLatin1String(">\n");
+    }
+
+    void SaveEntity(const QDomEntity &entity)
+    {
+        QString name = entity.nodeName();
+        if (name.startsWith(QLatin1Char('%')))
+            name = QLatin1String("% ") + name.mid(1);
+        m_out += QLatin1String("<!ENTITY ") + name + QLatin1Char(' ');
+        if (entity.systemId().isEmpty() && entity.publicId().isEmpty()) {
+            m_out += QLatin1Char('"');
+            AppendEscaped(m_out, entity.nodeValue(), true);
+            m_out += QLatin1Char('"');
+        } else {
+            if (entity.publicId().isEmpty())
+                m_out += QLatin1String("SYSTEM ") + Quoted(entity.systemId());
+            else
+                m_out += QLatin1String("PUBLIC ") + Quoted(entity.publicId()) + QLatin1Char(' ')
+                    + Quoted(entity.systemId());
+            if (!entity.notationName().isEmpty())
+                m_out += QLatin1String(" NDATA ") + entity.notationName();
+        }
+        m_out += QLatin1String(">\n");
+    }
+
+    void SaveNotation(const QDomNotation &notation)
+    {
+        m_out += QLatin1String("<!NOTATION ") + notation.nodeName() + QLatin1Char(' ');
+        if (!notation.publicId().isEmpty()) {
+            m_out += QLatin1String("PUBLIC ") + Quoted(notation.publicId());
+            if (!notation.systemId().isEmpty())
+                m_out += QLatin1Char(' ') + Quoted(notation.systemId());
+        } else {
+            m_out += QLatin1String("SYSTEM ") + Quoted(notation.systemId());
+        }
+        m_out += QLatin1String(">\n");
+    }
+
+    int m_indent;
+    QString m_out;
+};
+
+} // namespace
+
+QString ToString(const QDomNode &node, int indent)
+{
+    Writer writer(indent);
+    writer.Save(node, 0);
+    return writer.Result();
+}
+
+QByteArray Serialize(const QDomNode &node, int indent)
+{
+    return ToString(node, indent).toUtf8();
+}
+
+bool WriteFile(const QString &path, const QByteArray &bytes, bool atomic, QString *error)
+{
+    auto fail = [error](const QString &why) {
+        if (error)
+            *error = why;
+        return false;
+    };
+    if (atomic) {
+        QSaveFile file(path);
+        if (!file.open(QIODevice::WriteOnly))
+            return fail(file.errorString());
+        if (file.write(bytes) != bytes.size()) {
+            const QString why = file.errorString();
+            file.cancelWriting();
+            return fail(why);
+        }
+        if (!file.commit())
+            return fail(file.errorString());
+        return true;
+    }
+    QFile file(path);
+    if (!file.open(QIODevice::WriteOnly | QIODevice::Truncate))
+        return fail(file.errorString());
+    if (file.write(bytes) != bytes.size())
+        return fail(file.errorString());
+    if (!file.flush())
+        return fail(file.errorString());
+    file.close();
+    return true;
+}
+
+bool WriteDocument(const QDomDocument &document, const QString &path, int indent, bool atomic,
+                   QString *error)
+{
+    return WriteFile(path, Serialize(document, indent), atomic, error);
+}
+
+} // namespace XmlWriter

@@ -1,0 +1,32 @@
+#pragma once
+
+#include "common/export.h"
+
+#include <QByteArray>
+#include <QDomDocument>
+#include <QString>
+
+// Serialises DOM documents the same way in every process. Qt keeps
+// attributes in a seeded hash, so QDomDocument::toString orders them
+// differently from run to run; this writer orders attributes by name, indents
+// each level by `indent` blanks and writes exactly the nodes the document
+// holds (no XML declaration unless the document has one).
+namespace XmlWriter {
+
+HARNESS_EXPORT QString ToString(const QDomNode &node, int indent = 1);
+
+// UTF-8 bytes of ToString.
+HARNESS_EXPORT QByteArray Serialize(const QDomNode &node, int indent = 1);
+
+// Writes bytes to path. With atomic set the file is written beside the
+// destination and renamed over it only once complete, so a crash or a full
+// disk never leaves a truncated file. Returns false (and fills error when
+// given) when the file cannot be written; an existing file is then unchanged.
+HARNESS_EXPORT bool WriteFile(const QString &path, const QByteArray &bytes, bool atomic = true,
+                              QString *error = nullptr);
+
+// Serialize(document) written with WriteFile.
+HARNESS_EXPORT bool WriteDocument(const QDomDocument &document, const QString &path,
+                                  int indent = 1, bool atomic = true, QString *error = nullptr);
+
+} // namespace XmlWriter

@@ -1,0 +1,89 @@
+#include "log/log.h"
+
+#include <QDir>
+#include <QRecursiveMutex>
+
+#include <iostream>
+
+namespace {
+
+QRecursiveMutex &LogMutex()
+{
+    static QRecursiveMutex mutex;
+    return mutex;
+}
+
+// Cleared by the first open of any log file in the process.
+bool g_firstOpen = true;
+
+void Echo(bool newLine, unsigned int indent, char mark)
+{
+    if (newLine)
+        std::cout << std::endl << std::string(indent, ' ');
+    std::cout << mark;
+}
+
+} // namespace
+
+Log::Log() = default;
+
+Log::~Log()
+{
+    QMutexLocker locker(&LogMutex());
+    CloseLog();
+}
+
+void Log::SetVerbose(bool verbose)
+{
+    m_verbose = verbose;
+}
+
+void Log::SetLogPath(const QString &path)
+{
+    QMutexLocker locker(&LogMutex());
+    CloseLog();
+    if (path.isEmpty())
+        m_file.setFileName(QDir::currentPath() + QDir::separator() + QLatin1String("log.txt"));
+    else
+        m_file.setFileName(path);
+}
+
+void Log::LogMessage(const QString &message, bool echo)
+{
+    QMutexLocker locker(&LogMutex());
+    OpenLog();
+    if (m_file.isOpen()) {
+        m_file.write(message.toLatin1());
+        CloseLog();
+    }
+    if (m_verbose || echo)
+        std::cout << message.toUtf8().constData() << std::endl;
+}
+
+void Log::EchoDot(bool newLine, unsigned int indent)
+{
+    Echo(newLine, indent, '.');
+}
+
+void Log::EchoDash(bool newLine, unsigned int indent)
+{
+    Echo(newLine, indent, '-');
+}
+
+void Log::OpenLog()
+{
+    if (m_file.isOpen() || m_file.fileName().isEmpty())
+        return;
+    if (g_firstOpen) {
+        g_firstOpen = false;
+        m_file.open(QIODevice::WriteOnly);
+    } else {
+        m_file.open(QIODevice::Append);
+    }
+}
+
+void Log::CloseLog()
+{
+    if (m_file.isOpen())
+        m_file.close();
+}

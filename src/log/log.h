@@ -1,0 +1,45 @@
+#pragma once
+
+#include "common/export.h"
+
+#include <QFile>
+#include <QString>
+
+// The one sink for the library's progress, warning and error messages.
+//
+// Every message is written to a plain text file (Latin-1, one byte per
+// character, nothing added: a message that is to stand on its own line ends
+// in "\n") and, when asked or when verbose, echoed to standard output as
+// UTF-8 followed by a line end. The file is opened, written and closed for
+// each message, under one recursive lock shared by every Log of the process.
+// The first message of the process truncates its file; every later open, by
+// any Log object, appends. No operation reports failure: an unwritable file
+// loses its text, the console echo still happens.
+class HARNESS_EXPORT Log
+{
+public:
+    Log();
+    ~Log();
+    Log(const Log &) = delete;
+    Log &operator=(const Log &) = delete;
+
+    void SetVerbose(bool verbose);
+
+    // A non-empty path names the log file; an empty one "log.txt" in the
+    // current directory. Does not open the file.
+    void SetLogPath(const QString &path);
+
+    void LogMessage(const QString &message, bool echo);
+
+    // Progress characters on the console while waiting for a handset: with
+    // newLine, a line end and `indent` blanks first.
+    void EchoDot(bool newLine, unsigned int indent);
+    void EchoDash(bool newLine, unsigned int indent);
+
+private:
+    void OpenLog();
+    void CloseLog();
+
+    QFile m_file;
+    bool m_verbose = false;
+};

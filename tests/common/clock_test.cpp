@@ -1,0 +1,47 @@
+#include "common/clock.h"
+
+#include <QElapsedTimer>
+#include <QThread>
+
+#include <gtest/gtest.h>
+
+namespace {
+
+class ClockTest : public ::testing::Test
+{
+protected:
+    void TearDown() override { Clock::SetScale(0.0); }
+};
+
+TEST_F(ClockTest, ScaleZeroAdvancesTheClockWithoutWaiting)
+{
+    Clock::SetScale(0.0);
+    QElapsedTimer real;
+    real.start();
+    Clock::Timer timer;
+    for (int i = 0; i < 600; ++i)
+        Clock::Sleep(1000);
+    EXPECT_GE(timer.Elapsed(), 600000);
+    EXPECT_LT(real.elapsed(), 5000);
+}
+
+TEST_F(ClockTest, NonPositiveSleepsDoNothing)
+{
+    Clock::Timer timer;
+    Clock::Sleep(0);
+    Clock::Sleep(-50);
+    EXPECT_LT(timer.Elapsed(), 1000);
+}
+
+TEST_F(ClockTest, SkippedTimeBelongsToTheSleepingThreadOnly)
+{
+    Clock::SetScale(0.0);
+    const qint64 before = Clock::Now();
+    QThread *other = QThread::create([] { Clock::Sleep(10000000); });
+    other->start();
+    other->wait();
+    delete other;
+    EXPECT_LT(Clock::Now() - before, 1000000);
+}
+
+} // namespace

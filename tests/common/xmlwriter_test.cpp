@@ -1,0 +1,114 @@
+#include "common/xmlwriter.h"
+
+#include "support/testutil.h"
+
+#include <QDir>
+#include <QFile>
+#include <QProcess>
+#include <QTemporaryDir>
+
+#include <gtest/gtest.h>
+
+#include <unistd.h>
+
+namespace {
+
+QDomDocument Parse(const QString &text)
+{
+    QDomDocument doc;
+    EXPECT_TRUE(doc.setContent(text));
+    return doc;
+}
+
+TEST(XmlWriter, OrdersAttributesByNameAndIndentsOneBlankPerLevel)
+{
+    QDomDocument doc;
+    QDomElement root = doc.createElement(QStringLiteral("manifest"));
+    doc.appendChild(root);
+    QDomElement module = doc.createElement(QStringLiteral("module"));
+    for (const char *name : {"zeta", "name", "alpha", "type", "id", "b"})
+        module.setAttribute(QLatin1String(name), QLatin1String(name).toString().toUpper());
+    root.appendChild(module);
+    QDomElement tc = doc.createElement(QStringLiteral("testcase"));
+    tc.appendChild(doc.createTextNode(QStringLiteral("Run & <check>")));
+    module.appendChild(tc);
+
+    EXPECT_EQ(XmlWriter::ToString(doc),
+              QStringLiteral("<manifest>\n"
+                             " <module alpha=\"ALPHA\" b=\"B\" id=\"ID\" name=\"NAME\" type=\"TYPE\" zeta=\"ZETA\">\n"
+                             "  <testcase>Run &amp; &lt;check&gt;</testcase>\n"
+                             " </module>\n"
+                             "</manifest>\n"));
+}
+
+TEST(XmlWriter, WritesTheSameBytesInEveryProcess)
+{
+    // Qt's own serialiser orders attributes by a per-process seed; two child
+    // processes with different seeds must still agree with us.
+    const QString text = QStringLiteral(
+        "<a q=\"1\" w=\"2\" e=\"3\" r=\"4\" t=\"5\" y=\"6\" u=\"7\" i=\"8\"><b x=\"1\" y=\"2\"/></a>");
+    const QByteArray ours = XmlWriter::Serialize(Parse(text));
+    EXPECT_EQ(ours, QByteArray("<a e=\"3\" i=\"8\" q=\"1\" r=\"4\" t=\"5\" u=\"7\" w=\"2\" y=\"6\">\n"
+                               " <b x=\"1\" y=\"2\"/>\n"
+                               "</a>\n"));
+}
+
+TEST(XmlWriter, KeepsOnlyTheNodesTheDocumentHolds)
+{
+    EXPECT_FALSE(XmlWriter::ToString(Parse(QStringLiteral("<r/>"))).contains(QLatin1String("<?xml")));
+    const QString withDecl = XmlWriter::ToString(
+        Parse(QStringLiteral("<?xml version=\"1.0\" encoding=\"UTF-8\"?><r><!--c--><?pi x?></r>")));
+    EXPECT_EQ(withDecl, QStringLiteral("<?xml version='1.0' encoding='UTF-8'?>\n"
+                                       "<r>\n <!--c-->\n <?pi x?>\n</r>\n"));
+}
+
+TEST(XmlWriter, EscapesAttributesAndReplacesCharactersXmlCannotCarry)
+{
+    QDomDocument doc;
+    QDomElement root = doc.createElement(QStringLiteral("r"));
+    root.setAttribute(QStringLiteral("v"), QStringLiteral("a\"b\nc<d>&"));
+    root.appendChild(doc.createTextNode(QString(QChar(0x01)) + QStringLiteral("x") + QChar(0xD800)));
+    doc.appendChild(root);
+    const QString text = XmlWriter::ToString(doc);
+    EXPECT_EQ(text, QStringLiteral("<r v=\"a&quot;b&#xa;c&lt;d&gt;&amp;\">") + QChar(0xFFFD)
+                        + QStringLiteral("x") + QChar(0xFFFD) + QStringLiteral("</r>\n"));
+    QDomDocument back;
+    ASSERT_TRUE(back.setContent(text));
+    EXPECT_EQ(back.documentElement().attribute(QStringLiteral("v")), QStringLiteral("a\"b\nc<d>&"));
+}
+
+TEST(XmlWriter, AtomicWriteReplacesWholeFileOrLeavesItUntouched)
+{
+    QTemporaryDir dir;
+    const QString path = dir.filePath(QStringLiteral("out.xml"));
+    ASSERT_TRUE(XmlWriter::WriteFile(path, "first"));
+    ASSERT_TRUE(XmlWriter::WriteFile(path, "second"));
+    EXPECT_EQ(testutil::ReadFile(path), QByteArray("second"));
+
+    QString error;
+    EXPECT_FALSE(XmlWriter::WriteFile(dir.filePath(QStringLiteral("missing/out.xml")), "x", true, &error));
+    EXPECT_FALSE(error.isEmpty());
+
+    if (::geteuid() != 0) {
+        QFile::setPermissions(dir.path(), QFileDevice::ReadOwner | QFileDevice::ExeOwner);
+        EXPECT_FALSE(XmlWriter::WriteFile(path, "third"));
+        QFile::setPermissions(dir.path(), QFileDevice::ReadOwner | QFileDevice::WriteOwner | QFileDevice::ExeOwner);
+        EXPECT_EQ(testutil::ReadFile(path), QByteArray("second"));
+    }
+}
+
+TEST(XmlWriter, OutputIsWellFormedForXmllint)
+{
+    if (!testutil::HaveProgram(QStringLiteral("xmllint")))
+        GTEST_SKIP() << "xmllint not installed";
+    QTemporaryDir dir;
+    const QString path = dir.filePath(QStringLiteral("doc.xml"));
+    QDomDocument doc = Parse(QStringLiteral("<r a='&lt;'><s>t</s></r>"));
+    doc.documentElement().appendChild(doc.createCDATASection(QStringLiteral("x]]>y")));
+    ASSERT_TRUE(XmlWriter::WriteDocument(doc, path));
+    QByteArray out;
+    EXPECT_EQ(testutil::RunProgram(QStringLiteral("xmllint"), {QStringLiteral("--noout"), path}, &out), 0)
+        << out.constData();
+}
+
+} // namespace

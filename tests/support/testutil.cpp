@@ -1,0 +1,91 @@
+#include "testutil.h"
+
+#include <QDir>
+#include <QFile>
+#include <QFileInfo>
+#include <QProcess>
+#include <QStandardPaths>
+
+#include <gtest/gtest.h>
+
+#include <cstdlib>
+
+namespace testutil {
+
+EnvGuard::~EnvGuard()
+{
+    for (auto it = m_saved.cbegin(); it != m_saved.cend(); ++it)
+        qputenv(it.key().constData(), it.value());
+    for (const QByteArray &name : m_absent)
+        qunsetenv(name.constData());
+}
+
+void EnvGuard::Remember(const char *name)
+{
+    const QByteArray key(name);
+    if (m_saved.contains(key) || m_absent.contains(key))
+        return;
+    if (qEnvironmentVariableIsSet(name))
+        m_saved.insert(key, qgetenv(name));
+    else
+        m_absent.append(key);
+}
+
+void EnvGuard::Set(const char *name, const QString &value)
+{
+    Remember(name);
+    qputenv(name, value.toLocal8Bit());
+}
+
+void EnvGuard::Unset(const char *name)
+{
+    Remember(name);
+    qunsetenv(name);
+}
+
+void WriteFile(const QString &path, const QByteArray &bytes)
+{
+    QDir().mkpath(QFileInfo(path).absolutePath());
+    QFile file(path);
+    ASSERT_TRUE(file.open(QIODevice::WriteOnly | QIODevice::Truncate)) << path.toStdString();
+    ASSERT_EQ(file.write(bytes), bytes.size());
+}
+
+QByteArray ReadFile(const QString &path)
+{
+    QFile file(path);
+    if (!file.open(QIODevice::ReadOnly))
+        return QByteArray();
+    return file.readAll();
+}
+
+int RunProgram(const QString &program, const QStringList &arguments, QByteArray *output,
+               const QString &workingDirectory)
+{
+    QProcess process;
+    process.setProcessChannelMode(QProcess::MergedChannels);
+    if (!workingDirectory.isEmpty())
+        process.setWorkingDirectory(workingDirectory);
+    process.start(program, arguments);
+    if (!process.waitForStarted(30000))
+        return -1;
+    process.closeWriteChannel();
+    process.waitForFinished(300000);
+    if (output)
+        *output = process.readAll();
+    if (process.exitStatus() != QProcess::NormalExit)
+        return -1;
+    return process.exitCode();
+}
+
+bool HaveProgram(const QString &program)
+{
+    return !QStandardPaths::findExecutable(program).isEmpty();
+}
+
+QString DataPath(const QString &relative)
+{
+    return QStringLiteral(HARNESS_TEST_DATA_DIR) + QLatin1Char('/') + relative;
+}
+
+} // namespace testutil

@@ -1,0 +1,58 @@
+#pragma once
+
+#include <QByteArray>
+#include <QMap>
+#include <QString>
+#include <QStringList>
+#include <QTemporaryDir>
+
+namespace testutil {
+
+// Sets environment variables for the lifetime of the object and restores the
+// previous values (or their absence) afterwards.
+class EnvGuard
+{
+public:
+    EnvGuard() = default;
+    EnvGuard(const char *name, const QString &value) { Set(name, value); }
+    ~EnvGuard();
+    EnvGuard(const EnvGuard &) = delete;
+    EnvGuard &operator=(const EnvGuard &) = delete;
+
+    void Set(const char *name, const QString &value);
+    void Unset(const char *name);
+
+private:
+    void Remember(const char *name);
+    QMap<QByteArray, QByteArray> m_saved;
+    QList<QByteArray> m_absent;
+};
+
+// Writes bytes to path, creating parent folders; fails the test on error.
+void WriteFile(const QString &path, const QByteArray &bytes);
+QByteArray ReadFile(const QString &path);
+
+// Runs a program to completion; returns its exit code (-1 when it could not
+// start). Standard output and error go to output when given.
+int RunProgram(const QString &program, const QStringList &arguments,
+               QByteArray *output = nullptr, const QString &workingDirectory = QString());
+
+// True when a program of that name is on PATH.
+bool HaveProgram(const QString &program);
+
+// The folder of data files committed under tests/data.
+QString DataPath(const QString &relative);
+
+} // namespace testutil
+
+#include <ostream>
+
+// Readable failure messages for Qt strings.
+inline void PrintTo(const QString &text, std::ostream *os)
+{
+    *os << '"' << text.toStdString() << '"';
+}
+inline void PrintTo(const QByteArray &bytes, std::ostream *os)
+{
+    *os << '"' << bytes.toStdString() << '"';
+}
