@@ -1,0 +1,32 @@
+#pragma once
+
+#include <QString>
+#include <QStringList>
+
+#include <functional>
+
+// Exit statuses of the tool.
+enum ExitStatus {
+    ExitSuccess = 0,
+    ExitTestFailed = 1,  // a test case failed or a module could not run
+    ExitUsage = 2,       // bad usage or a set-up failure (no kit, no handset, ...)
+};
+
+// One sub-command: its name, a one-line summary and its entry point, which
+// receives the arguments after the sub-command's name (argument 0 is
+// "harness <name>" for the usage text).
+struct Command
+{
+    const char *name;
+    const char *summary;
+    std::function<int(const QStringList &)> run;
+};
+
+// The commands each part of the tool contributes.
+QList<Command> InspectionCommands();
+QList<Command> RunCommands();
+QList<Command> DemoCommands();
+
+// Writes to standard output / standard error as UTF-8.
+void Out(const QString &text);
+void Err(const QString &text);
