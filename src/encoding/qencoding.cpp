@@ -1,0 +1,178 @@
+#include "encoding/qencoding.h"
+
+#include "encoding/qencodingisolatin1.h"
+#include "encoding/qencodingutf8.h"
+
+#include <QMap>
+
+#include <cstring>
+
+namespace {
+
+struct FormatRow {
+    KestoEncodingFormat format;
+    const char *name;
+    const char *mark;
+    unsigned int markSize;
+};
+
+// Unicode and "None" share the mark FF FE; KSC5601 and CP949 share FE FE.
+constexpr FormatRow kFormats[] = {
+    {ENCODING_UNICODE, "Unicode", "\xFF\xFE", 2},
+    {ENCODING_ISOLATIN1, "ISOLATIN1", "\x03", 1},
+    {ENCODING_KSC5601, "KSC5601", "\xFE\xFE", 2},
+    {ENCODING_SJIS, "S-JIS", "\xFD\xFE", 2},
+    {ENCODING_GB2312, "GB2312", "\xFC\xFE", 2},
+    {ENCODING_CP949, "CP949", "\xFE\xFE", 2},
+    {ENCODING_UTF8, "UTF-8", "\x02", 1},
+    {ENCODING_NONE, "None", "\xFF\xFE", 0},
+};
+
+const FormatRow *FindRow(KestoEncodingFormat format)
+{
+    for (const FormatRow &row : kFormats) {
+        if (row.format == format)
+            return &row;
+    }
+    return nullptr;
+}
+
+// Filled once, on first use; read-only afterwards.
+QMap<KestoEncodingFormat, QString> &FormatMap()
+{
+    static QMap<KestoEncodingFormat, QString> map;
+    return map;
+}
+
+QEncoding *NewEncoder(KestoEncodingFormat format)
+{
+    switch (format) {
+    case ENCODING_ISOLATIN1:
+        return new QEncodingIsoLatin1;
+    case ENCODING_UTF8:
+        return new QEncodingUTF8;
+    default:
+        return nullptr;
+    }
+}
+
+} // namespace
+
+QEncoding::~QEncoding() = default;
+
+unsigned int QEncoding::FromUnicode(const QString &in, QByteArray &out)
+{
+    out.clear();
+    out.reserve(in.size());
+    char bytes[kMaxEncodedSize + 1];
+    for (QChar c : in) {
+        std::memset(bytes, 0, sizeof bytes);
+        if (UnicodeToChar(c.unicode(), bytes))
+            out.append(bytes, int(std::strlen(bytes)));
+        else
+            out.append('?');
+    }
+    return unsigned(out.size());
+}
+
+unsigned int QEncoding::BOMSize(KestoEncodingFormat format)
+{
+    const FormatRow *row = FindRow(format);
+    return row ? row->markSize : 0;
+}
+
+QByteArray QEncoding::GetBOM(KestoEncodingFormat format)
+{
+    const FormatRow *row = FindRow(format);
+    if (!row || row->markSize == 0)
+        return QByteArray("\xFF\xFE", 2);
+    return QByteArray(row->mark, int(row->markSize));
+}
+
+void QEncoding::InitFormatMap()
+{
+    QMap<KestoEncodingFormat, QString> &map = FormatMap();
+    if (!map.isEmpty())
+        return;
+    for (const FormatRow &row : kFormats)
+        map.insert(row.format, QString::fromLatin1(row.name));
+}
+
+QString QEncoding::Format2Name(KestoEncodingFormat format)
+{
+    InitFormatMap();
+    return FormatMap().value(format);
+}
+
+KestoEncodingFormat QEncoding::Name2Format(const QString &name)
+{
+    InitFormatMap();
+    if (name.isEmpty())
+        return ENCODING_NONE;
+    const QMap<KestoEncodingFormat, QString> &map = FormatMap();
+    for (auto it = map.constBegin(); it != map.constEnd(); ++it) {
+        if (it.value().compare(name, Qt::CaseInsensitive) == 0)
+            return it.key();
+    }
+    return ENCODING_NONE;
+}
+
+unsigned int QEncoding::EncodingFormats(QList<KestoEncodingFormat> &formats)
+{
+    InitFormatMap();
+    formats.clear();
+    const QMap<KestoEncodingFormat, QString> &map = FormatMap();
+    for (auto it = map.constBegin(); it != map.constEnd(); ++it) {
+        if (it.key() != ENCODING_NONE)
+            formats.append(it.key());
+    }
+    return unsigned(formats.size());
+}
+
+bool CreateEncoder(const QByteArray &data, QEncoding **encoder, KestoEncodingFormat &format)
+{
+    if (!encoder)
+        return false;
+    FreeEncoder(*encoder);
+    *encoder = nullptr;
+    if (data.isEmpty())
+        return false;
+
+    const auto first = static_cast<unsigned char>(data.at(0));
+    KestoEncodingFormat detected = ENCODING_NONE;
+    if (data.size() >= 2 && static_cast<unsigned char>(data.at(1)) == 0xFE
+        && first >= 0xFC) {
+        // FE FE is shared by KSC5601 and CP949; CP949 reads both.
+        static constexpr KestoEncodingFormat kByLead[] = {ENCODING_GB2312, ENCODING_SJIS,
+                                                          ENCODING_CP949, ENCODING_UNICODE};
+        detected = kByLead[first - 0xFC];
+    } else if (first == 0x03) {
+        detected = ENCODING_ISOLATIN1;
+    } else if (first == 0x02) {
+        detected = ENCODING_UTF8;
+    }
+
+    format = detected;
+    if (detected == ENCODING_UNICODE)
+        return true;
+    *encoder = NewEncoder(detected);
+    return *encoder != nullptr;
+}
+
+bool CreateEncoder(KestoEncodingFormat format, QEncoding **encoder)
+{
+    QEncoding *created = NewEncoder(format);
+    if (encoder) {
+        FreeEncoder(*encoder);
+        *encoder = created;
+    } else {
+        delete created;
+        created = nullptr;
+    }
+    return created != nullptr;
+}
+
+void FreeEncoder(QEncoding *encoder)
+{
+    delete encoder;
+}
