@@ -1,0 +1,315 @@
+#include "environment/platforms.h"
+
+#include "support/testutil.h"
+
+#include <QDir>
+#include <QTemporaryDir>
+
+#include <gtest/gtest.h>
+
+namespace {
+
+class PlatformsTest : public ::testing::Test
+{
+protected:
+    void SetUp() override
+    {
+        ASSERT_TRUE(temp.isValid());
+        root = temp.path() + QStringLiteral("/platforms");
+        kits = temp.path() + QStringLiteral("/Tests");
+        env.Unset("KESTIX_PLATFORMS_ALL");
+        env.Unset("KESTIX_PLATFORM");
+        env.Unset("KESTIX_TESTSETS_ALL");
+        env.Unset("KESTIX_TESTSET");
+    }
+
+    void MakeDirs(const QString &parent, const QStringList &names)
+    {
+        for (const QString &name : names)
+            ASSERT_TRUE(QDir().mkpath(parent + QLatin1Char('/') + name));
+    }
+
+    QTemporaryDir temp;
+    QString root;
+    QString kits;
+    testutil::EnvGuard env;
+};
+
+QStringList Names(const QList<Platform> &platforms)
+{
+    QStringList names;
+    for (const Platform &platform : platforms)
+        names << platform.name;
+    return names;
+}
+
+TEST_F(PlatformsTest, NoPlatformsRootListsNothingAndClearsTheList)
+{
+    QList<Platform> platforms{Platform()};
+    EXPECT_EQ(GetPlatforms(platforms), 0u);
+    EXPECT_TRUE(platforms.isEmpty());
+}
+
+TEST_F(PlatformsTest, ListsSubDirectoriesByNameStrippingTheProWord)
+{
+    MakeDirs(root, {"Product", "Foo Pro", "abc", "Pro", "My Project", "Bar PRO 2", "zed"});
+    testutil::WriteFile(root + QStringLiteral("/notes.txt"), "not a platform");
+    env.Set("KESTIX_PLATFORMS_ALL", root);
+
+    QList<Platform> platforms;
+    ASSERT_EQ(GetPlatforms(platforms), 7u);
+
+    struct Expected { const char *entry; const char *name; bool pro; };
+    const Expected expected[] = {
+        {"abc", "abc", false},         {"Bar PRO 2", "Bar 2", true},
+        {"Foo Pro", "Foo", true},      {"My Project", "My Project", true},
+        {"Pro", "Pro", true},          {"Product", "Product", true},
+        {"zed", "zed", false},
+    };
+    for (int i = 0; i < 7; ++i) {
+        SCOPED_TRACE(expected[i].entry);
+        EXPECT_EQ(platforms[i].name, QString::fromUtf8(expected[i].name));
+        EXPECT_EQ(platforms[i].path, root + QLatin1Char('/') + QString::fromUtf8(expected[i].entry));
+        EXPECT_EQ(platforms[i].isPro, expected[i].pro);
+        EXPECT_FALSE(platforms[i].isDefault);
+    }
+}
+
+TEST_F(PlatformsTest, DefaultPlatformIsMatchedIgnoringCase)
+{
+    MakeDirs(root, {"abc", "Foo Pro"});
+    env.Set("KESTIX_PLATFORMS_ALL", root);
+    env.Set("KESTIX_PLATFORM", (root + QStringLiteral("/ABC/")).toUpper());
+
+    QList<Platform> platforms;
+    ASSERT_EQ(GetPlatforms(platforms), 2u);
+    EXPECT_TRUE(platforms[0].isDefault);
+    EXPECT_FALSE(platforms[1].isDefault);
+}
+
+TEST_F(PlatformsTest, PlatformSettingWithoutSeparatorMarksNoPlatform)
+{
+    MakeDirs(root, {"abc"});
+    env.Set("KESTIX_PLATFORMS_ALL", root);
+    env.Set("KESTIX_PLATFORM", QStringLiteral("abc"));
+
+    QString path;
+    EXPECT_TRUE(GetDefaultPlatform(path));
+    EXPECT_EQ(path, QStringLiteral("abc"));
+    QList<Platform> platforms;
+    ASSERT_EQ(GetPlatforms(platforms), 1u);
+    EXPECT_FALSE(platforms[0].isDefault);
+}
+
+TEST_F(PlatformsTest, ProAndNonProListsAppendWithoutClearing)
+{
+    MakeDirs(root, {"abc", "Foo Pro", "Pro", "zed"});
+    env.Set("KESTIX_PLATFORMS_ALL", root);
+
+    QList<Platform> pro;
+    EXPECT_EQ(GetProPlatforms(pro), 2u);
+    EXPECT_EQ(GetProPlatforms(pro), 4u);
+    EXPECT_EQ(Names(pro), QStringList({"Foo", "Pro", "Foo", "Pro"}));
+
+    QList<Platform> mixed = pro.mid(0, 1);
+    EXPECT_EQ(GetNonProPlatforms(mixed), 3u);
+    EXPECT_EQ(Names(mixed), QStringList({"Foo", "abc", "zed"}));
+
+    env.Unset("KESTIX_PLATFORMS_ALL");
+    EXPECT_EQ(GetProPlatforms(mixed), 3u);
+}
+
+struct DefaultPlatformCase
+{
+    const char *setting;
+    bool found;
+    const char *path;
+};
+
+class DefaultPlatformTest : public ::testing::TestWithParam<DefaultPlatformCase>
+{
+};
+
+TEST_P(DefaultPlatformTest, CutsAtLastBackslashThenLastSlash)
+{
+    testutil::EnvGuard env("KESTIX_PLATFORM", QString::fromUtf8(GetParam().setting));
+    QString out = QStringLiteral("stale");
+    EXPECT_EQ(GetDefaultPlatform(out), GetParam().found);
+    EXPECT_EQ(out, QString::fromUtf8(GetParam().path));
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Settings, DefaultPlatformTest,
+    ::testing::Values(DefaultPlatformCase{"", false, ""},
+                      DefaultPlatformCase{"C:\\sdk\\platforms\\abc\\", true, "C:\\sdk\\platforms\\abc"},
+                      DefaultPlatformCase{"C:\\sdk\\platforms\\abc", true, "C:\\sdk\\platforms"},
+                      DefaultPlatformCase{"/opt/sdk/abc/", true, "/opt/sdk/abc"},
+                      DefaultPlatformCase{"/opt/sdk/abc", true, "/opt/sdk"},
+                      // A backslash anywhere wins over later forward slashes.
+                      DefaultPlatformCase{"a/b\\c/d", true, "a/b"},
+                      DefaultPlatformCase{"abc", true, "abc"}));
+
+TEST_F(PlatformsTest, TestKitsDefaultToTestsBesidePlatformsRoot)
+{
+    MakeDirs(root, {"abc"});
+    MakeDirs(kits, {"kitB", "kitA"});
+    env.Set("KESTIX_PLATFORMS_ALL", root + QLatin1Char('/'));
+
+    EXPECT_EQ(GetTestSetsRoot(), kits);
+    QList<TestKit> found{TestKit()};
+    ASSERT_EQ(GetTestKits(found), 2u);
+    EXPECT_EQ(found[0].name, QStringLiteral("kitA"));
+    EXPECT_EQ(found[0].path, kits + QStringLiteral("/kitA"));
+    EXPECT_EQ(found[0].type, TestKit::TEST_KIT);
+    EXPECT_FALSE(found[0].reserved);
+    EXPECT_EQ(found[1].name, QStringLiteral("kitB"));
+
+    // An explicit root takes precedence and is cleaned.
+    const QString other = temp.path() + QStringLiteral("/other");
+    MakeDirs(other, {"only"});
+    env.Set("KESTIX_TESTSETS_ALL", other + QStringLiteral("/./"));
+    ASSERT_EQ(GetTestKits(found), 1u);
+    EXPECT_EQ(found[0].path, other + QStringLiteral("/only"));
+}
+
+TEST_F(PlatformsTest, DefaultTestKitIsTheNamedOneExactly)
+{
+    MakeDirs(kits, {"kitA", "kitB"});
+    env.Set("KESTIX_TESTSETS_ALL", kits);
+    env.Set("KESTIX_TESTSET", kits + QStringLiteral("/kitB"));
+
+    TestKit kit;
+    ASSERT_TRUE(GetDefaultTestKit(kit));
+    EXPECT_EQ(kit.name, QStringLiteral("kitB"));
+    EXPECT_EQ(kit.path, kits + QStringLiteral("/kitB"));
+
+    env.Set("KESTIX_TESTSET", QStringLiteral("C:\\kits\\kitA"));
+    ASSERT_TRUE(GetDefaultTestKit(kit));
+    EXPECT_EQ(kit.name, QStringLiteral("kitA"));
+
+    // Not installed, or differing in case only: nothing picked, out unchanged.
+    for (const char *setting : {"/kits/kitC", "/kits/KITA"}) {
+        env.Set("KESTIX_TESTSET", QString::fromUtf8(setting));
+        TestKit untouched;
+        untouched.name = QStringLiteral("mine");
+        EXPECT_FALSE(GetDefaultTestKit(untouched)) << setting;
+        EXPECT_EQ(untouched.name, QStringLiteral("mine"));
+        EXPECT_EQ(untouched.type, TestKit::USER_KIT);
+    }
+}
+
+TEST_F(PlatformsTest, TestSetEndingInSeparatorPicksTheGreatestName)
+{
+    // Ordinal comparison: lower-case names sort after upper-case ones.
+    MakeDirs(kits, {"alpha", "Zeta", "beta"});
+    env.Set("KESTIX_TESTSETS_ALL", kits);
+    env.Set("KESTIX_TESTSET", kits + QLatin1Char('/'));
+    EXPECT_EQ(GetDefaultTestKitName(), QString());
+
+    TestKit kit;
+    ASSERT_TRUE(GetDefaultTestKit(kit));
+    EXPECT_EQ(kit.name, QStringLiteral("beta"));
+
+    // Whatever out held before does not change the choice.
+    TestKit prefilled;
+    prefilled.name = QStringLiteral("zzz");
+    ASSERT_TRUE(GetDefaultTestKit(prefilled));
+    EXPECT_EQ(prefilled.name, QStringLiteral("beta"));
+}
+
+TEST_F(PlatformsTest, NoTestKitsInstalledPicksNothing)
+{
+    env.Set("KESTIX_TESTSETS_ALL", kits);
+    env.Set("KESTIX_TESTSET", kits + QStringLiteral("/kitA"));
+    TestKit kit;
+    kit.name = QStringLiteral("mine");
+    EXPECT_FALSE(GetDefaultTestKit(kit));
+    EXPECT_EQ(kit.name, QStringLiteral("mine"));
+}
+
+TEST(TestKitNames, DefaultTestKitNameIsTheLastComponent)
+{
+    testutil::EnvGuard env;
+    const std::pair<const char *, const char *> cases[] = {
+        {"", ""}, {"kit", "kit"}, {"/a/b/kit", "kit"}, {"C:\\a\\kit", "kit"},
+        {"a\\kit/x", "kit/x"}, {"/a/b/", ""}};
+    for (const auto &[setting, name] : cases) {
+        env.Set("KESTIX_TESTSET", QString::fromUtf8(setting));
+        EXPECT_EQ(GetDefaultTestKitName(), QString::fromUtf8(name)) << setting;
+    }
+}
+
+TEST(TestKitNames, TypeNames)
+{
+    EXPECT_EQ(TestKit::TypeToName(TestKit::USER_KIT), QStringLiteral("User Kit"));
+    EXPECT_EQ(TestKit::TypeToName(TestKit::TEST_KIT), QStringLiteral("Test Kit"));
+    EXPECT_EQ(TestKit::TypeToName(TestKit::PVS_KIT), QStringLiteral("Pvs Kit"));
+    EXPECT_EQ(TestKit::TypeToName(static_cast<TestKit::KitType>(7)), QStringLiteral("unknown"));
+    EXPECT_EQ(TestKit::TypeToName(static_cast<TestKit::KitType>(-1)), QStringLiteral("unknown"));
+}
+
+TEST(EnvironmentReaders, ReturnVariablesAsSet)
+{
+    testutil::EnvGuard env;
+    env.Set("KESTIX_TOOLSET", QStringLiteral("/sdk/tools/"));
+    env.Set("KESTIX_PLATFORMS_ALL", QStringLiteral("/sdk/./platforms"));
+    env.Set("KESTIX_PLATFORM", QStringLiteral("/sdk/platforms/abc/"));
+    env.Set("KESTIX_TESTSET", QStringLiteral("/kits/one/"));
+    env.Set("KESTIX_TESTSETS_ALL", QStringLiteral("/kits/../kits"));
+    EXPECT_EQ(GetToolsetSetting(), QStringLiteral("/sdk/tools/"));
+    EXPECT_EQ(GetPlatformsRoot(), QStringLiteral("/sdk/./platforms"));
+    EXPECT_EQ(GetPlatformSetting(), QStringLiteral("/sdk/platforms/abc/"));
+    EXPECT_EQ(GetTestSetSetting(), QStringLiteral("/kits/one/"));
+    EXPECT_EQ(GetTestSetsRoot(), QStringLiteral("/kits/../kits"));
+
+    env.Set("KESTIX_TESTSETS_ALL", QString());
+    EXPECT_EQ(GetTestSetsRoot(), QStringLiteral("/sdk/Tests"));
+    env.Unset("KESTIX_TOOLSET");
+    EXPECT_EQ(GetToolsetSetting(), QString());
+}
+
+struct PackageCase
+{
+    const char *package;
+    bool split;
+    const char *first;
+    const char *middle;
+    const char *last;
+};
+
+class BreakPackageNameTest : public ::testing::TestWithParam<PackageCase>
+{
+};
+
+TEST_P(BreakPackageNameTest, Splits)
+{
+    const PackageCase &c = GetParam();
+    QString first, middle, last;
+    EXPECT_EQ(BreakPackageName(QString::fromUtf8(c.package), first, middle, last), c.split);
+    EXPECT_EQ(first, QString::fromUtf8(c.first));
+    EXPECT_EQ(middle, QString::fromUtf8(c.middle));
+    EXPECT_EQ(last, QString::fromUtf8(c.last));
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Names, BreakPackageNameTest,
+    ::testing::Values(
+        PackageCase{"my_mod_RVCT22arm9_Release.kestix", true, "my_mod", "RVCT22arm9", "Release"},
+        PackageCase{"mod_GCCE_UDEB.KESTIX", true, "mod", "GCCE", "UDEB"},
+        PackageCase{"a__b_c", true, "a", "b", "c"},
+        PackageCase{"x_y__b_c", true, "x_y", "b", "c"},
+        PackageCase{"_b_c", true, "", "b", "c"},
+        PackageCase{"a_b_", true, "a", "b", ""},
+        PackageCase{"a.kestix_b.kestix_c.kestix", true, "a", "b", "c"},
+        PackageCase{"a_b.kestix", false, "", "", ""},
+        PackageCase{"plain", false, "", "", ""},
+        PackageCase{"", false, "", "", ""}));
+
+TEST(BreakPackageName, LeavesOutputsUntouchedWhenTooFewParts)
+{
+    QString first = QStringLiteral("1"), middle = QStringLiteral("2"), last = QStringLiteral("3");
+    EXPECT_FALSE(BreakPackageName(QStringLiteral("a_b.kestix"), first, middle, last));
+    EXPECT_EQ(first + middle + last, QStringLiteral("123"));
+}
+
+} // namespace
