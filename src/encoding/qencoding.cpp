@@ -1,6 +1,10 @@
 #include "encoding/qencoding.h"
 
+#include "encoding/qencodingcp949.h"
+#include "encoding/qencodinggb2312.h"
 #include "encoding/qencodingisolatin1.h"
+#include "encoding/qencodingksc5601.h"
+#include "encoding/qencodingsjis.h"
 #include "encoding/qencodingutf8.h"
 
 #include <QMap>
@@ -49,6 +53,14 @@ QEncoding *NewEncoder(KestoEncodingFormat format)
     switch (format) {
     case ENCODING_ISOLATIN1:
         return new QEncodingIsoLatin1;
+    case ENCODING_KSC5601:
+        return new QEncodingKSC5601;
+    case ENCODING_SJIS:
+        return new QEncodingSJIS;
+    case ENCODING_GB2312:
+        return new QEncodingGB2312;
+    case ENCODING_CP949:
+        return new QEncodingCP949;
     case ENCODING_UTF8:
         return new QEncodingUTF8;
     default:

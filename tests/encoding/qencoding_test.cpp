@@ -1,40 +1,10 @@
-#include "encoding/qencoding.h"
-#include "encoding/qencodingisolatin1.h"
-#include "encoding/qencodingutf8.h"
+#include "encodingtest.h"
 
 #include <gtest/gtest.h>
 
-#include <memory>
-
 namespace {
 
-struct EncoderDeleter {
-    void operator()(QEncoding *encoder) const { FreeEncoder(encoder); }
-};
-using EncoderPtr = std::unique_ptr<QEncoding, EncoderDeleter>;
-
-EncoderPtr Make(KestoEncodingFormat format)
-{
-    QEncoding *encoder = nullptr;
-    CreateEncoder(format, &encoder);
-    return EncoderPtr(encoder);
-}
-
-QByteArray Bytes(std::initializer_list<int> values)
-{
-    QByteArray bytes;
-    for (int v : values)
-        bytes.append(char(v));
-    return bytes;
-}
-
-QString Units(std::initializer_list<char16_t> values)
-{
-    QString text;
-    for (char16_t v : values)
-        text.append(QChar(v));
-    return text;
-}
+using namespace encodingtest;
 
 TEST(EncodingFormats, NamesMarksAndSizes)
 {
@@ -100,7 +70,13 @@ INSTANTIATE_TEST_SUITE_P(
                       Detection{Bytes({0xFF, 0xFE}), ENCODING_UNICODE, true, false},
                       Detection{Bytes({0x03, 0x41}), ENCODING_ISOLATIN1, true, true},
                       Detection{Bytes({0x02, 0x41}), ENCODING_UTF8, true, true},
+                      Detection{Bytes({0xFE, 0xFE, 0x41}), ENCODING_CP949, true, true},
+                      Detection{Bytes({0xFE, 0xFE}), ENCODING_CP949, true, true},
+                      Detection{Bytes({0xFD, 0xFE}), ENCODING_SJIS, true, true},
+                      Detection{Bytes({0xFC, 0xFE, 0xB0, 0xA1}), ENCODING_GB2312, true, true},
+                      Detection{Bytes({0xFF, 0xFE, 0x41, 0x00}), ENCODING_UNICODE, true, false},
                       Detection{Bytes({0xFE, 0xFF}), ENCODING_NONE, false, false},
+                      Detection{Bytes({0xFB, 0xFE}), ENCODING_NONE, false, false},
                       Detection{Bytes({0x41, 0x42}), ENCODING_NONE, false, false}));
 
 TEST(DetectFormat, EmptyBlockKeepsFormat)
@@ -122,6 +98,29 @@ TEST(CreateEncoder, NoConverterForUnicodeNoneOrUnknown)
         EXPECT_EQ(encoder, nullptr) << value;
     }
     FreeEncoder(nullptr);
+}
+
+// Each converter created for a format is the one detection picks for its
+// mark (KSC5601, which shares CP949's mark, decodes as CP949).
+TEST(CreateEncoder, MarkOfEachFormatSelectsAConverterThatReadsIt)
+{
+    const QString text = QStringLiteral("Ab1");
+    for (int value = 1; value <= 6; ++value) {
+        const auto format = static_cast<KestoEncodingFormat>(value);
+        EncoderPtr writer = Make(format);
+        ASSERT_TRUE(writer) << value;
+        QByteArray body;
+        writer->FromUnicode(text, body);
+        QEncoding *reader = nullptr;
+        KestoEncodingFormat detected = ENCODING_NONE;
+        ASSERT_TRUE(CreateEncoder(QEncoding::GetBOM(format) + body, &reader, detected)) << value;
+        EXPECT_EQ(detected, format == ENCODING_KSC5601 ? ENCODING_CP949 : format);
+        QString decoded;
+        reader->ToUnicode(body, decoded);
+        EXPECT_EQ(decoded, text) << value;
+        EXPECT_EQ(reader->MinCharSize(), 1u);
+        FreeEncoder(reader);
+    }
 }
 
 TEST(Utf8, EncodesUnitByUnit)
