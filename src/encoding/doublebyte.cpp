@@ -77,7 +77,7 @@ void WriteCode(quint16 code, char *bytes)
 bool EncodeWithTable(const MappingTable &table, unsigned int unit, char *bytes)
 {
     quint16 code = 0;
-    if (unit > 0xFFFF || !table.ToCode(unit, &code))
+    if (!bytes || unit > 0xFFFF || !table.ToCode(unit, &code))
         return false;
     WriteCode(code, bytes);
     return true;

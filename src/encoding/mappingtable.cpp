@@ -20,7 +20,8 @@ bool MappingTable::ToUnit(unsigned int code, quint16 *unit) const
     }
     if (low == m_count || CodeAt(low) != code)
         return false;
-    *unit = UnitAt(low);
+    if (unit)
+        *unit = UnitAt(low);
     return true;
 }
 
@@ -37,6 +38,7 @@ bool MappingTable::ToCode(unsigned int unit, quint16 *code) const
                                      [this](quint16 index, unsigned int u) { return UnitAt(index) < u; });
     if (it == m_byUnit.end() || UnitAt(*it) != unit)
         return false;
-    *code = CodeAt(*it);
+    if (code)
+        *code = CodeAt(*it);
     return true;
 }

@@ -41,10 +41,16 @@ const FormatRow *FindRow(KestoEncodingFormat format)
     return nullptr;
 }
 
-// Filled once, on first use; read-only afterwards.
-QMap<KestoEncodingFormat, QString> &FormatMap()
+// Filled once, on first use (safely, even when several threads get there at
+// once); read-only afterwards.
+const QMap<KestoEncodingFormat, QString> &FormatMap()
 {
-    static QMap<KestoEncodingFormat, QString> map;
+    static const QMap<KestoEncodingFormat, QString> map = [] {
+        QMap<KestoEncodingFormat, QString> names;
+        for (const FormatRow &row : kFormats)
+            names.insert(row.format, QString::fromLatin1(row.name));
+        return names;
+    }();
     return map;
 }
 
@@ -103,22 +109,16 @@ QByteArray QEncoding::GetBOM(KestoEncodingFormat format)
 
 void QEncoding::InitFormatMap()
 {
-    QMap<KestoEncodingFormat, QString> &map = FormatMap();
-    if (!map.isEmpty())
-        return;
-    for (const FormatRow &row : kFormats)
-        map.insert(row.format, QString::fromLatin1(row.name));
+    FormatMap();
 }
 
 QString QEncoding::Format2Name(KestoEncodingFormat format)
 {
-    InitFormatMap();
     return FormatMap().value(format);
 }
 
 KestoEncodingFormat QEncoding::Name2Format(const QString &name)
 {
-    InitFormatMap();
     if (name.isEmpty())
         return ENCODING_NONE;
     const QMap<KestoEncodingFormat, QString> &map = FormatMap();
@@ -131,7 +131,6 @@ KestoEncodingFormat QEncoding::Name2Format(const QString &name)
 
 unsigned int QEncoding::EncodingFormats(QList<KestoEncodingFormat> &formats)
 {
-    InitFormatMap();
     formats.clear();
     const QMap<KestoEncodingFormat, QString> &map = FormatMap();
     for (auto it = map.constBegin(); it != map.constEnd(); ++it) {

@@ -11,14 +11,18 @@ int QEncodingCP949::ToUnicode(const QByteArray &in, QString &out)
 
 bool QEncodingCP949::CharToUnicode(unsigned int code, quint16 *unit)
 {
-    if (QEncodingKSC5601::KsToUnicode(code, unit) || encodingtables::kCp949.ToUnit(code, unit))
-        return true;
-    *unit = ' ';
-    return false;
+    quint16 decoded = ' ';
+    const bool mapped = QEncodingKSC5601::KsToUnicode(code, &decoded)
+                        || encodingtables::kCp949.ToUnit(code, &decoded);
+    if (unit)
+        *unit = mapped ? decoded : quint16(' ');
+    return mapped;
 }
 
 bool QEncodingCP949::UnicodeToChar(unsigned int unit, char *bytes)
 {
+    if (!bytes)
+        return false;
     if (doublebyte::EncodeWithTable(encodingtables::kCp949, unit, bytes))
         return true;
     bytes[0] = ' ';

@@ -23,6 +23,8 @@ bool QEncodingIsoLatin1::CharToUnicode(unsigned int code, quint16 *unit)
 
 bool QEncodingIsoLatin1::UnicodeToChar(unsigned int unit, char *bytes)
 {
+    if (!bytes)
+        return false;
     bytes[0] = char(unit & 0xFF);
     bytes[1] = 0;
     return true;

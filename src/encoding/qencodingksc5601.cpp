@@ -23,11 +23,11 @@ int QEncodingKSC5601::ToUnicode(const QByteArray &in, QString &out)
 
 bool QEncodingKSC5601::CharToUnicode(unsigned int code, quint16 *unit)
 {
-    if (!KsToUnicode(code, unit)) {
-        *unit = ' ';
-        return false;
-    }
-    return true;
+    quint16 decoded = ' ';
+    const bool mapped = KsToUnicode(code, &decoded);
+    if (unit)
+        *unit = mapped ? decoded : quint16(' ');
+    return mapped;
 }
 
 bool QEncodingKSC5601::UnicodeToChar(unsigned int unit, char *bytes)
@@ -38,7 +38,8 @@ bool QEncodingKSC5601::UnicodeToChar(unsigned int unit, char *bytes)
 bool QEncodingKSC5601::KsToUnicode(unsigned int code, quint16 *unit)
 {
     if (code < 0x100) {
-        *unit = quint16(code);
+        if (unit)
+            *unit = quint16(code);
         return true;
     }
     return IsKsCode(code) && encodingtables::kCp949.ToUnit(code, unit);
@@ -46,6 +47,8 @@ bool QEncodingKSC5601::KsToUnicode(unsigned int code, quint16 *unit)
 
 bool QEncodingKSC5601::UnicodeToKs(unsigned int unit, char *bytes)
 {
+    if (!bytes)
+        return false;
     quint16 code = 0;
     if (unit < 0x80) {
         code = quint16(unit);

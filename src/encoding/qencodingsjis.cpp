@@ -35,7 +35,8 @@ bool QEncodingSJIS::CharToUnicode(unsigned int code, quint16 *unit)
     if (code <= 0xFFFF && lead >= kUserFirstLead && trail >= kFirstTrail
         && trail <= kLastTrail && trail != kSkippedTrail) {
         const unsigned int column = trail - (trail > kSkippedTrail ? kFirstTrail + 1 : kFirstTrail);
-        *unit = quint16(kUserFirstUnit + (lead - kUserFirstLead) * kUserTrailsPerLead + column);
+        if (unit)
+            *unit = quint16(kUserFirstUnit + (lead - kUserFirstLead) * kUserTrailsPerLead + column);
         return true;
     }
     return m_table->ToUnit(code, unit);
@@ -43,6 +44,8 @@ bool QEncodingSJIS::CharToUnicode(unsigned int code, quint16 *unit)
 
 bool QEncodingSJIS::UnicodeToChar(unsigned int unit, char *bytes)
 {
+    if (!bytes)
+        return false;
     if (unit >= kUserFirstUnit && unit <= kUserLastUnit) {
         const unsigned int row = (unit - kUserFirstUnit) / kUserTrailsPerLead;
         const unsigned int column = (unit - kUserFirstUnit) % kUserTrailsPerLead;

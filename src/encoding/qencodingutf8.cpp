@@ -84,6 +84,8 @@ bool QEncodingUTF8::CharToUnicode(unsigned int code, quint16 *unit)
 
 bool QEncodingUTF8::UnicodeToChar(unsigned int unit, char *bytes)
 {
+    if (!bytes)
+        return false;
     if (unit < 0x80) {
         bytes[0] = char(unit);
         bytes[1] = 0;

@@ -175,6 +175,14 @@ TEST_P(ArbitraryBytes, NeverReadPastTheBlock)
     }
 }
 
+TEST_P(ArbitraryBytes, NullPointersAreRefusedNotFollowed)
+{
+    EncoderPtr encoding = Make(GetParam());
+    for (unsigned int code : {0x41u, 0xB0A1u, 0xF040u, 0x8141u, 0xFFFFFu})
+        encoding->CharToUnicode(code, nullptr);
+    EXPECT_FALSE(encoding->UnicodeToChar('A', nullptr));
+}
+
 INSTANTIATE_TEST_SUITE_P(Converters, ArbitraryBytes,
                          ::testing::Values(ENCODING_UTF8, ENCODING_ISOLATIN1, ENCODING_GB2312,
                                            ENCODING_SJIS, ENCODING_KSC5601, ENCODING_CP949));
