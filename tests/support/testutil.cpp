@@ -43,6 +43,16 @@ void EnvGuard::Unset(const char *name)
     qunsetenv(name);
 }
 
+CurrentDirectory::CurrentDirectory(const QString &path) : m_previous(QDir::currentPath())
+{
+    QDir::setCurrent(path);
+}
+
+CurrentDirectory::~CurrentDirectory()
+{
+    QDir::setCurrent(m_previous);
+}
+
 void WriteFile(const QString &path, const QByteArray &bytes)
 {
     QDir().mkpath(QFileInfo(path).absolutePath());

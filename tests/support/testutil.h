@@ -28,6 +28,19 @@ private:
     QList<QByteArray> m_absent;
 };
 
+// Changes the current directory for the lifetime of the object.
+class CurrentDirectory
+{
+public:
+    explicit CurrentDirectory(const QString &path);
+    ~CurrentDirectory();
+    CurrentDirectory(const CurrentDirectory &) = delete;
+    CurrentDirectory &operator=(const CurrentDirectory &) = delete;
+
+private:
+    QString m_previous;
+};
+
 // Writes bytes to path, creating parent folders; fails the test on error.
 void WriteFile(const QString &path, const QByteArray &bytes);
 QByteArray ReadFile(const QString &path);

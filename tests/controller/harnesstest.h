@@ -1,0 +1,159 @@
+#pragma once
+
+// Shared fixture pieces for the Harness tests: access to the private state,
+// a log captured in a file, and a temporary SDK toolset with stand-in
+// resource compilers.
+
+#include "controller/harness.h"
+#include "log/log.h"
+
+#include "support/testutil.h"
+
+#include <QDir>
+#include <QFile>
+#include <QFileInfo>
+#include <QTemporaryDir>
+
+#include <gtest/gtest.h>
+
+// The Harness befriends this class so that tests can reach its private
+// operations and fields.
+class HarnessTestAccess
+{
+public:
+    static bool SetupEnvironment(Harness &harness) { return harness.SetupEnvironment(); }
+    static const QMap<QString, QString> &Environment(const Harness &harness)
+    {
+        return harness.m_environment;
+    }
+    static quint32 CopyDelay(const Harness &harness) { return harness.m_copyDelay; }
+    static bool KitNotSelected(const Harness &harness) { return harness.m_kitNotSelected; }
+    static bool EnvironmentReady(const Harness &harness) { return harness.m_environmentReady; }
+    static IKestoDevice *Device(const Harness &harness) { return harness.m_device; }
+    static QString Target(const Harness &harness) { return harness.m_target; }
+};
+
+namespace harnesstest {
+
+// A log file of its own in a temporary folder.
+class CapturedLog
+{
+public:
+    CapturedLog() { m_log.SetLogPath(m_dir.filePath(QStringLiteral("log.txt"))); }
+    Log *log() { return &m_log; }
+    QString Text() const
+    {
+        return QString::fromLatin1(testutil::ReadFile(m_dir.filePath(QStringLiteral("log.txt"))));
+    }
+
+private:
+    QTemporaryDir m_dir;
+    Log m_log;
+};
+
+// A temporary toolset named by KESTIX_TOOLSET, whose resource compilers are
+// shell scripts. Every call of a stand-in appends its arguments, one per
+// line, followed by a line "--", to calls.txt in the toolset folder.
+class Toolset
+{
+public:
+    Toolset() : m_env("KESTIX_TOOLSET", m_dir.path()) {}
+
+    QString Path() const { return m_dir.path(); }
+    QString CompilerPath() const { return m_dir.filePath(QStringLiteral("bin/kestormc.exe")); }
+    QString AltCompilerPath() const
+    {
+        return m_dir.filePath(QStringLiteral("bin/deprecated/ResourceEditor/kestorc.exe"));
+    }
+
+    // kestormc: "-convert" copies the input to the output and reports it
+    // unless the toolset holds "convert_fails"; "-compile" writes "compiled:"
+    // and the input to the output among lines of noise, unless the toolset
+    // holds "compile_fails".
+    void InstallCompiler() { WriteScript(CompilerPath(), kCompilerScript); }
+    // kestorc: copies the source to the output, or when the toolset holds
+    // "alt_empty" leaves an empty output and complains.
+    void InstallAltCompiler() { WriteScript(AltCompilerPath(), kAltCompilerScript); }
+    void SetFlag(const char *flag, bool on)
+    {
+        const QString path = m_dir.filePath(QString::fromLatin1(flag));
+        if (on)
+            testutil::WriteFile(path, QByteArray());
+        else
+            QFile::remove(path);
+    }
+
+    // The arguments of every call so far, one list per call.
+    QList<QStringList> Calls() const
+    {
+        QList<QStringList> calls;
+        QStringList current;
+        const QString text =
+            QString::fromLocal8Bit(testutil::ReadFile(m_dir.filePath(QStringLiteral("calls.txt"))));
+        for (const QString &line : text.split(QLatin1Char('\n'))) {
+            if (line == QLatin1String("--")) {
+                calls.append(current);
+                current.clear();
+            } else if (!line.isEmpty()) {
+                current.append(line);
+            }
+        }
+        return calls;
+    }
+
+    static void WriteScript(const QString &path, const char *script)
+    {
+        testutil::WriteFile(path, QByteArray(script));
+        QFile::setPermissions(path, QFileDevice::ReadOwner | QFileDevice::WriteOwner
+                                        | QFileDevice::ExeOwner);
+    }
+
+private:
+    static constexpr const char *kCompilerScript = R"SH(#!/bin/sh
+toolset=$(dirname "$(dirname "$0")")
+for a in "$@"; do printf '%s\n' "$a"; done >> "$toolset/calls.txt"
+echo -- >> "$toolset/calls.txt"
+case "$1" in
+-convert)
+  echo "converting"
+  [ -f "$toolset/convert_fails" ] && { echo "conversion error"; exit 1; }
+  cp "$3" "$5" || exit 1
+  echo "Successfully converted file $3"
+  ;;
+-compile)
+  echo "compiling"
+  [ -f "$toolset/compile_fails" ] && { echo "compile error"; exit 1; }
+  { echo "compiled:"; cat "$3"; } > "$5" || exit 1
+  i=0; while [ $i -lt 2000 ]; do echo "noise line $i of the compiler output"; i=$((i+1)); done
+  echo "Successfully compiled $5"
+  echo "after success"
+  ;;
+esac
+)SH";
+    static constexpr const char *kAltCompilerScript = R"SH(#!/bin/sh
+toolset=$(dirname "$(dirname "$(dirname "$(dirname "$0")")")")
+for a in "$@"; do printf '%s\n' "$a"; done >> "$toolset/calls.txt"
+echo -- >> "$toolset/calls.txt"
+if [ -f "$toolset/alt_empty" ]; then
+  : > "$3"
+  echo "kestorc: syntax error"
+  echo "stderr line" >&2
+  exit 1
+fi
+cp "$4" "$3"
+)SH";
+
+    QTemporaryDir m_dir;
+    testutil::EnvGuard m_env;
+};
+
+// Sets a file's modification time, so freshness does not depend on how fast
+// the test runs.
+inline void SetModified(const QString &path, const QDateTime &when)
+{
+    QFile file(path);
+    ASSERT_TRUE(file.open(QIODevice::ReadWrite));
+    ASSERT_TRUE(file.setFileTime(when, QFileDevice::FileModificationTime));
+}
+
+} // namespace harnesstest
