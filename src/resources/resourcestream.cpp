@@ -1,0 +1,383 @@
+#include "resources/resourcestream.h"
+
+#include "resources/blockreader.h"
+
+#include <QFile>
+#include <QHash>
+#include <QSaveFile>
+#include <QtEndian>
+
+#include <cstring>
+
+namespace {
+
+constexpr int kHeaderSize = 32;
+constexpr int kMapEntrySize = 8;
+constexpr int kOffsetSize = 4;
+// Map entries, block indexes and IDs are 16-bit in the file.
+constexpr int kMaxEntries = 0xFFFF;
+
+void PutU16(QByteArray &out, quint16 value)
+{
+    uchar bytes[2];
+    qToLittleEndian(value, bytes);
+    out.append(reinterpret_cast<const char *>(bytes), 2);
+}
+
+void PutU32(QByteArray &out, quint32 value)
+{
+    uchar bytes[4];
+    qToLittleEndian(value, bytes);
+    out.append(reinterpret_cast<const char *>(bytes), 4);
+}
+
+// "%1(0x%2)": decimal, then hexadecimal right-aligned in 8 characters.
+QString Line(const char *format, quint32 value)
+{
+    return QString::fromLatin1(format).arg(value).arg(value, 8, 16, QLatin1Char(' '));
+}
+
+} // namespace
+
+bool ResourceEntry::operator<(const ResourceEntry &other) const
+{
+    if (compareMode == 1)
+        return qstrcmp(data.constData(), other.data.constData()) < 0;
+    if (type != other.type)
+        return type < other.type;
+    return id < other.id;
+}
+
+ResourceStream::ResourceStream() = default;
+ResourceStream::~ResourceStream() = default;
+ResourceStream::ResourceStream(const ResourceStream &other) = default;
+ResourceStream &ResourceStream::operator=(const ResourceStream &other) = default;
+
+bool ResourceStream::Load(const QString &path)
+{
+    if (path.isEmpty())
+        return false;
+    QFile file(path);
+    if (!file.open(QIODevice::ReadOnly))
+        return false;
+    const QByteArray bytes = file.readAll();
+    if (file.error() != QFileDevice::NoError)
+        return false;
+    file.close();
+    if (!Parse(bytes))
+        return false;
+    m_name = path;
+    return true;
+}
+
+bool ResourceStream::LoadFrom(const QByteArray &bytes)
+{
+    return Parse(bytes);
+}
+
+bool ResourceStream::Parse(const QByteArray &bytes)
+{
+    BlockReader in(bytes);
+    if (in.Remaining() < kHeaderSize)
+        return false;
+    ResourceHeader header;
+    header.fileType = in.U8();
+    header.reserved = in.U8();
+    header.version = in.U16();
+    header.oldestCodeVersion = in.U16();
+    header.mapEntries = in.U16();
+    header.offsetToMap = in.U32();
+    header.lengthOfMap = in.U32();
+    header.offsetToEntries = in.U32();
+    header.resourceCount = in.U32();
+    header.offsetToResources = in.U32();
+    header.lengthOfResources = in.U32();
+
+    // Every count must be backed by bytes before anything is allocated for it.
+    const qint64 mapCount = header.mapEntries;
+    const qint64 offsetCount = qint64(header.resourceCount) + 1;
+    if (mapCount * kMapEntrySize > in.Remaining())
+        return false;
+    if (offsetCount * kOffsetSize > in.Remaining() - mapCount * kMapEntrySize)
+        return false;
+
+    QVector<FileMapEntry> fileMap;
+    fileMap.reserve(int(mapCount));
+    for (qint64 i = 0; i < mapCount; ++i) {
+        FileMapEntry entry;
+        entry.type = in.U16();
+        entry.beginningResId = in.U16();
+        entry.additionalResId = in.U16();
+        entry.offsetIndex = in.U16();
+        fileMap.append(entry);
+    }
+
+    QVector<quint32> offsetTable;
+    offsetTable.reserve(int(offsetCount));
+    for (qint64 i = 0; i < offsetCount; ++i)
+        offsetTable.append(in.U32());
+
+    // Offsets only serve for their differences; they must not run backwards
+    // nor describe more data than the input holds.
+    const qint64 dataStart = in.Position();
+    if (offsetTable.last() > quint32(bytes.size()) || offsetTable.last() < offsetTable.first()
+        || qint64(offsetTable.last() - offsetTable.first()) > in.Remaining())
+        return false;
+    QVector<QByteArray> resources;
+    resources.reserve(int(offsetCount - 1));
+    qint64 position = dataStart;
+    for (qint64 i = 0; i + 1 < offsetCount; ++i) {
+        if (offsetTable[i + 1] < offsetTable[i])
+            return false;
+        const qint64 size = offsetTable[i + 1] - offsetTable[i];
+        resources.append(size > 0 ? bytes.mid(position, size) : QByteArray(""));
+        position += size;
+    }
+
+    // Ranges may share slots, but a map that describes more IDs than the
+    // input has bytes is no resource file: it would only blow up the table.
+    qint64 idCount = 0;
+    for (const FileMapEntry &entry : std::as_const(fileMap)) {
+        if (qint64(entry.offsetIndex) + entry.additionalResId >= resources.size())
+            return false;
+        idCount += qint64(entry.additionalResId) + 1;
+    }
+    if (idCount > bytes.size())
+        return false;
+
+    m_header = header;
+    _fileMap = fileMap;
+    _offsetTable = offsetTable;
+    _resources = resources;
+    return Decompress();
+}
+
+bool ResourceStream::Decompress()
+{
+    m_table.clear();
+    // Where ranges overlap, the first map entry covering an ID wins.
+    for (const FileMapEntry &entry : std::as_const(_fileMap)) {
+        QMap<quint16, QByteArray> &ids = m_table[entry.type];
+        for (int k = 0; k <= entry.additionalResId; ++k) {
+            const quint16 id = quint16(entry.beginningResId + k);
+            const int index = entry.offsetIndex + k;
+            if (index >= _resources.size())
+                return false;
+            if (!ids.contains(id))
+                ids.insert(id, _resources.at(index));
+        }
+    }
+    return true;
+}
+
+bool ResourceStream::ProcessStructures()
+{
+    m_header.Reset();
+    _fileMap.clear();
+    _offsetTable.clear();
+    _resources.clear();
+
+    QVector<ResourceEntry> entries;
+    if (GetResources(entries) == 0 || entries.size() > kMaxEntries)
+        return false;
+
+    // The first equal block already collected is shared; the hash finds it
+    // without scanning every block.
+    QHash<QByteArray, int> firstIndex;
+    firstIndex.reserve(entries.size());
+    quint64 end = 0;
+    for (const ResourceEntry &entry : std::as_const(entries)) {
+        int index = firstIndex.value(entry.data, -1);
+        if (index < 0) {
+            index = int(_resources.size());
+            _resources.append(entry.data);
+            firstIndex.insert(entry.data, index);
+            if (_offsetTable.isEmpty())
+                _offsetTable.append(0);
+            end += quint64(entry.data.size());
+            if (end > 0xFFFFFFFFu)
+                return false;
+            _offsetTable.append(quint32(end));
+        }
+        FileMapEntry mapEntry;
+        mapEntry.type = entry.type;
+        mapEntry.beginningResId = entry.id;
+        mapEntry.additionalResId = 0;
+        mapEntry.offsetIndex = quint16(index);
+        _fileMap.append(mapEntry);
+    }
+
+    const quint32 count = quint32(entries.size());
+    const quint64 offsetToResources = kHeaderSize + quint64(kMapEntrySize) * count
+                                      + quint64(kOffsetSize) * (count + 1);
+    if (offsetToResources + end > 0xFFFFFFFFu)
+        return false;
+    m_header.mapEntries = quint16(_fileMap.size());
+    m_header.lengthOfMap = kMapEntrySize * count;
+    m_header.offsetToEntries = kMapEntrySize * count + kHeaderSize;
+    m_header.resourceCount = count;
+    m_header.offsetToResources = quint32(offsetToResources);
+    m_header.lengthOfResources = quint32(end);
+    Q_ASSERT(quint32(_fileMap.size()) == m_header.resourceCount);
+
+    for (quint32 &offset : _offsetTable)
+        offset += quint32(offsetToResources);
+    const quint32 last = _offsetTable.last();
+    while (quint32(_offsetTable.size()) < count + 1)
+        _offsetTable.append(last);
+    return true;
+}
+
+QByteArray ResourceStream::Serialize() const
+{
+    QByteArray out;
+    out.reserve(qsizetype(m_header.offsetToResources) + m_header.lengthOfResources);
+    out.append(char(m_header.fileType));
+    out.append(char(m_header.reserved));
+    PutU16(out, m_header.version);
+    PutU16(out, m_header.oldestCodeVersion);
+    PutU16(out, m_header.mapEntries);
+    PutU32(out, m_header.offsetToMap);
+    PutU32(out, m_header.lengthOfMap);
+    PutU32(out, m_header.offsetToEntries);
+    PutU32(out, m_header.resourceCount);
+    PutU32(out, m_header.offsetToResources);
+    PutU32(out, m_header.lengthOfResources);
+    for (const FileMapEntry &entry : _fileMap) {
+        PutU16(out, entry.type);
+        PutU16(out, entry.beginningResId);
+        PutU16(out, entry.additionalResId);
+        PutU16(out, entry.offsetIndex);
+    }
+    for (quint32 offset : _offsetTable)
+        PutU32(out, offset);
+    for (const QByteArray &block : _resources)
+        out.append(block);
+    return out;
+}
+
+bool ResourceStream::Save(const QString &path)
+{
+    if (!path.isEmpty())
+        m_name = path;
+    if (m_name.isEmpty() || !ProcessStructures())
+        return false;
+    const QByteArray bytes = Serialize();
+    QSaveFile file(m_name);
+    if (!file.open(QIODevice::WriteOnly))
+        return false;
+    if (file.write(bytes) != bytes.size()) {
+        file.cancelWriting();
+        return false;
+    }
+    return file.commit();
+}
+
+bool ResourceStream::SaveTo(QByteArray &bytes)
+{
+    if (!ProcessStructures())
+        return false;
+    bytes = Serialize();
+    return true;
+}
+
+void ResourceStream::AddResource(quint16 type, quint16 id, const QByteArray &data)
+{
+    m_table[type][id] = data;
+}
+
+void ResourceStream::DeleteResource(quint16 type, quint16 id)
+{
+    auto it = m_table.find(type);
+    if (it != m_table.end())
+        it->remove(id);
+}
+
+QByteArray ResourceStream::GetResource(quint16 type, quint16 id) const
+{
+    auto it = m_table.constFind(type);
+    if (it == m_table.constEnd())
+        return QByteArray();
+    return it->value(id);
+}
+
+unsigned int ResourceStream::GetResourceTypes(QVector<quint16> &types) const
+{
+    types.clear();
+    for (auto it = m_table.constBegin(); it != m_table.constEnd(); ++it)
+        types.append(it.key());
+    return unsigned(types.size());
+}
+
+unsigned int ResourceStream::GetResourceIDs(quint16 type, QVector<quint16> &ids) const
+{
+    ids.clear();
+    auto it = m_table.constFind(type);
+    if (it != m_table.constEnd()) {
+        for (auto id = it->constBegin(); id != it->constEnd(); ++id)
+            ids.append(id.key());
+    }
+    return unsigned(ids.size());
+}
+
+unsigned int ResourceStream::GetResources(QVector<ResourceEntry> &entries) const
+{
+    entries.clear();
+    for (auto type = m_table.constBegin(); type != m_table.constEnd(); ++type) {
+        for (auto id = type->constBegin(); id != type->constEnd(); ++id) {
+            ResourceEntry entry;
+            entry.type = type.key();
+            entry.id = id.key();
+            entry.data = id.value();
+            entries.append(entry);
+        }
+    }
+    return unsigned(entries.size());
+}
+
+void ResourceStream::Clear()
+{
+    m_name.clear();
+    m_table.clear();
+    m_header.Reset();
+    _fileMap.clear();
+    _offsetTable.clear();
+    _resources.clear();
+}
+
+QString ResourceStream::Dump() const
+{
+    QString text = QStringLiteral("=== Header ===\n");
+    text += Line("   FileType:             %1(0x%2)\n", m_header.fileType);
+    text += Line("   Version:              %1(0x%2)\n", m_header.version);
+    text += Line("   Oldest Code Version:  %1(0x%2)\n", m_header.oldestCodeVersion);
+    text += Line("   Number of Map Entries:%1(0x%2)\n", m_header.mapEntries);
+    text += Line("   Offset to Map:        %1(0x%2)\n", m_header.offsetToMap);
+    text += Line("   Length of Map:        %1(0x%2)\n", m_header.lengthOfMap);
+    text += Line("   Offset to Entries:    %1(0x%2)\n", m_header.offsetToEntries);
+    text += Line("   Number of Resources:  %1(0x%2)\n", m_header.resourceCount);
+    text += Line("   Offset to Resources:  %1(0x%2)\n", m_header.offsetToResources);
+    text += Line("   Length of Resources:  %1(0x%2)\n", m_header.lengthOfResources);
+
+    text += QStringLiteral("=== FileMap ===\n");
+    text += QStringLiteral("   Entries:%1\n").arg(_fileMap.size());
+    for (const FileMapEntry &entry : _fileMap) {
+        text += QStringLiteral("   === FileMapEntry ===\n");
+        text += Line("      Type:              %1(0x%2)\n", entry.type);
+        text += Line("      Beginning Res ID:  %1(0x%2)\n", entry.beginningResId);
+        text += Line("      Additional Res ID: %1(0x%2)\n", entry.additionalResId);
+        text += Line("      Offset Index:      %1(0x%2)\n", entry.offsetIndex);
+    }
+    text += QStringLiteral("\n");
+
+    text += QStringLiteral("   === Offset Table ===\n");
+    text += QStringLiteral("      Count: %1\n").arg(_offsetTable.size());
+    for (quint32 offset : _offsetTable)
+        text += Line("      Offset: %1 (0x%2)\n", offset);
+
+    text += QStringLiteral("=== Resources ===\n");
+    text += QStringLiteral("   Number of: %1\n").arg(_resources.size());
+    for (const QByteArray &block : _resources)
+        text += QStringLiteral("    Resource: %1\n").arg(block.size());
+    return text;
+}

@@ -1,0 +1,58 @@
+#pragma once
+
+#include "common/export.h"
+
+#include <QByteArray>
+#include <QDomElement>
+#include <QList>
+#include <QObject>
+#include <QVariant>
+
+#include <memory>
+
+// One system resource (resource type 0x6000): a key and the fields of its
+// type, decoded into named properties. The block is little-endian: keysize
+// (16 bits), type (32 bits), the key, then the fields of the type. Property
+// names are the ones stored in manifests and are kept as they stand
+// ("Privildedge Index" included).
+//
+// Copies carry type, keysize, data and every property; each record owns its
+// own properties object.
+struct HARNESS_EXPORT SysResource
+{
+    // Program records.
+    static constexpr quint32 kTypeProgram = 0x0102C305;
+    static constexpr quint32 kTypeProgramAlt = 0x0102FAF7;
+
+    SysResource();
+    virtual ~SysResource();
+    SysResource(const SysResource &other);
+    SysResource &operator=(const SysResource &other);
+
+    // Reads the record from an element written by WriteToXML: attributes
+    // "type" and "keysize" (decimal), children "data" and "properties" with
+    // "property" elements ("name", "value"). Property values come back as
+    // byte arrays; data comes back empty.
+    virtual void ReadFromXML(const QDomElement &element);
+    // Writes "type", "keysize", an empty "data" child when data is not empty
+    // and a "properties" child when there is at least one property (holding
+    // the properties whose text is not empty).
+    virtual void WriteToXML(QDomElement &element);
+
+    // Type and keysize 0, no properties (data is kept).
+    void Reset();
+    // Decodes data (keysize, type, key, fields) into the record. Values past
+    // the end of the block read as 0; byte fields take only the bytes there.
+    void Decode();
+
+    QVariant Property(const char *name) const;
+    void SetProperty(const char *name, const QVariant &value);
+    // Names of the properties, in the order they were set.
+    QList<QByteArray> PropertyNames() const;
+    bool IsProgram() const { return type == kTypeProgram || type == kTypeProgramAlt; }
+
+    quint16 keysize = 0;
+    quint32 type = 0;
+    QByteArray data;
+    std::unique_ptr<QObject> properties;
+};

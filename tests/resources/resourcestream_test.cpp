@@ -1,0 +1,391 @@
+#include "resources/resourcestream.h"
+
+#include "support/testutil.h"
+
+#include <QFile>
+#include <QRandomGenerator>
+#include <QTemporaryDir>
+#include <QtEndian>
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <initializer_list>
+
+namespace {
+
+using testutil::ReadFile;
+
+QByteArray Hex(const char *hex)
+{
+    return QByteArray::fromHex(hex);
+}
+
+void U16(QByteArray &out, quint16 value)
+{
+    out.append(char(value & 0xFF)).append(char(value >> 8));
+}
+
+void U32(QByteArray &out, quint32 value)
+{
+    for (int i = 0; i < 4; ++i)
+        out.append(char((value >> (8 * i)) & 0xFF));
+}
+
+// A resource file put together by hand: header counts as given, map entries
+// as {type, first ID, additional IDs, offset index}, the offsets as given.
+QByteArray Compose(std::initializer_list<std::initializer_list<quint16>> map, std::initializer_list<quint32> offsets,
+                   const QByteArray &data, quint32 resourceCount)
+{
+    QByteArray out;
+    out.append(char(17)).append(char(0));
+    U16(out, 1);
+    U16(out, 1);
+    U16(out, quint16(map.size()));
+    U32(out, 32);
+    U32(out, quint32(8 * map.size()));
+    U32(out, quint32(32 + 8 * map.size()));
+    U32(out, resourceCount);
+    U32(out, quint32(32 + 8 * map.size() + 4 * offsets.size()));
+    U32(out, quint32(data.size()));
+    for (const auto &entry : map) {
+        for (quint16 field : entry)
+            U16(out, field);
+    }
+    for (quint32 offset : offsets)
+        U32(out, offset);
+    return out + data;
+}
+
+// A file that uses every feature: a shared block, an empty block, a range.
+QByteArray RichFile()
+{
+    // Map 4 entries (32 bytes) and 6 offsets (24 bytes): data at 88.
+    return Compose({{1, 6, 0, 0}, {5, 10, 2, 1}, {5, 20, 0, 0}, {7, 1, 0, 4}}, {88, 91, 91, 95, 96, 96},
+                   "abc" "wxyz" "!", 5);
+}
+
+QByteArray Save(ResourceStream &stream)
+{
+    QByteArray bytes;
+    EXPECT_TRUE(stream.SaveTo(bytes));
+    return bytes;
+}
+
+TEST(ResourceStream, OnePairOfFiveBytesSavesAs53Bytes)
+{
+    QTemporaryDir dir;
+    ResourceStream stream;
+    stream.AddResource(1, 1, "hello");
+    ASSERT_TRUE(stream.Save(dir.filePath("one.kar")));
+    const QByteArray expected = Hex("11 00 0100 0100 0100 20000000 08000000 28000000 01000000 30000000 05000000"
+                                    "0100 0100 0000 0000"
+                                    "30000000 35000000")
+                                + "hello";
+    ASSERT_EQ(expected.size(), 53);
+    EXPECT_EQ(ReadFile(dir.filePath("one.kar")), expected);
+    EXPECT_EQ(Save(stream), expected);
+}
+
+TEST(ResourceStream, DumpShowsTheStructuresAsWritten)
+{
+    ResourceStream stream;
+    stream.AddResource(1, 1, "hello");
+    Save(stream);
+    const QString expected = QStringLiteral(
+        "=== Header ===\n"
+        "   FileType:             17(0x      11)\n"
+        "   Version:              1(0x       1)\n"
+        "   Oldest Code Version:  1(0x       1)\n"
+        "   Number of Map Entries:1(0x       1)\n"
+        "   Offset to Map:        32(0x      20)\n"
+        "   Length of Map:        8(0x       8)\n"
+        "   Offset to Entries:    40(0x      28)\n"
+        "   Number of Resources:  1(0x       1)\n"
+        "   Offset to Resources:  48(0x      30)\n"
+        "   Length of Resources:  5(0x       5)\n"
+        "=== FileMap ===\n"
+        "   Entries:1\n"
+        "   === FileMapEntry ===\n"
+        "      Type:              1(0x       1)\n"
+        "      Beginning Res ID:  1(0x       1)\n"
+        "      Additional Res ID: 0(0x       0)\n"
+        "      Offset Index:      0(0x       0)\n"
+        "\n"
+        "   === Offset Table ===\n"
+        "      Count: 2\n"
+        "      Offset: 48 (0x      30)\n"
+        "      Offset: 53 (0x      35)\n"
+        "=== Resources ===\n"
+        "   Number of: 1\n"
+        "    Resource: 5\n");
+    EXPECT_EQ(stream.Dump(), expected);
+}
+
+TEST(ResourceStream, IdenticalBlocksAreStoredOnceAndTheOffsetTableRepeatsItsEnd)
+{
+    ResourceStream stream;
+    stream.AddResource(2, 1, "same");
+    stream.AddResource(2, 9, "same");
+    const QByteArray expected = Hex("11 00 0100 0100 0200 20000000 10000000 30000000 02000000 3C000000 04000000"
+                                    "0200 0100 0000 0000"
+                                    "0200 0900 0000 0000"
+                                    "3C000000 40000000 40000000")
+                                + "same";
+    EXPECT_EQ(Save(stream), expected);
+}
+
+TEST(ResourceStream, FirstEqualBlockWinsAmongMany)
+{
+    ResourceStream stream;
+    stream.AddResource(1, 1, "a");
+    stream.AddResource(1, 2, "b");
+    stream.AddResource(1, 3, "a");
+    stream.AddResource(2, 1, "b");
+    stream.AddResource(2, 2, QByteArray());
+    stream.AddResource(2, 3, "");
+    const QByteArray bytes = Save(stream);
+    // Map entries start at 32: offset indexes 0, 1, 0, 1, 2, 2.
+    const quint16 expectedIndexes[] = {0, 1, 0, 1, 2, 2};
+    for (int i = 0; i < 6; ++i)
+        EXPECT_EQ(qFromLittleEndian<quint16>(bytes.constData() + 32 + 8 * i + 6), expectedIndexes[i]) << i;
+    EXPECT_TRUE(bytes.endsWith("ab"));
+}
+
+TEST(ResourceStream, EmptyBlockBetweenTwoOthersKeepsItsOwnIndex)
+{
+    ResourceStream stream;
+    stream.AddResource(1, 1, "abc");
+    stream.AddResource(1, 2, "");
+    stream.AddResource(1, 3, "de");
+    const QByteArray bytes = Save(stream);
+    // 3 map entries, 4 offsets: data at 32 + 24 + 16 = 72.
+    EXPECT_EQ(bytes.mid(56, 16), Hex("48000000 4B000000 4B000000 4D000000"));
+    EXPECT_EQ(qFromLittleEndian<quint16>(bytes.constData() + 32 + 8 + 6), 1);
+    EXPECT_EQ(qFromLittleEndian<quint16>(bytes.constData() + 32 + 16 + 6), 2);
+
+    ResourceStream loaded;
+    ASSERT_TRUE(loaded.LoadFrom(bytes));
+    EXPECT_EQ(loaded.GetResource(1, 1), QByteArray("abc"));
+    EXPECT_TRUE(loaded.GetResource(1, 2).isEmpty());
+    EXPECT_FALSE(loaded.GetResource(1, 2).isNull());
+    EXPECT_EQ(loaded.GetResource(1, 3), QByteArray("de"));
+    EXPECT_EQ(Save(loaded), bytes);
+}
+
+TEST(ResourceStream, MapRangeLoadsAsConsecutiveIds)
+{
+    const QByteArray file = Compose({{5, 10, 2, 0}}, {52, 53, 55, 58}, "ABBCCC", 3);
+    ResourceStream stream;
+    ASSERT_TRUE(stream.LoadFrom(file));
+    QVector<quint16> ids;
+    EXPECT_EQ(stream.GetResourceIDs(5, ids), 3u);
+    EXPECT_EQ(ids, (QVector<quint16>{10, 11, 12}));
+    EXPECT_EQ(stream.GetResource(5, 10), QByteArray("A"));
+    EXPECT_EQ(stream.GetResource(5, 11), QByteArray("BB"));
+    EXPECT_EQ(stream.GetResource(5, 12), QByteArray("CCC"));
+    EXPECT_EQ(stream.GetResourceHeader()->resourceCount, 3u);
+}
+
+TEST(ResourceStream, RichFileLoadsAndOverlappingRangesLetTheFirstEntryWin)
+{
+    ResourceStream stream;
+    ASSERT_TRUE(stream.LoadFrom(RichFile()));
+    QVector<ResourceEntry> entries;
+    ASSERT_EQ(stream.GetResources(entries), 6u);
+    EXPECT_EQ(stream.GetResource(1, 6), QByteArray("abc"));
+    EXPECT_TRUE(stream.GetResource(5, 10).isEmpty());
+    EXPECT_EQ(stream.GetResource(5, 11), QByteArray("wxyz"));
+    EXPECT_EQ(stream.GetResource(5, 12), QByteArray("!"));
+    EXPECT_EQ(stream.GetResource(5, 20), QByteArray("abc"));
+    EXPECT_TRUE(stream.GetResource(7, 1).isEmpty());
+
+    const QByteArray overlap = Compose({{3, 1, 1, 0}, {3, 2, 0, 2}}, {48 + 12, 61, 62, 63}, "xyz", 3);
+    ResourceStream second;
+    ASSERT_TRUE(second.LoadFrom(overlap));
+    EXPECT_EQ(second.GetResource(3, 2), QByteArray("y"));
+}
+
+TEST(ResourceStream, EmptiedTypeStaysListedAndIsNotWritten)
+{
+    ResourceStream stream;
+    stream.AddResource(4, 1, "x");
+    stream.AddResource(9, 1, "y");
+    stream.DeleteResource(4, 1);
+    stream.DeleteResource(4, 2);
+    stream.DeleteResource(8, 1);
+    QVector<quint16> types;
+    EXPECT_EQ(stream.GetResourceTypes(types), 2u);
+    EXPECT_EQ(types, (QVector<quint16>{4, 9}));
+    QVector<quint16> ids;
+    EXPECT_EQ(stream.GetResourceIDs(4, ids), 0u);
+    ResourceStream loaded;
+    ASSERT_TRUE(loaded.LoadFrom(Save(stream)));
+    EXPECT_EQ(loaded.GetResourceTypes(types), 1u);
+    EXPECT_EQ(types.first(), 9);
+    EXPECT_TRUE(stream.GetResource(4, 1).isNull());
+}
+
+TEST(ResourceStream, SaveWithoutPathWritesBackToTheLoadedFile)
+{
+    QTemporaryDir dir;
+    const QString path = dir.filePath("back.kar");
+    ResourceStream first;
+    first.AddResource(1, 1, "one");
+    ASSERT_TRUE(first.Save(path));
+
+    ResourceStream stream;
+    EXPECT_FALSE(stream.Save(QString()));
+    ASSERT_TRUE(stream.Load(path));
+    EXPECT_EQ(stream.Name(), path);
+    stream.AddResource(1, 2, "two");
+    ASSERT_TRUE(stream.Save(QString()));
+    ResourceStream check;
+    ASSERT_TRUE(check.Load(path));
+    EXPECT_EQ(check.GetResource(1, 2), QByteArray("two"));
+}
+
+TEST(ResourceStream, SaveFailuresLeaveTheFileAlone)
+{
+    QTemporaryDir dir;
+    const QString path = dir.filePath("keep.kar");
+    testutil::WriteFile(path, "old");
+    ResourceStream empty;
+    EXPECT_FALSE(empty.Save(path));
+    QByteArray bytes("untouched");
+    EXPECT_FALSE(empty.SaveTo(bytes));
+    EXPECT_EQ(bytes, QByteArray("untouched"));
+    ResourceStream stream;
+    stream.AddResource(1, 1, "x");
+    EXPECT_FALSE(stream.Save(dir.filePath("no/such/dir/x.kar")));
+    EXPECT_EQ(ReadFile(path), QByteArray("old"));
+    EXPECT_FALSE(stream.Load(dir.filePath("missing.kar")));
+    EXPECT_FALSE(stream.Load(QString()));
+}
+
+TEST(ResourceStream, At65535PairsSavesAndOneMoreIsRefused)
+{
+    ResourceStream stream;
+    for (int i = 0; i < 65535; ++i)
+        stream.AddResource(quint16(1 + i / 65536), quint16(i), QByteArray::number(i % 1000));
+    QByteArray bytes;
+    ASSERT_TRUE(stream.SaveTo(bytes));
+    EXPECT_EQ(stream.GetResourceHeader()->resourceCount, 65535u);
+    EXPECT_EQ(stream.GetResourceHeader()->lengthOfResources, quint32(10 * 1 + 90 * 2 + 900 * 3));
+    ResourceStream loaded;
+    ASSERT_TRUE(loaded.LoadFrom(bytes));
+    EXPECT_EQ(loaded.GetResource(1, 61234), QByteArray("234"));
+
+    stream.AddResource(2, 0, "x");
+    QByteArray more("keep");
+    EXPECT_FALSE(stream.SaveTo(more));
+    EXPECT_EQ(more, QByteArray("keep"));
+}
+
+TEST(ResourceStream, CopiesAreIndependent)
+{
+    ResourceStream original;
+    original.AddResource(1, 1, "a");
+    Save(original);
+    ResourceStream copy(original);
+    copy.AddResource(1, 2, "b");
+    Save(copy);
+    EXPECT_TRUE(original.GetResource(1, 2).isNull());
+    EXPECT_EQ(original.GetResourceHeader()->resourceCount, 1u);
+    EXPECT_EQ(copy.GetResourceHeader()->resourceCount, 2u);
+    original = copy;
+    copy.Clear();
+    EXPECT_EQ(original.GetResource(1, 2), QByteArray("b"));
+    EXPECT_EQ(copy.GetResourceHeader()->offsetToMap, 32u);
+    EXPECT_EQ(copy.GetResourceHeader()->resourceCount, 0u);
+}
+
+TEST(ResourceStream, EntriesOrderByTypeAndIdOrByBytes)
+{
+    ResourceEntry a{0, 1, 9, "zz"};
+    ResourceEntry b{0, 2, 1, "aa"};
+    EXPECT_TRUE(a < b);
+    EXPECT_FALSE(b < a);
+    a.compareMode = 1;
+    EXPECT_FALSE(a < b);
+    b.compareMode = 1;
+    EXPECT_TRUE(b < a);
+}
+
+// Corrupt inputs: each must load or fail without crashing, a failure must
+// leave the stream as it was, and nothing may describe more than the input.
+struct CorruptCase
+{
+    const char *name;
+    QByteArray bytes;
+};
+
+class ResourceStreamCorrupt : public ::testing::TestWithParam<CorruptCase>
+{
+};
+
+TEST_P(ResourceStreamCorrupt, IsRejectedAndChangesNothing)
+{
+    ResourceStream stream;
+    stream.AddResource(3, 3, "kept");
+    EXPECT_FALSE(stream.LoadFrom(GetParam().bytes));
+    EXPECT_EQ(stream.GetResource(3, 3), QByteArray("kept"));
+    EXPECT_EQ(stream.GetResourceHeader()->resourceCount, 0u);
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    ResourceStream, ResourceStreamCorrupt,
+    ::testing::Values(
+        CorruptCase{"Empty", QByteArray()}, CorruptCase{"ShortHeader", QByteArray(31, '\0')},
+        CorruptCase{"HugeResourceCount", Compose({}, {}, QByteArray(), 0xFFFFFFFFu)},
+        CorruptCase{"MapCountPastInput", Compose({{1, 1, 0, 0}}, {48, 49}, "x", 1).left(40)},
+        CorruptCase{"OffsetsRunBackwards", Compose({{1, 1, 0, 0}, {1, 2, 0, 1}}, {60, 62, 61}, "xy", 2)},
+        CorruptCase{"OffsetPastInput", Compose({{1, 1, 0, 0}}, {48, 4000}, "x", 1)},
+        CorruptCase{"OffsetIndexPastBlocks", Compose({{1, 1, 0, 1}}, {48, 49}, "x", 1)},
+        CorruptCase{"RangePastBlocks", Compose({{5, 10, 3, 0}}, {52, 53, 55, 58}, "ABBCCC", 3)},
+        CorruptCase{"RangesCoverMoreIdsThanInputBytes",
+                    Compose({{1, 0, 65535, 0}, {2, 0, 65535, 0}}, {48, 49}, "x", 1)}),
+    [](const ::testing::TestParamInfo<CorruptCase> &info) { return std::string(info.param.name); });
+
+TEST(ResourceStream, EveryPrefixOfAValidFileFailsCleanly)
+{
+    const QByteArray file = RichFile();
+    for (int length = 0; length < file.size(); ++length) {
+        ResourceStream stream;
+        stream.AddResource(3, 3, "kept");
+        EXPECT_FALSE(stream.LoadFrom(file.left(length))) << length;
+        EXPECT_EQ(stream.GetResource(3, 3), QByteArray("kept")) << length;
+    }
+    ResourceStream stream;
+    EXPECT_TRUE(stream.LoadFrom(file));
+}
+
+TEST(ResourceStream, RandomByteFlipsLoadOrFailCleanly)
+{
+    ResourceStream source;
+    for (quint16 i = 0; i < 20; ++i)
+        source.AddResource(quint16(1 + i % 3), i, QByteArray(i % 7, char('a' + i % 5)));
+    const QByteArray file = Save(source);
+    QRandomGenerator random(20261206);
+    int loaded = 0;
+    for (int round = 0; round < 3000; ++round) {
+        QByteArray bytes = file;
+        const int flips = 1 + int(random.bounded(4));
+        for (int f = 0; f < flips; ++f)
+            bytes[int(random.bounded(bytes.size()))] = char(random.bounded(256));
+        ResourceStream stream;
+        if (!stream.LoadFrom(bytes))
+            continue;
+        ++loaded;
+        QVector<ResourceEntry> entries;
+        stream.GetResources(entries);
+        // Never more table entries than the input has bytes.
+        EXPECT_LE(qint64(entries.size()), qint64(bytes.size()));
+        for (const ResourceEntry &entry : std::as_const(entries))
+            EXPECT_LE(entry.data.size(), bytes.size());
+        stream.Dump();
+    }
+    EXPECT_GT(loaded, 0);
+}
+
+} // namespace
