@@ -18,12 +18,22 @@ bool IsXmlChar(char32_t c)
         || (c >= 0xE000 && c <= 0xFFFD) || (c >= 0x10000 && c <= 0x10FFFF);
 }
 
-void AppendEscaped(QString &out, const QString &text, bool attribute)
+void AppendCharacterReference(QString &out, char32_t c)
+{
+    out += QLatin1String("&#x") + QString::number(static_cast<uint>(c), 16) + QLatin1Char(';');
+}
+
+void AppendEscaped(QString &out, const QString &text, bool attribute, bool ascii)
 {
     const qsizetype n = text.size();
     for (qsizetype i = 0; i < n; ++i) {
         const QChar c = text.at(i);
         if (c.isHighSurrogate() && i + 1 < n && text.at(i + 1).isLowSurrogate()) {
+            if (ascii) {
+                AppendCharacterReference(out, QChar::surrogateToUcs4(c, text.at(i + 1)));
+                ++i;
+                continue;
+            }
             out += c;
             out += text.at(++i);
             continue;
@@ -45,7 +55,11 @@ void AppendEscaped(QString &out, const QString &text, bool attribute)
         default:
             break;
         }
-        out += IsXmlChar(c.unicode()) && !c.isSurrogate() ? c : QChar(0xFFFD);
+        const QChar kept = IsXmlChar(c.unicode()) && !c.isSurrogate() ? c : QChar(0xFFFD);
+        if (ascii && kept.unicode() > 0x7F)
+            AppendCharacterReference(out, kept.unicode());
+        else
+            out += kept;
     }
 }
 
@@ -55,20 +69,38 @@ QString Quoted(const QString &value)
     return quote + value + quote;
 }
 
+// The nodes of a map ordered by name: Qt keeps attributes and declarations
+// in a seeded hash, so their own order changes from run to run.
+std::vector<QDomNode> SortedByName(const QDomNamedNodeMap &map)
+{
+    std::vector<QDomNode> sorted;
+    sorted.reserve(static_cast<size_t>(map.count()));
+    for (int i = 0; i < map.count(); ++i)
+        sorted.push_back(map.item(i));
+    std::sort(sorted.begin(), sorted.end(), [](const QDomNode &a, const QDomNode &b) {
+        return a.nodeName() < b.nodeName();
+    });
+    return sorted;
+}
+
+// Character data and entity references run inline: no indent or line end is
+// added around them.
 bool IsTextLike(const QDomNode &node)
 {
-    return !node.isNull() && (node.isText() || node.isCDATASection());
+    return !node.isNull() && (node.isText() || node.isCDATASection() || node.isEntityReference());
 }
 
 class Writer
 {
 public:
-    explicit Writer(int indent) : m_indent(indent < 0 ? 0 : indent) {}
+    Writer(int indent, bool ascii) : m_indent(indent < 0 ? 0 : indent), m_ascii(ascii) {}
 
     void Save(const QDomNode &node, int depth)
     {
         switch (node.nodeType()) {
         case QDomNode::DocumentNode:
+            SaveDocument(node.toDocument(), depth);
+            break;
         case QDomNode::DocumentFragmentNode:
             SaveChildren(node, depth);
             break;
@@ -76,13 +108,16 @@ public:
             SaveElement(node.toElement(), depth);
             break;
         case QDomNode::TextNode:
-            AppendEscaped(m_out, node.nodeValue(), false);
+            AppendEscaped(m_out, node.nodeValue(), false, m_ascii);
             break;
         case QDomNode::CDATASectionNode: {
             // "]]>" cannot stand inside a section: split it across two.
             QString value = node.nodeValue();
             value.replace(QLatin1String("]]>"), QLatin1String("]]]]><![CDATA[>"));
-            m_out += QLatin1String("<![CDATA[") + value + QLatin1String("]]>");
+            if (m_ascii)
+                SaveAsciiCData(value);
+            else
+                m_out += QLatin1String("<![CDATA[") + value + QLatin1String("]]>");
             break;
         }
         case QDomNode::CommentNode:
@@ -114,10 +149,56 @@ public:
     QString Result() const { return m_out; }
 
 private:
+    // A section cannot hold character references: non-ASCII runs are
+    // written between sections, escaped as text.
+    void SaveAsciiCData(const QString &value)
+    {
+        qsizetype start = 0;
+        const qsizetype n = value.size();
+        while (start < n) {
+            qsizetype end = start;
+            while (end < n && value.at(end).unicode() <= 0x7F)
+                ++end;
+            if (end > start)
+                m_out += QLatin1String("<![CDATA[") + value.mid(start, end - start) + QLatin1String("]]>");
+            qsizetype other = end;
+            while (other < n && value.at(other).unicode() > 0x7F)
+                ++other;
+            AppendEscaped(m_out, value.mid(end, other - end), false, true);
+            start = other;
+        }
+        if (n == 0)
+            m_out += QLatin1String("<![CDATA[]]>");
+    }
+
     void SaveChildren(const QDomNode &node, int depth)
     {
         for (QDomNode child = node.firstChild(); !child.isNull(); child = child.nextSibling())
             Save(child, depth);
+    }
+
+    // Qt keeps a parsed document type declaration beside the document's
+    // children rather than among them; it is written where it stood: after
+    // the XML declaration, before everything else.
+    void SaveDocument(const QDomDocument &document, int depth)
+    {
+        const QDomDocumentType type = document.doctype();
+        bool typePending = !type.isNull() && !type.name().isEmpty();
+        for (QDomNode child = document.firstChild(); !child.isNull(); child = child.nextSibling()) {
+            if (child.isDocumentType())
+                typePending = false;
+        }
+        for (QDomNode child = document.firstChild(); !child.isNull(); child = child.nextSibling()) {
+            const bool declaration = child.isProcessingInstruction()
+                && child.toProcessingInstruction().target() == QLatin1String("xml");
+            if (typePending && !declaration) {
+                SaveDocumentType(type);
+                typePending = false;
+            }
+            Save(child, depth);
+        }
+        if (typePending)
+            SaveDocumentType(type);
     }
 
     void Indent(const QDomNode &node, int depth)
@@ -138,17 +219,10 @@ private:
         const QString name = element.tagName();
         m_out += QLatin1Char('<') + name;
 
-        const QDomNamedNodeMap attributes = element.attributes();
-        std::vector<QDomAttr> sorted;
-        sorted.reserve(static_cast<size_t>(attributes.count()));
-        for (int i = 0; i < attributes.count(); ++i)
-            sorted.push_back(attributes.item(i).toAttr());
-        std::sort(sorted.begin(), sorted.end(), [](const QDomAttr &a, const QDomAttr &b) {
-            return a.name() < b.name();
-        });
-        for (const QDomAttr &attr : sorted) {
+        for (const QDomNode &node : SortedByName(element.attributes())) {
+            const QDomAttr attr = node.toAttr();
             m_out += QLatin1Char(' ') + attr.name() + QLatin1String("=\"");
-            AppendEscaped(m_out, attr.value(), true);
+            AppendEscaped(m_out, attr.value(), true, m_ascii);
             m_out += QLatin1Char('"');
         }
 
@@ -180,10 +254,10 @@ private:
         const QDomNamedNodeMap notations = type.notations();
         if (entities.count() > 0 || notations.count() > 0) {
             m_out += QLatin1String(" [\n");
-            for (int i = 0; i < entities.count(); ++i)
-                SaveEntity(entities.item(i).toEntity());
-            for (int i = 0; i < notations.count(); ++i)
-                SaveNotation(notations.item(i).toNotation());
+            for (const QDomNode &entity : SortedByName(entities))
+                SaveEntity(entity.toEntity());
+            for (const QDomNode &notation : SortedByName(notations))
+                SaveNotation(notation.toNotation());
             m_out += QLatin1Char(']');
         }
         m_out += QLatin1String(">\n");
@@ -197,7 +271,7 @@ private:
         m_out += QLatin1String("<!ENTITY ") + name + QLatin1Char(' ');
         if (entity.systemId().isEmpty() && entity.publicId().isEmpty()) {
             m_out += QLatin1Char('"');
-            AppendEscaped(m_out, entity.nodeValue(), true);
+            AppendEscaped(m_out, entity.nodeValue(), true, m_ascii);
             m_out += QLatin1Char('"');
         } else {
             if (entity.publicId().isEmpty())
@@ -225,6 +299,7 @@ private:
     }
 
     int m_indent;
+    bool m_ascii;
     QString m_out;
 };
 
@@ -232,7 +307,14 @@ private:
 
 QString ToString(const QDomNode &node, int indent)
 {
-    Writer writer(indent);
+    Writer writer(indent, false);
+    writer.Save(node, 0);
+    return writer.Result();
+}
+
+QString ToAsciiString(const QDomNode &node, int indent)
+{
+    Writer writer(indent, true);
     writer.Save(node, 0);
     return writer.Result();
 }

@@ -15,6 +15,12 @@ namespace XmlWriter {
 
 HARNESS_EXPORT QString ToString(const QDomNode &node, int indent = 1);
 
+// ToString for 8-bit files: every character outside ASCII in text, CDATA,
+// attribute and entity values is written as a character reference, so the
+// text reads the same under any encoding its declaration names. Names,
+// comments and processing instructions are written as they are.
+HARNESS_EXPORT QString ToAsciiString(const QDomNode &node, int indent = 1);
+
 // UTF-8 bytes of ToString.
 HARNESS_EXPORT QByteArray Serialize(const QDomNode &node, int indent = 1);
 

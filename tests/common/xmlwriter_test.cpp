@@ -111,4 +111,65 @@ TEST(XmlWriter, OutputIsWellFormedForXmllint)
         << out.constData();
 }
 
+TEST(XmlWriterDeclarations, DocumentTypeFollowsTheXmlDeclarationWithEntitiesByName)
+{
+    const QDomDocument doc = Parse(QStringLiteral(
+        "<?xml version=\"1.0\"?>\n"
+        "<!DOCTYPE pack [<!ENTITY zz SYSTEM \"z.xml\"><!ENTITY aa PUBLIC \"-//A//X\" \"a.xml\">"
+        "<!ENTITY mm SYSTEM \"m.xml\">]>\n"
+        "<!--note--><pack/>"));
+    const QString expected = QStringLiteral("<?xml version='1.0'?>\n"
+                                            "<!DOCTYPE pack [\n"
+                                            "<!ENTITY aa PUBLIC \"-//A//X\" \"a.xml\">\n"
+                                            "<!ENTITY mm SYSTEM \"m.xml\">\n"
+                                            "<!ENTITY zz SYSTEM \"z.xml\">\n"
+                                            "]>\n"
+                                            "<!--note-->\n"
+                                            "<pack/>\n");
+    EXPECT_EQ(XmlWriter::ToString(doc), expected);
+    // The same bytes from a fresh parse (declarations live in a seeded hash).
+    EXPECT_EQ(XmlWriter::ToString(Parse(expected)), expected);
+}
+
+TEST(XmlWriterDeclarations, DocumentTypeWithoutXmlDeclarationComesFirst)
+{
+    EXPECT_EQ(XmlWriter::ToString(Parse(QStringLiteral("<!DOCTYPE a SYSTEM \"a.dtd\"><a/>"))),
+              QStringLiteral("<!DOCTYPE a SYSTEM \"a.dtd\">\n<a/>\n"));
+    EXPECT_EQ(XmlWriter::ToString(Parse(QStringLiteral("<?xml version=\"1.0\"?><a/>"))),
+              QStringLiteral("<?xml version='1.0'?>\n<a/>\n"));
+}
+
+TEST(XmlWriterDeclarations, EntityReferencesRunInline)
+{
+    QDomDocument doc;
+    QDomElement root = doc.createElement(QStringLiteral("a"));
+    doc.appendChild(root);
+    root.appendChild(doc.createTextNode(QStringLiteral("x")));
+    root.appendChild(doc.createEntityReference(QStringLiteral("ref")));
+    QDomElement b = doc.createElement(QStringLiteral("b"));
+    b.appendChild(doc.createEntityReference(QStringLiteral("only")));
+    root.appendChild(b);
+    EXPECT_EQ(XmlWriter::ToString(doc), QStringLiteral("<a>x&ref;<b>&only;</b>\n</a>\n"));
+}
+
+TEST(XmlWriterDeclarations, AsciiStringEscapesEverythingBeyondAscii)
+{
+    QDomDocument doc;
+    QDomElement root = doc.createElement(QStringLiteral("r"));
+    doc.appendChild(root);
+    root.setAttribute(QStringLiteral("v"), QString::fromUtf8("\xc3\xa9\"\xf0\x9f\x98\x80"));
+    root.appendChild(doc.createTextNode(QString::fromUtf8("caf\xc3\xa9 & \xe6\x97\xa5")));
+    root.appendChild(doc.createCDATASection(QString::fromUtf8("a\xc3\xa9]]>b")));
+    root.appendChild(doc.createCDATASection(QString()));
+
+    const QString ascii = XmlWriter::ToAsciiString(doc);
+    EXPECT_EQ(ascii, QStringLiteral("<r v=\"&#xe9;&quot;&#x1f600;\">caf&#xe9; &amp; &#x65e5;"
+                                    "<![CDATA[a]]>&#xe9;<![CDATA[]]]]><![CDATA[>b]]><![CDATA[]]></r>\n"));
+    // Read back, it holds the same text.
+    const QDomDocument back = Parse(ascii);
+    EXPECT_EQ(back.documentElement().attribute(QStringLiteral("v")),
+              QString::fromUtf8("\xc3\xa9\"\xf0\x9f\x98\x80"));
+    EXPECT_EQ(back.documentElement().text(), QString::fromUtf8("caf\xc3\xa9 & \xe6\x97\xa5" "a\xc3\xa9]]>b"));
+}
+
 } // namespace

@@ -1,5 +1,7 @@
 #include "environment/testdirectories.h"
 
+#include "currentdirectory.h"
+
 #include "support/testutil.h"
 
 #include <QDir>
@@ -171,20 +173,6 @@ TEST_F(TestDirectoriesTest, GenerateProPlatformMatchesNameThenDefault)
     EXPECT_TRUE(found.isDefault);
     EXPECT_EQ(TestDirectories::GenerateProPlatform(QStringLiteral("beta")).name, QStringLiteral("beta"));
 }
-
-// Changes the current directory for one test.
-class CurrentDirectory
-{
-public:
-    explicit CurrentDirectory(const QString &path) : m_saved(QDir::currentPath())
-    {
-        QDir::setCurrent(path);
-    }
-    ~CurrentDirectory() { QDir::setCurrent(m_saved); }
-
-private:
-    QString m_saved;
-};
 
 TEST_F(TestDirectoriesTest, ResolveXmlPathSearchOrder)
 {
