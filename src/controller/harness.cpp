@@ -13,7 +13,12 @@ Harness::Harness()
     m_environment.insert(EnvironmentKey::TestDataSpecified, QStringLiteral("false"));
 }
 
-Harness::~Harness() = default;
+Harness::~Harness()
+{
+    // Nobody can reach the connection once the object is gone, so a
+    // connection the host left open is closed rather than leaked.
+    DisconnectTarget();
+}
 
 unsigned int Harness::ListPlatforms(QList<Platform> &platforms)
 {
