@@ -116,7 +116,9 @@ unsigned int GetPlatforms(QList<Platform> &out)
     out.clear();
     QString defaultPath;
     GetDefaultPlatform(defaultPath);
-    const QString defaultUpper = defaultPath.toUpper();
+    // Compared cleaned, so that a root given with a trailing separator still
+    // finds its default platform.
+    const QString defaultUpper = QDir::cleanPath(defaultPath).toUpper();
 
     const QString root = GetPlatformsRoot();
     if (root.isEmpty())
@@ -126,7 +128,8 @@ unsigned int GetPlatforms(QList<Platform> &out)
         platform.path = root + QDir::separator() + entry;
         platform.isPro = entry.contains(QLatin1String("pro"), Qt::CaseInsensitive);
         platform.name = StripProWord(entry);
-        platform.isDefault = !defaultUpper.isEmpty() && platform.path.toUpper() == defaultUpper;
+        platform.isDefault =
+            !defaultUpper.isEmpty() && QDir::cleanPath(platform.path).toUpper() == defaultUpper;
         out.append(platform);
     }
     return static_cast<unsigned int>(out.size());

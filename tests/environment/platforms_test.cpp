@@ -85,6 +85,14 @@ TEST_F(PlatformsTest, DefaultPlatformIsMatchedIgnoringCase)
     ASSERT_EQ(GetPlatforms(platforms), 2u);
     EXPECT_TRUE(platforms[0].isDefault);
     EXPECT_FALSE(platforms[1].isDefault);
+
+    // A root written with a trailing separator still finds its default.
+    env.Set("KESTIX_PLATFORMS_ALL", root + QLatin1Char('/'));
+    env.Set("KESTIX_PLATFORM", root + QStringLiteral("/Foo Pro/bin"));
+    ASSERT_EQ(GetPlatforms(platforms), 2u);
+    EXPECT_EQ(platforms[1].path, root + QStringLiteral("//Foo Pro"));
+    EXPECT_FALSE(platforms[0].isDefault);
+    EXPECT_TRUE(platforms[1].isDefault);
 }
 
 TEST_F(PlatformsTest, PlatformSettingWithoutSeparatorMarksNoPlatform)
@@ -248,24 +256,14 @@ TEST(TestKitNames, TypeNames)
     EXPECT_EQ(TestKit::TypeToName(static_cast<TestKit::KitType>(-1)), QStringLiteral("unknown"));
 }
 
-TEST(EnvironmentReaders, ReturnVariablesAsSet)
+TEST(EnvironmentReaders, EmptyTestSetsRootFallsBackBesidePlatforms)
 {
     testutil::EnvGuard env;
-    env.Set("KESTIX_TOOLSET", QStringLiteral("/sdk/tools/"));
     env.Set("KESTIX_PLATFORMS_ALL", QStringLiteral("/sdk/./platforms"));
-    env.Set("KESTIX_PLATFORM", QStringLiteral("/sdk/platforms/abc/"));
-    env.Set("KESTIX_TESTSET", QStringLiteral("/kits/one/"));
     env.Set("KESTIX_TESTSETS_ALL", QStringLiteral("/kits/../kits"));
-    EXPECT_EQ(GetToolsetSetting(), QStringLiteral("/sdk/tools/"));
-    EXPECT_EQ(GetPlatformsRoot(), QStringLiteral("/sdk/./platforms"));
-    EXPECT_EQ(GetPlatformSetting(), QStringLiteral("/sdk/platforms/abc/"));
-    EXPECT_EQ(GetTestSetSetting(), QStringLiteral("/kits/one/"));
     EXPECT_EQ(GetTestSetsRoot(), QStringLiteral("/kits/../kits"));
-
     env.Set("KESTIX_TESTSETS_ALL", QString());
     EXPECT_EQ(GetTestSetsRoot(), QStringLiteral("/sdk/Tests"));
-    env.Unset("KESTIX_TOOLSET");
-    EXPECT_EQ(GetToolsetSetting(), QString());
 }
 
 struct PackageCase
