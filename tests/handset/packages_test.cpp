@@ -11,6 +11,11 @@
 
 #include <gtest/gtest.h>
 
+#include <chrono>
+#include <thread>
+
+#include <signal.h>
+
 namespace {
 
 using testutil::HandsetFixture;
@@ -255,12 +260,49 @@ TEST_F(BehaviourTest, ModuleWithoutBehaviourStartsAndEndsAtOnce)
     EXPECT_FALSE(device->IsAppletRunning(0x77));
 }
 
+TEST_F(BehaviourTest, ProgramsOfEitherProgramTypeAreFoundByTheirExactName)
+{
+    ModuleSpec other;
+    other.directory = QStringLiteral("other");
+    other.programs = {{QStringLiteral("abc"), QString(), 0x0102C305}, {QStringLiteral("Main"), QString()}};
+    other.behaviour = "echo \"$2\" > \"$HANDSET_MODULE_DIR/run.log\"\n";
+    ASSERT_EQ(device->InstallPackage(fixture.MakePackage(QStringLiteral("other.kestix"), other)), 0u);
+    EXPECT_EQ(device->StartProgram(QStringLiteral("abc"), QString()), 0u);
+    EXPECT_EQ(testutil::ReadFile(Host("fs:/usermods/other/run.log")), QByteArray("abc\n"));
+    EXPECT_EQ(device->StartProgram(QStringLiteral("Main"), QString()), 0u);
+    EXPECT_EQ(device->StartProgram(QStringLiteral("main"), QString()), HANDSET_ERROR_NOT_FOUND);
+    EXPECT_EQ(device->StartProgram(QStringLiteral("ab"), QString()), HANDSET_ERROR_NOT_FOUND);
+}
+
 TEST_F(BehaviourTest, BehaviourThatDoesNotEndIsKilledAfterTheTimeout)
 {
     testutil::WriteFile(Host("fs:/usermods/ctfmod/behaviour"), "echo started > \"$HANDSET_MODULE_DIR/run.log\"\nsleep 30\n");
     static_cast<EmulatedHandset *>(device.get())->SetBehaviourTimeout(200);
     ASSERT_EQ(device->StartProgram(QStringLiteral("ctfmod_k"), QString()), 0u);
     EXPECT_EQ(RunLog(), QByteArray("started\n"));
+}
+
+// True while the process exists and is not a zombie.
+bool IsAlive(qint64 pid)
+{
+    if (::kill(pid_t(pid), 0) != 0)
+        return false;
+    const QByteArray stat = testutil::ReadFile(QStringLiteral("/proc/%1/stat").arg(pid));
+    const int close = stat.lastIndexOf(')');
+    return close < 0 || stat.mid(close + 2, 1) != "Z";
+}
+
+TEST_F(BehaviourTest, NothingTheBehaviourStartedOutlivesTheStartCall)
+{
+    testutil::WriteFile(Host("fs:/usermods/ctfmod/behaviour"),
+                        "sleep 30 &\necho $! > \"$HANDSET_MODULE_DIR/pid\"\n");
+    ASSERT_EQ(device->StartProgram(QStringLiteral("ctfmod_k"), QString()), 0u);
+    const qint64 pid = testutil::ReadFile(Host("fs:/usermods/ctfmod/pid")).trimmed().toLongLong();
+    ASSERT_GT(pid, 0);
+    // The kill is immediate; only the reaping of the orphan may take a moment.
+    for (int i = 0; i < 200 && IsAlive(pid); ++i)
+        std::this_thread::sleep_for(std::chrono::milliseconds(10));
+    EXPECT_FALSE(IsAlive(pid));
 }
 
 } // namespace
