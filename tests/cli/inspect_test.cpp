@@ -1,0 +1,136 @@
+#include "cli_test.h"
+
+#include "support/testutil.h"
+
+#include <QDir>
+#include <QTemporaryDir>
+
+#include <gtest/gtest.h>
+
+namespace {
+
+using testutil::ReadFile;
+using testutil::WriteFile;
+
+class InspectTool : public ::testing::Test
+{
+protected:
+    void SetUp() override { ASSERT_TRUE(dir.isValid()); }
+    QString Path(const QString &name) const { return dir.filePath(name); }
+    QTemporaryDir dir;
+};
+
+TEST_F(InspectTool, CompiledSourceListsDecodedStringsObjectsAndClassIds)
+{
+    WriteFile(Path(QStringLiteral("src.xml")),
+              "<resources>\n"
+              " <string id=\"1\" format=\"UTF-8\">Gr\xc3\xbc\xc3\x9f""e</string>\n"
+              " <string id=\"7\" format=\"GB2312\">\xe4\xb8\xad\xe6\x96\x87</string>\n"
+              " <object id=\"2\" mime=\"text/plain\">abc</object>\n"
+              " <binary type=\"0x5000\" id=\"0\" hex=\"" + QByteArray(80, '0') + "\"/>\n"
+              " <binary type=\"0x5000\" id=\"1\" hex=\"78563412 efbeadde 00000000 11111111\"/>\n"
+              "</resources>\n");
+    const ToolResult compiled = RunTool({QStringLiteral("res"), QStringLiteral("compile"), Path(QStringLiteral("src.xml")),
+                                         Path(QStringLiteral("out.kar"))});
+    ASSERT_EQ(compiled.status, 0) << compiled.err.constData();
+
+    const ToolResult list = RunTool({QStringLiteral("res"), QStringLiteral("list"), Path(QStringLiteral("out.kar"))});
+    ASSERT_EQ(list.status, 0) << list.err.constData();
+    const QString out = QString::fromUtf8(list.out);
+    EXPECT_TRUE(out.contains(QStringLiteral("UTF-8  \"Gr\u00fc\u00dfe\""))) << list.out.constData();
+    EXPECT_TRUE(out.contains(QStringLiteral("\"\u4e2d\u6587\""))) << list.out.constData();
+    EXPECT_TRUE(out.contains(QStringLiteral("text/plain, 3 bytes")));
+
+    // The class ID list stops at its zero value.
+    const ToolResult mif = RunTool({QStringLiteral("mif"), Path(QStringLiteral("out.kar"))});
+    ASSERT_EQ(mif.status, 0) << mif.err.constData();
+    EXPECT_TRUE(mif.out.contains("classes: 2\n  0x12345678\n  0xdeadbeef\napplets: 0")) << mif.out.constData();
+
+    const ToolResult dump = RunTool({QStringLiteral("res"), QStringLiteral("dump"), Path(QStringLiteral("out.kar"))});
+    EXPECT_EQ(dump.status, 0);
+    EXPECT_TRUE(dump.out.startsWith("=== Header ===")) << dump.out.left(200).constData();
+}
+
+TEST_F(InspectTool, BadSourcesAndForeignFilesAreUsageErrors)
+{
+    WriteFile(Path(QStringLiteral("bad.xml")), "<resources><string id=\"70000\">x</string></resources>");
+    WriteFile(Path(QStringLiteral("junk.kar")), "not a resource file at all");
+    const ToolResult bad = RunTool({QStringLiteral("res"), QStringLiteral("compile"), Path(QStringLiteral("bad.xml")),
+                                    Path(QStringLiteral("o.kar"))});
+    EXPECT_EQ(bad.status, 2);
+    EXPECT_TRUE(bad.err.contains("bad id")) << bad.err.constData();
+    EXPECT_FALSE(QFile::exists(Path(QStringLiteral("o.kar"))));
+    EXPECT_EQ(RunTool({QStringLiteral("res"), QStringLiteral("list"), Path(QStringLiteral("junk.kar"))}).status, 2);
+    EXPECT_EQ(RunTool({QStringLiteral("mif"), Path(QStringLiteral("missing.mif"))}).status, 2);
+    EXPECT_EQ(RunTool({QStringLiteral("res"), QStringLiteral("frobnicate"), Path(QStringLiteral("junk.kar"))}).status, 2);
+}
+
+TEST_F(InspectTool, TarListAndCatReadAnArchiveMadeByGnuTar)
+{
+    if (!testutil::HaveProgram(QStringLiteral("tar")))
+        GTEST_SKIP() << "tar not installed";
+    WriteFile(Path(QStringLiteral("pkg/mod/a.txt")), "alpha\n");
+    WriteFile(Path(QStringLiteral("pkg/mod/empty")), "");
+    ASSERT_EQ(testutil::RunProgram(QStringLiteral("tar"), {QStringLiteral("-cf"), Path(QStringLiteral("p.tar")),
+                                                           QStringLiteral("-C"), Path(QStringLiteral("pkg")),
+                                                           QStringLiteral("mod")}),
+              0);
+    const ToolResult list = RunTool({QStringLiteral("tar"), QStringLiteral("list"), Path(QStringLiteral("p.tar"))});
+    ASSERT_EQ(list.status, 0);
+    const QList<QByteArray> lines = list.out.trimmed().split('\n');
+    ASSERT_EQ(lines.size(), 3) << list.out.constData();
+    QStringList names;
+    for (const QByteArray &line : lines) {
+        const QList<QByteArray> fields = line.split('\t');
+        ASSERT_EQ(fields.size(), 3);
+        names << QString::fromUtf8(fields.at(2));
+        if (fields.at(2) == "mod/a.txt")
+            EXPECT_EQ(fields.at(1), "6");
+    }
+    names.sort();
+    EXPECT_EQ(names, (QStringList{QStringLiteral("mod/"), QStringLiteral("mod/a.txt"), QStringLiteral("mod/empty")}));
+
+    const ToolResult cat = RunTool({QStringLiteral("tar"), QStringLiteral("cat"), Path(QStringLiteral("p.tar")),
+                                    QStringLiteral("mod/a.txt")});
+    EXPECT_EQ(cat.status, 0);
+    EXPECT_EQ(cat.out, QByteArray("alpha\n"));
+    EXPECT_EQ(RunTool({QStringLiteral("tar"), QStringLiteral("cat"), Path(QStringLiteral("p.tar")),
+                       QStringLiteral("mod/none")}).status,
+              2);
+}
+
+TEST_F(InspectTool, EncodeMatchesIconvAfterTheMarkAndDecodeReadsItBack)
+{
+    if (!testutil::HaveProgram(QStringLiteral("iconv")))
+        GTEST_SKIP() << "iconv not installed";
+    struct Case
+    {
+        const char *format;
+        const char *iconvName;
+        QByteArray mark;
+    };
+    const QString text = QStringLiteral("\u4e2d\u6587 A");  // 中文 A
+    WriteFile(Path(QStringLiteral("text.txt")), text.toUtf8());
+    for (const Case &c : {Case{"S-JIS", "SHIFT_JIS", QByteArray("\xfd\xfe")}, Case{"GB2312", "GB2312", QByteArray("\xfc\xfe")},
+                          Case{"UTF-8", "UTF-8", QByteArray("\x02")}}) {
+        QByteArray expected;
+        ASSERT_EQ(testutil::RunProgram(QStringLiteral("sh"),
+                                       {QStringLiteral("-c"), QStringLiteral("iconv -f UTF-8 -t %1 '%2'")
+                                                                  .arg(QLatin1String(c.iconvName), Path(QStringLiteral("text.txt")))},
+                                       &expected),
+                  0);
+        const ToolResult encoded = RunTool({QStringLiteral("encode"), QLatin1String(c.format), text});
+        ASSERT_EQ(encoded.status, 0) << c.format;
+        const QByteArray bytes = QByteArray::fromHex(encoded.out.trimmed().replace(' ', ""));
+        EXPECT_TRUE(bytes.startsWith(c.mark)) << c.format << " " << encoded.out.constData();
+        EXPECT_EQ(bytes.mid(c.mark.size()), expected) << c.format;
+
+        const ToolResult decoded = RunTool({QStringLiteral("decode"), QString::fromLatin1(encoded.out.trimmed())});
+        ASSERT_EQ(decoded.status, 0) << c.format;
+        EXPECT_EQ(QString::fromUtf8(decoded.out), QLatin1String(c.format) + QLatin1Char('\t') + text + QLatin1Char('\n'));
+    }
+    EXPECT_EQ(RunTool({QStringLiteral("encode"), QStringLiteral("EBCDIC"), QStringLiteral("x")}).status, 2);
+    EXPECT_EQ(RunTool({QStringLiteral("decode"), QStringLiteral("0g")}).status, 2);
+}
+
+} // namespace
