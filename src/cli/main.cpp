@@ -1,5 +1,7 @@
 #include "cli/commands.h"
 
+#include "controller/harness.h"
+
 #include <QCoreApplication>
 
 #include <cstdio>
@@ -66,7 +68,10 @@ int main(int argc, char **argv)
         if (name == QLatin1String(command.name)) {
             QStringList rest = arguments.mid(2);
             rest.prepend(QStringLiteral("harness ") + name);
-            return command.run(rest);
+            Harness::Initialize();
+            const int status = command.run(rest);
+            Harness::Uninitialize();
+            return status;
         }
     }
     Err(QStringLiteral("harness: unknown command '%1'\n\n").arg(name) + Usage(commands));
