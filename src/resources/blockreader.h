@@ -1,7 +1,6 @@
 #pragma once
 
 #include <QByteArray>
-#include <QtEndian>
 
 #include <algorithm>
 
@@ -40,7 +39,9 @@ private:
             m_pos = m_block.size();
             return 0;
         }
-        const T value = qFromLittleEndian<T>(m_block.constData() + m_pos);
+        T value = 0;
+        for (qint64 i = qint64(sizeof(T)) - 1; i >= 0; --i)
+            value = T((value << 8) | T(uchar(m_block.at(m_pos + i))));
         m_pos += qint64(sizeof(T));
         return value;
     }

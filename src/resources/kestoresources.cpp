@@ -285,7 +285,7 @@ QString KestoResources::GetApplicationVersion()
 
 unsigned int KestoResources::GenerateLocalClassID()
 {
-    QRandomGenerator generator(quint32(QDateTime::currentSecsSinceEpoch()));
+    QRandomGenerator generator{quint32(QDateTime::currentSecsSinceEpoch())};
     const quint32 value = generator.bounded(32768u);
     return unsigned(std::floor(value / 32767.0 * 16777216.0));
 }
