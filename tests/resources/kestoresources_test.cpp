@@ -2,6 +2,7 @@
 
 #include "encoding/qencoding.h"
 #include "support/testutil.h"
+#include "bytes.h"
 
 #include <QTemporaryDir>
 
@@ -9,10 +10,7 @@
 
 namespace {
 
-QByteArray Hex(const char *hex)
-{
-    return QByteArray::fromHex(hex);
-}
+using resourcebytes::Hex;
 
 bool HasConverter(quint16 format)
 {

@@ -2,6 +2,7 @@
 
 #include "common/xmlwriter.h"
 #include "support/testutil.h"
+#include "bytes.h"
 
 #include <QDomDocument>
 
@@ -9,21 +10,9 @@
 
 namespace {
 
-QByteArray Hex(const char *hex)
-{
-    return QByteArray::fromHex(hex);
-}
-
-void U16(QByteArray &out, quint16 value)
-{
-    out.append(char(value & 0xFF)).append(char(value >> 8));
-}
-
-void U32(QByteArray &out, quint32 value)
-{
-    for (int i = 0; i < 4; ++i)
-        out.append(char((value >> (8 * i)) & 0xFF));
-}
+using resourcebytes::Hex;
+using resourcebytes::U16;
+using resourcebytes::U32;
 
 // A 40-byte module header announcing the given notification and MIME counts.
 QByteArray MifHeaderBlock(quint16 notifications, quint16 mimeTypes)

@@ -1,6 +1,7 @@
 #include "resources/resourcestream.h"
 
 #include "support/testutil.h"
+#include "bytes.h"
 
 #include <QFile>
 #include <QRandomGenerator>
@@ -16,21 +17,9 @@ namespace {
 
 using testutil::ReadFile;
 
-QByteArray Hex(const char *hex)
-{
-    return QByteArray::fromHex(hex);
-}
-
-void U16(QByteArray &out, quint16 value)
-{
-    out.append(char(value & 0xFF)).append(char(value >> 8));
-}
-
-void U32(QByteArray &out, quint32 value)
-{
-    for (int i = 0; i < 4; ++i)
-        out.append(char((value >> (8 * i)) & 0xFF));
-}
+using resourcebytes::Hex;
+using resourcebytes::U16;
+using resourcebytes::U32;
 
 // A resource file put together by hand: header counts as given, map entries
 // as {type, first ID, additional IDs, offset index}, the offsets as given.
