@@ -22,7 +22,8 @@ bool WriteBytes(const QString &path, const QByteArray &bytes)
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size)
 {
     static QTemporaryDir folder;
-    static const bool ready = folder.isValid()
+    // Includes are also looked for below the home folder: keep it private.
+    static const bool ready = folder.isValid() && qputenv("HOME", folder.path().toLocal8Bit())
         && WriteBytes(folder.filePath(QStringLiteral("keys.xml")), "<i><keys><key n=\"1\"/></keys></i>")
         && WriteBytes(folder.filePath(QStringLiteral("broken.xml")), "<i><open></i>");
     if (!ready)
