@@ -103,8 +103,7 @@ class KestoStringRoundTrip : public ::testing::TestWithParam<StringCase>
 TEST_P(KestoStringRoundTrip, ReadsBackTheStoredText)
 {
     const StringCase &c = GetParam();
-    if (!HasConverter(c.format))
-        GTEST_SKIP() << "no converter for format " << c.format;
+    ASSERT_TRUE(HasConverter(c.format)) << "no converter for format " << c.format;
     const QString text = QString::fromUtf16(c.text);
     KestoResources resources;
     ASSERT_TRUE(resources.AddString(1, 3, c.format, text));
@@ -145,8 +144,7 @@ class KestoStringFromIconv : public ::testing::TestWithParam<IconvCase>
 TEST_P(KestoStringFromIconv, DecodesTextEncodedElsewhere)
 {
     const IconvCase &c = GetParam();
-    if (!HasConverter(c.format))
-        GTEST_SKIP() << "no converter for format " << c.format;
+    ASSERT_TRUE(HasConverter(c.format)) << "no converter for format " << c.format;
     if (!testutil::HaveProgram(QStringLiteral("iconv")))
         GTEST_SKIP() << "iconv is not installed";
     const QString text = QString::fromUtf16(c.text);
@@ -171,6 +169,7 @@ INSTANTIATE_TEST_SUITE_P(KestoResources, KestoStringFromIconv,
                                            IconvCase{1, "ISO-8859-1", u"Gr\u00fc\u00dfe"},
                                            IconvCase{6, "UTF-8", u"Gr\u00fc\u00dfe \u20ac"},
                                            IconvCase{5, "CP949", u"\ud55c\uad6d\uc5b4 text"},
+                                           IconvCase{2, "EUC-KR", u"\ud55c\uad6d\uc5b4 text"},
                                            IconvCase{3, "SHIFT_JIS", u"\u65e5\u672c\u8a9e text"},
                                            IconvCase{4, "GB2312", u"\u4e2d\u6587 text"}));
 
