@@ -64,7 +64,8 @@ EmulatedHandset::EmulatedHandset(const ConnectTarget &target, const QString &fol
     : IKestoDevice(target), m_folder(QDir::cleanPath(QDir(folder).absolutePath()))
 {
     const QSettings settings(SettingsPath(m_folder), QSettings::IniFormat);
-    platform = StringToTarget(settings.value(QStringLiteral("platform"), QStringLiteral("win32")).toString());
+    const QString kind = settings.value(QStringLiteral("platform")).toString();
+    platform = kind.trimmed().isEmpty() ? PLATFORM_WIN32 : StringToTarget(kind);
     m_version = settings.value(QStringLiteral("version")).toString();
 }
 

@@ -55,7 +55,9 @@ enum EmulatedHandsetError : unsigned int {
 class HARNESS_EXPORT EmulatedHandset : public IKestoDevice
 {
 public:
-    // Opens the handset in folder (which must hold handset.ini). Check
+    // Opens the handset in folder, reading its handset.ini: the platform
+    // kind from key "platform" (StringToTarget; PLATFORM_WIN32 when the key
+    // is missing or empty) and the version text from key "version". Check
     // IsReachable before use.
     EmulatedHandset(const ConnectTarget &target, const QString &folder);
     ~EmulatedHandset() override;

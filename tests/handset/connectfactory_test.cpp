@@ -62,6 +62,12 @@ TEST(ConnectFactory, ReadsPlatformAndVersionWithDefaults)
     auto odd = fixture.Connect(QStringLiteral("odd"));
     ASSERT_TRUE(odd);
     EXPECT_EQ(odd->platform, IKestoDevice::PLATFORM_UNKNOWN);
+
+    testutil::WriteFile(fixture.HandsetFolder(QStringLiteral("odd")) + QStringLiteral("/handset.ini"),
+                        "platform=\nversion=\n");
+    auto blank = fixture.Connect(QStringLiteral("odd"));
+    ASSERT_TRUE(blank);
+    EXPECT_EQ(blank->platform, IKestoDevice::PLATFORM_WIN32);
 }
 
 TEST(ConnectFactory, DefaultHandsetsFolderLiesBelowTheDataRoot)
