@@ -224,7 +224,9 @@ bool Tar::Read(QDataStream &stream)
         } else {
             TarFileEntry entry;
             QByteArray name = UpToNul(header + kNameOffset, kNameSize);
-            if (haveLongName) {
+            // A long name belongs to the member header that follows it, never
+            // to the zero blocks that end the archive.
+            if (haveLongName && !name.isEmpty()) {
                 name = longName;
             } else if (std::memcmp(header + kMagicOffset, kPosixMagic, kPosixMagicSize) == 0) {
                 const QByteArray prefix = UpToNul(header + kPrefixOffset, kPrefixSize);

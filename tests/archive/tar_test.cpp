@@ -4,6 +4,7 @@
 
 #include <QDir>
 #include <QFile>
+#include <QRandomGenerator>
 #include <QTemporaryDir>
 
 #include <gtest/gtest.h>
@@ -176,6 +177,23 @@ TEST_F(TarTest, MemberCutShortByTheEndOfTheFileGivesTheBytesThatExist)
     EXPECT_EQ(tar.EntryData(entry), Bytes(5000, 'b').left(3000));
 }
 
+TEST_F(TarTest, LongNameRecordNeverNamesTheEndBlocks)
+{
+    QByteArray header(512, '\0');
+    std::memcpy(header.data(), "././@LongLink", 13);
+    std::memcpy(header.data() + 124, "00000000005", 11);
+    header[156] = 'L';
+    QByteArray data(512, '\0');
+    std::memcpy(data.data(), "evil", 4);
+    WriteFile(Path("dangling.tar"), header + data + QByteArray(1024, '\0'));
+
+    Tar tar;
+    ASSERT_TRUE(tar.Open(QIODevice::ReadOnly, Path("dangling.tar")));
+    ASSERT_EQ(tar.EntryCount(), 2u);
+    EXPECT_TRUE(tar.Entry(0).name.isEmpty());
+    EXPECT_FALSE(tar.Entry(0).IsFile());
+}
+
 TEST_F(TarTest, HugeSizeFieldNeverAllocatesMoreThanTheFileHolds)
 {
     QByteArray header(512, '\0');
@@ -344,6 +362,36 @@ TEST_F(TarTest, CopiesShareEntriesButNeverTheOpenFile)
     }
     TarFileEntry entry = original.Entry(0);
     EXPECT_EQ(original.EntryData(entry), QByteArray("abc"));
+}
+
+TEST_F(TarTest, CorruptedArchivesListAndReadOnlyWhatTheFileHolds)
+{
+    Tar writer;
+    writer.SetModificationTime(1700000000);
+    writer.AddDirectory(QStringLiteral("pkg"));
+    writer.AddFile(QStringLiteral("pkg/a.mif"), Bytes(600, 'a'));
+    writer.AddFile(QString(90, QLatin1Char('d')) + QStringLiteral("/") + QString(90, QLatin1Char('f')), Bytes(30, 'f'));
+    ASSERT_TRUE(writer.Write(Path("good.tar")));
+    const QByteArray good = ReadFile(Path("good.tar"));
+
+    QRandomGenerator random(7411);
+    for (int round = 0; round < 400; ++round) {
+        QByteArray bytes = good;
+        if (round % 4 == 0) {
+            bytes.truncate(int(random.bounded(good.size())));
+        } else {
+            for (int f = 0; f < 1 + round % 8; ++f)
+                bytes[int(random.bounded(bytes.size()))] = char(random.bounded(256));
+        }
+        WriteFile(Path("bad.tar"), bytes);
+        Tar tar;
+        ASSERT_TRUE(tar.Open(QIODevice::ReadOnly, Path("bad.tar")));
+        EXPECT_LE(qint64(tar.EntryCount()), bytes.size() / 512 + 1);
+        for (unsigned int i = 0; i < tar.EntryCount(); ++i) {
+            TarFileEntry entry = tar.Entry(i);
+            EXPECT_LE(tar.EntryData(entry).size(), bytes.size());
+        }
+    }
 }
 
 TEST_F(TarTest, FileThatIsNoArchiveOpensAndListsItsBlocks)
