@@ -3,9 +3,8 @@
 #include "archive/tar.h"
 #include "common/handsetpath.h"
 #include "device/device.h"
-#include "resources/kestoresources.h"
+#include "resources/mifbuilder.h"
 
-#include <QDataStream>
 #include <QDir>
 #include <QSettings>
 
@@ -13,77 +12,18 @@
 
 namespace testutil {
 
-namespace {
-
-constexpr quint16 kMifHeaderId = 0;
-constexpr quint16 kMifClassesId = 1;
-constexpr quint16 kMifAppletsId = 2;
-constexpr int kMifHeaderSize = 40;
-constexpr quint16 kAppletType = 1;
-
-QDataStream &LittleEndian(QDataStream &stream)
-{
-    stream.setByteOrder(QDataStream::LittleEndian);
-    return stream;
-}
-
-// A program record: keysize, type, the name padded with NULs (never to
-// exactly 4 bytes, which would read as a number), nine fields, arguments.
-QByteArray ProgramRecord(const MifProgram &program)
-{
-    QByteArray key = program.name.toUtf8();
-    int keySize = (key.size() + 1 + 3) / 4 * 4;
-    if (keySize == 4)
-        keySize = 8;
-    key.resize(keySize, '\0');
-    QByteArray arguments = program.arguments.toUtf8();
-    if (!arguments.isEmpty())
-        arguments.append('\0');
-
-    QByteArray block;
-    QDataStream out(&block, QIODevice::WriteOnly);
-    LittleEndian(out) << quint16(keySize) << quint32(program.type);
-    out.writeRawData(key.constData(), key.size());
-    // version, main id, flags, priority, stack size, max services, max
-    // memory, privilege index
-    for (int field = 0; field < 8; ++field)
-        out << quint32(0);
-    out << quint32(arguments.size());
-    out.writeRawData(arguments.constData(), arguments.size());
-    return block;
-}
-
-} // namespace
-
 QByteArray BuildMif(const ModuleSpec &spec)
 {
-    KestoResources resources;
-    resources.AddBinary(KestoResources::kTypeBinaries, kMifHeaderId, QByteArray(kMifHeaderSize, '\0'));
-
-    if (!spec.classIds.isEmpty()) {
-        QByteArray classes;
-        QDataStream out(&classes, QIODevice::WriteOnly);
-        LittleEndian(out);
-        for (unsigned int id : spec.classIds)
-            out << quint32(id);
-        resources.AddBinary(KestoResources::kTypeBinaries, kMifClassesId, classes);
-    }
-    if (!spec.appletIds.isEmpty()) {
-        QByteArray applets;
-        QDataStream out(&applets, QIODevice::WriteOnly);
-        LittleEndian(out);
-        for (unsigned int id : spec.appletIds) // id, name reference, baseid, apptype, hostid, privset, flags
-            out << quint32(id) << quint32(0) << quint16(0) << kAppletType << quint32(0) << quint16(0)
-                << quint16(0);
-        resources.AddBinary(KestoResources::kTypeBinaries, kMifAppletsId, applets);
-    }
-    quint16 id = 1;
+    MifBuilder mif;
+    for (unsigned int id : spec.classIds)
+        mif.AddClass(id);
+    for (unsigned int id : spec.appletIds)
+        mif.AddApplet(id);
     for (const MifProgram &program : spec.programs)
-        resources.AddBinary(KestoResources::kTypeSysResource, id++, ProgramRecord(program));
-
-    QByteArray bytes;
-    EXPECT_TRUE(resources.SaveTo(bytes));
-    return bytes;
+        mif.AddProgram(program.name, program.arguments, program.type);
+    for (const QString &key : spec.suitePrograms)
+        mif.AddSuiteProgram(key);
+    return mif.Build();
 }
 
 Members ModuleMembers(const ModuleSpec &spec)

@@ -34,6 +34,8 @@ struct ModuleSpec
     QVector<unsigned int> classIds;
     QVector<unsigned int> appletIds;
     QList<MifProgram> programs;
+    // OAT suite program records, keys "<vendor>:<suite>:<program name>".
+    QStringList suitePrograms;
     // Text of the "behaviour" script; no script when empty.
     QByteArray behaviour;
     // Further members, names relative to directory.
