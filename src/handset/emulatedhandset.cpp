@@ -204,7 +204,11 @@ bool EmulatedHandset::FindModuleByClass(unsigned int classId, Module &module) co
 
 unsigned int EmulatedHandset::RunBehaviour(const Module &module, const QStringList &arguments)
 {
-    const QString script = module.hostDirectory + QLatin1Char('/') + QLatin1String(kBehaviourFile);
+    // Mapped like any handset path, so that a link cannot make sh read a
+    // host file outside the handset.
+    const QString script = HandsetPath::ToHost(m_folder, module.directory + QLatin1String(kBehaviourFile));
+    if (script.isEmpty())
+        return Fail(HANDSET_ERROR_BAD_PATH);
     if (!QFileInfo(script).isFile())
         return Succeed(); // a module without a behaviour ends at once
 

@@ -274,6 +274,16 @@ TEST_F(BehaviourTest, ProgramsOfEitherProgramTypeAreFoundByTheirExactName)
     EXPECT_EQ(device->StartProgram(QStringLiteral("ab"), QString()), HANDSET_ERROR_NOT_FOUND);
 }
 
+TEST_F(BehaviourTest, BehaviourLinkedToAHostFileOutsideTheHandsetIsNotRun)
+{
+    const QString outside = fixture.WorkFolder() + QStringLiteral("/outside.sh");
+    testutil::WriteFile(outside, "echo ran > \"$HANDSET_MODULE_DIR/run.log\"\n");
+    ASSERT_TRUE(QFile::remove(Host("fs:/usermods/ctfmod/behaviour")));
+    ASSERT_TRUE(QFile::link(outside, Host("fs:/usermods/ctfmod/behaviour")));
+    EXPECT_EQ(device->StartProgram(QStringLiteral("ctfmod_k"), QString()), HANDSET_ERROR_BAD_PATH);
+    EXPECT_FALSE(QFileInfo::exists(Host("fs:/usermods/ctfmod/run.log")));
+}
+
 TEST_F(BehaviourTest, BehaviourThatDoesNotEndIsKilledAfterTheTimeout)
 {
     testutil::WriteFile(Host("fs:/usermods/ctfmod/behaviour"), "echo started > \"$HANDSET_MODULE_DIR/run.log\"\nsleep 30\n");
