@@ -87,11 +87,14 @@ public:
     // Removes a directory and everything below it.
     unsigned int RemoveDirectory(const QString &directory) override;
     unsigned int DeleteFile(const QString &path) override;
-    // Writes every regular member of a tar package below "fs:/usermods/". A
-    // package with an absolute member name, a ".." segment, a member that
-    // would land outside the handset or a member cut short is refused as a
-    // whole before anything is written; a write that fails takes back what
-    // the package had written (files it replaced keep its content).
+    // Writes every regular member of a tar package below "fs:/usermods/"
+    // (directory members become folders; links and other special members are
+    // skipped). A package with an absolute member name, a ".." segment, a
+    // member that would land outside the handset or a member cut short, and
+    // a package without any regular member, is refused as a whole
+    // (HANDSET_ERROR_BAD_PACKAGE) before anything is written; a write that
+    // fails (HANDSET_ERROR_IO) takes back the files and folders the package
+    // had created (files it replaced keep their new content).
     unsigned int InstallPackage(const QString &hostPath) override;
     // Copies a host file to the handset, creating the folders on the way and
     // replacing the destination once the copy is complete.
