@@ -258,11 +258,4 @@ TEST(KestoResources, ReportsTheHeaderAndCopiesOwnTheirStream)
     EXPECT_FALSE(read.Read(dir.filePath("missing.kar")));
 }
 
-TEST(KestoResources, LocalClassIdsStayInRange)
-{
-    KestoResources resources;
-    for (int i = 0; i < 3; ++i)
-        EXPECT_LE(resources.GenerateLocalClassID(), 16777216u);
-}
-
 } // namespace

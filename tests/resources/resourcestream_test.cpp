@@ -289,18 +289,6 @@ TEST(ResourceStream, CopiesAreIndependent)
     EXPECT_EQ(copy.GetResourceHeader()->resourceCount, 0u);
 }
 
-TEST(ResourceStream, EntriesOrderByTypeAndIdOrByBytes)
-{
-    ResourceEntry a{0, 1, 9, "zz"};
-    ResourceEntry b{0, 2, 1, "aa"};
-    EXPECT_TRUE(a < b);
-    EXPECT_FALSE(b < a);
-    a.compareMode = 1;
-    EXPECT_FALSE(a < b);
-    b.compareMode = 1;
-    EXPECT_TRUE(b < a);
-}
-
 // Corrupt inputs: each must load or fail without crashing, a failure must
 // leave the stream as it was, and nothing may describe more than the input.
 struct CorruptCase
