@@ -1,0 +1,41 @@
+#pragma once
+
+#include "common/export.h"
+#include "device/device.h"
+
+#include <QDomElement>
+#include <QList>
+#include <QMap>
+#include <QSharedPointer>
+#include <QString>
+#include <QStringList>
+
+// One build of one package for one handset architecture.
+class HARNESS_EXPORT _CompilerVariant
+{
+public:
+    _CompilerVariant();
+    ~_CompilerVariant();
+
+    // packagePath when there is one, else binPath.
+    QString VariantPath();
+
+    // Reads the attributes and the "files" list of element. Returns false when
+    // the element has no "name" (the other fields then hold what was read).
+    bool ReadFromXML(const QDomElement &element);
+    // Writes every attribute (even empty ones) and, when there are files, a
+    // "files" child holding one "File" element per path.
+    void WriteToXML(QDomElement &element);
+
+    QString name;
+    QString variant;
+    QString binPath;
+    QString packagePath;
+    IKestoDevice::Platform arch = IKestoDevice::PLATFORM_UNKNOWN;
+    QString build;
+    QStringList files;
+};
+
+// Replaces out by the variants of map sorted by name; returns their count.
+HARNESS_EXPORT unsigned int ToList(const QMap<QString, QSharedPointer<_CompilerVariant>> &map,
+                                   QList<QSharedPointer<_CompilerVariant>> &out);
