@@ -1,0 +1,101 @@
+#include "modules/programs.h"
+
+#include "archive/tar.h"
+#include "resources/kestoresources.h"
+
+#include <QFileInfo>
+#include <QVariant>
+#include <QVector>
+
+namespace Programs {
+
+namespace {
+constexpr quint16 kSysResourceType = 0x6000;
+}
+
+QString PropertyText(const SysResource &program, const char *name)
+{
+    return program.Property(name).toString();
+}
+
+int ReadFromManifest(const QDomElement &element, QList<SysResource> &programs)
+{
+    int count = 0;
+    for (QDomElement list = element.firstChildElement(); !list.isNull();
+         list = list.nextSiblingElement()) {
+        if (list.tagName().toLower() != QLatin1String("programs"))
+            continue;
+        for (QDomElement item = list.firstChildElement(); !item.isNull();
+             item = item.nextSiblingElement()) {
+            if (item.tagName().toLower() != QLatin1String("program"))
+                continue;
+            SysResource program;
+            program.ReadFromXML(item);
+            programs.append(program);
+            ++count;
+        }
+    }
+    return count;
+}
+
+void WriteToManifest(QDomElement &element, QList<SysResource> &programs)
+{
+    if (programs.isEmpty())
+        return;
+    QDomDocument document = element.ownerDocument();
+    QDomElement list = document.createElement(QStringLiteral("programs"));
+    for (SysResource &program : programs) {
+        QDomElement item = document.createElement(QStringLiteral("program"));
+        program.WriteToXML(item);
+        list.appendChild(item);
+    }
+    element.appendChild(list);
+}
+
+bool ReadFromPackage(const QString &directory, const QString &moduleName, const QString &prefix,
+                     unsigned int programType, QList<SysResource> &programs, QString *mifName)
+{
+    static const char *const kSuffixes[] = {"_Win32_Debug.kestix", "_Win32_Release.kestix",
+                                            "RVCT22arm9_Release.kestix"};
+    QString package;
+    for (const QString &lead : {QStringLiteral("/"), QStringLiteral("/") + prefix}) {
+        for (const char *suffix : kSuffixes) {
+            const QString candidate = directory + lead + moduleName + QLatin1String(suffix);
+            if (QFileInfo::exists(candidate)) {
+                package = candidate;
+                break;
+            }
+        }
+        if (!package.isEmpty())
+            break;
+    }
+    if (package.isEmpty())
+        return false;
+
+    Tar archive;
+    if (!archive.Open(QIODevice::ReadOnly, package))
+        return false;
+    const QString wanted = moduleName + QStringLiteral(".mif");
+    for (unsigned int i = 0; i < archive.EntryCount(); ++i) {
+        TarFileEntry entry = archive.Entry(i);
+        if (!entry.name.contains(wanted, Qt::CaseInsensitive))
+            continue;
+        if (mifName)
+            *mifName = entry.name.mid(entry.name.lastIndexOf(QLatin1Char('/')) + 1);
+        const QByteArray data = archive.EntryData(entry);
+        KestoResources resources;
+        if (data.isEmpty() || !resources.LoadFrom(data))
+            return true;
+        QVector<quint16> ids;
+        resources.GetIDs(kSysResourceType, ids);
+        for (const quint16 id : std::as_const(ids)) {
+            SysResource record;
+            if (resources.GetSysResource(id, record) && record.type == programType)
+                programs.append(record);
+        }
+        return true;
+    }
+    return false;
+}
+
+} // namespace Programs
