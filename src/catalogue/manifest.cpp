@@ -1,0 +1,270 @@
+#include "catalogue/manifest.h"
+
+#include "catalogue/framework.h"
+#include "catalogue/testmodule.h"
+#include "common/stringhash.h"
+#include "common/xmlwriter.h"
+#include "environment/testdirectories.h"
+#include "log/log.h"
+#include "modules/ctfapplettestmodule.h"
+#include "modules/ctftestmodule.h"
+#include "modules/oatframework.h"
+#include "modules/oattestmodule.h"
+#include "modules/secondarymodule.h"
+#include "modules/uttestmodule.h"
+
+#include <QDir>
+#include <QDomDocument>
+#include <QFile>
+#include <QFileInfo>
+
+namespace {
+
+// Caches older than this format are stale and trigger a new scan.
+constexpr unsigned int kManifestVersion = 5;
+
+bool ReadCacheDocument(const QString &path, QDomDocument &document)
+{
+    QFile file(path);
+    if (!file.open(QIODevice::ReadOnly))
+        return false;
+    const bool parsed = document.setContent(&file, false);
+    file.close();
+    return parsed && !document.documentElement().isNull()
+        && document.documentElement().tagName().toLower() == QLatin1String("testkit");
+}
+
+// The child elements of parent whose lower-cased name is name.
+QList<QDomElement> ChildrenNamed(const QDomElement &parent, QLatin1String name)
+{
+    QList<QDomElement> children;
+    for (QDomElement child = parent.firstChildElement(); !child.isNull();
+         child = child.nextSiblingElement()) {
+        if (child.tagName().toLower() == name)
+            children.append(child);
+    }
+    return children;
+}
+
+// name with every "*" removed, compared with moduleName as the pattern's
+// leading and trailing "*" ask: exactly, as prefix, as suffix or contained.
+bool MatchesPattern(const QString &pattern, const QString &moduleName)
+{
+    const bool leading = pattern.startsWith(QLatin1Char('*'));
+    const bool trailing = pattern.endsWith(QLatin1Char('*'));
+    const QString text = QString(pattern).remove(QLatin1Char('*'));
+    if (leading && trailing)
+        return moduleName.contains(text, Qt::CaseInsensitive);
+    if (leading)
+        return moduleName.endsWith(text, Qt::CaseInsensitive);
+    if (trailing)
+        return moduleName.startsWith(text, Qt::CaseInsensitive);
+    return moduleName.compare(text, Qt::CaseInsensitive) == 0;
+}
+
+} // namespace
+
+Manifest::Manifest(const QString &path, bool isPlatform)
+    : isPlatform(isPlatform)
+    , kitPath(QDir::cleanPath(QDir::current().absoluteFilePath(path)))
+{
+    rootHash = StringHashName(kitPath);
+    cacheDirectory = TestDirectories::GetManifestDirectory(rootHash);
+    cacheFile = cacheDirectory + QDir::separator() + QStringLiteral("Manifest.xml");
+}
+
+Manifest::~Manifest() = default;
+Manifest::Manifest(const Manifest &other) = default;
+Manifest &Manifest::operator=(const Manifest &other) = default;
+
+void Manifest::SetLogger(Log *logger)
+{
+    this->logger = logger;
+}
+
+void Manifest::LogMessage(const QString &message, bool flag)
+{
+    if (logger)
+        logger->LogMessage(message, flag);
+}
+
+QString Manifest::RootHash()
+{
+    return rootHash;
+}
+
+QString Manifest::ManifestFilePath()
+{
+    return cacheFile;
+}
+
+QString Manifest::ManifestCachePath()
+{
+    return cacheFile;
+}
+
+bool Manifest::IsVersionOkay()
+{
+    testModules.clear();
+    QDomDocument document;
+    if (!ReadCacheDocument(cacheFile, document))
+        return false;
+    QString version = document.documentElement().attribute(QStringLiteral("version"));
+    if (version.isEmpty())
+        version = QStringLiteral("0");
+    bool ok = false;
+    const unsigned int number = version.toUInt(&ok, 10);
+    return ok && number >= kManifestVersion;
+}
+
+QSharedPointer<_TestModule> Manifest::CreateModule(const QString &type)
+{
+    if (type == OatTestModule::Type())
+        return QSharedPointer<_TestModule>(new OatTestModule);
+    if (type == CtfTestModule::Type())
+        return QSharedPointer<_TestModule>(new CtfTestModule);
+    if (type == CtfAppletTestModule::Type())
+        return QSharedPointer<_TestModule>(new CtfAppletTestModule);
+    if (type == UTTestModule::Type())
+        return QSharedPointer<_TestModule>(new UTTestModule);
+    if (type == SecondaryModule::Type())
+        return QSharedPointer<_TestModule>(new SecondaryModule);
+    return {};
+}
+
+QSharedPointer<_Framework> Manifest::CreateFramework(const QString &name)
+{
+    if (name == QLatin1String("oat"))
+        return QSharedPointer<_Framework>(new _OatFramework);
+    return QSharedPointer<_Framework>(new _Framework);
+}
+
+bool Manifest::ReadManifest()
+{
+    testModules.clear();
+    QDomDocument document;
+    if (!ReadCacheDocument(cacheFile, document))
+        return false;
+
+    const QDomElement root = document.documentElement();
+    for (QDomElement section = root.firstChildElement(); !section.isNull();
+         section = section.nextSiblingElement()) {
+        const QString sectionName = section.tagName().toLower();
+        if (sectionName == QLatin1String("testmodules")) {
+            for (const QDomElement &entry : ChildrenNamed(section, QLatin1String("testmodule"))) {
+                QSharedPointer<_TestModule> module =
+                    CreateModule(entry.attribute(QStringLiteral("testtype")));
+                if (!module)
+                    continue;
+                // A module without a name is kept all the same, under the
+                // empty key.
+                module->ReadFromManifest(entry);
+                testModules.insert(module->moduleName.toLower(), module);
+            }
+        } else if (sectionName == QLatin1String("frameworks")) {
+            for (const QDomElement &entry : ChildrenNamed(section, QLatin1String("framework"))) {
+                QSharedPointer<_Framework> framework =
+                    CreateFramework(entry.attribute(QStringLiteral("name")));
+                if (framework->ReadFromManifest(entry))
+                    frameworks.insert(framework->name, framework);
+            }
+        }
+    }
+    return true;
+}
+
+bool Manifest::WriteManifest(const QString &path)
+{
+    if (testModules.isEmpty()) {
+        LogMessage(QStringLiteral("WriteManifest has zero test cases to write"), true);
+        return false;
+    }
+
+    QDomDocument document;
+    QDomElement root = document.createElement(QStringLiteral("testkit"));
+    root.setAttribute(QStringLiteral("path"), kitPath);
+    root.setAttribute(QStringLiteral("hash"), rootHash);
+    root.setAttribute(QStringLiteral("version"), QString::number(kManifestVersion));
+    document.appendChild(root);
+
+    QDomElement modules = document.createElement(QStringLiteral("testmodules"));
+    root.appendChild(modules);
+    for (const QSharedPointer<_TestModule> &module : std::as_const(testModules)) {
+        QDomElement entry = document.createElement(QStringLiteral("testmodule"));
+        module->WriteToManifest(entry);
+        modules.appendChild(entry);
+    }
+
+    if (!frameworks.isEmpty()) {
+        QDomElement list = document.createElement(QStringLiteral("frameworks"));
+        root.appendChild(list);
+        for (const QSharedPointer<_Framework> &framework : std::as_const(frameworks)) {
+            QDomElement entry = document.createElement(QStringLiteral("framework"));
+            framework->WriteToManifest(entry);
+            list.appendChild(entry);
+        }
+    }
+
+    QString destination = path;
+    if (destination.isEmpty()) {
+        destination = cacheFile;
+        // The folder may have gone since construction.
+        QDir().mkpath(cacheDirectory);
+    }
+    QString error;
+    if (!XmlWriter::WriteDocument(document, destination, 1, true, &error)) {
+        LogMessage(QStringLiteral("Manifest::WriteManifest could not write %1: %2\n")
+                       .arg(destination, error),
+                   true);
+        return false;
+    }
+    return true;
+}
+
+QSharedPointer<_TestModule> Manifest::FindTestModule(const QString &name)
+{
+    const QString key = name.toLower();
+    // Modules are normally keyed by their lower-cased name; secondary modules
+    // moved in by a scan keep their name as written, hence the walk.
+    const QSharedPointer<_TestModule> keyed = testModules.value(key);
+    if (keyed && keyed->moduleName.toLower() == key)
+        return keyed;
+    for (const QSharedPointer<_TestModule> &module : std::as_const(testModules)) {
+        if (module->moduleName.toLower() == key)
+            return module;
+    }
+    return {};
+}
+
+unsigned int Manifest::GetTestModules(QList<QSharedPointer<_TestModule>> &out,
+                                      const QStringList &names, const QString &family,
+                                      const QString &subFamily)
+{
+    for (const QSharedPointer<_TestModule> &module : std::as_const(testModules)) {
+        if (!module->selectable)
+            continue;
+        bool matches = false;
+        if (names.isEmpty()) {
+            matches = family.isEmpty()
+                || (module->family.contains(family, Qt::CaseInsensitive)
+                    && (subFamily.isEmpty()
+                        || module->subFamily.contains(subFamily, Qt::CaseInsensitive)));
+        } else {
+            for (const QString &pattern : names) {
+                if (MatchesPattern(pattern, module->moduleName)) {
+                    matches = true;
+                    break;
+                }
+            }
+        }
+        if (matches)
+            out.append(module);
+    }
+    return static_cast<unsigned int>(out.size());
+}
+
+unsigned int Manifest::GetFrameworks(QList<QSharedPointer<_Framework>> &out)
+{
+    out = frameworks.values();
+    return static_cast<unsigned int>(out.size());
+}

@@ -1,0 +1,119 @@
+#pragma once
+
+#include "common/export.h"
+
+#include <QList>
+#include <QMap>
+#include <QSharedPointer>
+#include <QString>
+#include <QStringList>
+
+class Log;
+class QFileInfo;
+class _Framework;
+class _TestModule;
+
+// The catalogue of one test kit (or of one platform directory): the test
+// modules and test frameworks it contains.
+//
+// Building the catalogue means walking the whole tree, so it is cached as
+// "Manifest.xml" (format version 5) in a folder named after the kit's root
+// hash below the manifest directory of TestDirectories. GenerateManifest reads
+// that cache while it is current and otherwise scans the tree and rewrites it.
+//
+// Copies share their modules and frameworks with the original.
+class HARNESS_EXPORT Manifest
+{
+public:
+    // path is made absolute against the current directory and cleaned; the
+    // cache folder is created at once.
+    Manifest(const QString &path, bool isPlatform);
+    ~Manifest();
+    Manifest(const Manifest &other);
+    Manifest &operator=(const Manifest &other);
+
+    void SetLogger(Log *logger);
+    void LogMessage(const QString &message, bool flag);
+
+    // "#" + the decimal string hash of the cleaned absolute kit path.
+    QString RootHash();
+    // Both give the full path of the cached "Manifest.xml".
+    QString ManifestFilePath();
+    QString ManifestCachePath();
+
+    // Whether the cache file exists and carries format version 5 or later.
+    // Empties the module map first.
+    bool IsVersionOkay();
+    // Loads the cache file into the module map (emptied first) and the
+    // framework map. False when the file is missing, unreadable, malformed or
+    // not a manifest. Entries of unknown type are skipped.
+    bool ReadManifest();
+    // Writes the catalogue to path, or to the cache file when path is empty,
+    // in one piece: an existing file is replaced only by a complete one.
+    // False, with a message, when there are no modules (nothing is written)
+    // or the file cannot be written.
+    bool WriteManifest(const QString &path);
+    // Reads the cache when it is current and force is false; otherwise scans
+    // the tree (adding to what the maps hold), moves the unclaimed secondary
+    // modules in and writes the cache. Answers the read or write result.
+    bool GenerateManifest(bool force);
+
+    // The module whose name equals name, ignoring case; null when none.
+    QSharedPointer<_TestModule> FindTestModule(const QString &name);
+    // Appends the selectable modules that match to out (key order) and
+    // returns out's size. With names, each name is a pattern whose leading
+    // and trailing "*" are wild cards, compared ignoring case, and the family
+    // filters are not used; without names, a non-empty family (and then a
+    // non-empty sub-family) must be contained in the module's, ignoring case.
+    unsigned int GetTestModules(QList<QSharedPointer<_TestModule>> &out, const QStringList &names,
+                                const QString &family, const QString &subFamily);
+    // Replaces out by every framework in key order; returns the count.
+    unsigned int GetFrameworks(QList<QSharedPointer<_Framework>> &out);
+
+    // An empty module of the kind whose log the file name suggests: "txt" and
+    // "xml" give UT, "log" CTF when the path holds "-ctf-" (else CTF applet),
+    // "oat" OAT; any other suffix a null pointer.
+    static QSharedPointer<_TestModule> CreateTestModuleFromLog(const QString &logPath);
+
+    bool isPlatform = false;
+    Log *logger = nullptr;
+    QString kitPath;
+    QString cacheDirectory;
+    QString cacheFile;
+    QString rootHash;
+    // Keyed by lower-cased module name.
+    QMap<QString, QSharedPointer<_TestModule>> testModules;
+    // Found in "package" folders during a scan; keyed by name as written.
+    QMap<QString, QSharedPointer<_TestModule>> secondaryModules;
+    // Keyed by framework name as written.
+    QMap<QString, QSharedPointer<_Framework>> frameworks;
+
+private:
+    struct MifRecord;
+    struct ScanState;
+
+    void ProcessTheSubDir(const QString &dir);
+    void ProcessFrameworkDirectory(const QString &dir);
+    bool ProcessXMLDocument(const QString &path);
+    void ProcessXMLDir(const QString &xmlPath, QSharedPointer<_TestModule> module);
+    void ProcessSource(QSharedPointer<_TestModule> module, const QString &dir);
+    void ProcessTarget(QSharedPointer<_TestModule> module, const QString &dir);
+    void ProcessPackageDir(QSharedPointer<_TestModule> module, const QString &dir);
+    void DecompileKestoPackage(QSharedPointer<_TestModule> module, const QString &package);
+    void ProcessSecondaryModules();
+
+    // An empty module of the kind whose type word is type; null when none.
+    static QSharedPointer<_TestModule> CreateModule(const QString &type);
+    // An _OatFramework for "oat", else a plain _Framework.
+    static QSharedPointer<_Framework> CreateFramework(const QString &name);
+
+    // The listing of dir sorted by name, taken from the disk once per scan.
+    QList<QFileInfo> Listing(const QString &dir);
+    // Forgets the listing of dir and the packages read from it.
+    void ForgetListing(const QString &dir);
+    // The module-information members of a package, read once per scan.
+    QList<MifRecord> PackageMifs(const QString &package);
+
+    // Set only while GenerateManifest scans.
+    ScanState *m_scan = nullptr;
+};

@@ -1,0 +1,436 @@
+// Building a catalogue by walking a kit's directory tree.
+
+#include "catalogue/manifest.h"
+
+#include "archive/tar.h"
+#include "catalogue/framework.h"
+#include "catalogue/testmodule.h"
+#include "environment/platforms.h"
+#include "modules/ctfapplettestmodule.h"
+#include "modules/ctftestmodule.h"
+#include "modules/oattestmodule.h"
+#include "modules/secondarymodule.h"
+#include "modules/uttestmodule.h"
+#include "resources/kestoresources.h"
+
+#include <QDir>
+#include <QFileInfo>
+#include <QHash>
+#include <QSet>
+
+// One module-information member of a package, decoded.
+struct Manifest::MifRecord
+{
+    QString lowerName;
+    bool loaded = false;
+    QVector<Applet> applets;
+    QVector<unsigned int> classes;
+};
+
+// What one scan remembers so that it lists each directory and reads each
+// package once, and never walks a directory twice (a symbolic link pointing
+// back up the tree would otherwise send it round for ever).
+struct Manifest::ScanState
+{
+    QSet<QString> visited;
+    QHash<QString, QList<QFileInfo>> listings;
+    QHash<QString, QList<MifRecord>> packages;
+};
+
+namespace {
+
+const QLatin1String kPackageSuffix("kestix");
+
+// Leading path parts that say nothing about a module's family.
+const QSet<QString> &PathWordsToSkip()
+{
+    static const QSet<QString> words{QStringLiteral("api"), QStringLiteral("tests")};
+    return words;
+}
+
+// Sub-folders of a "testframeworks" folder that stand for a framework.
+const QSet<QString> &ModuleKindWords()
+{
+    static const QSet<QString> words{OatTestModule::Type(), CtfTestModule::Type(),
+                                     CtfAppletTestModule::Type(), UTTestModule::Type()};
+    return words;
+}
+
+// Handset architecture of a tool-chain, by lower-cased tool-chain name.
+IKestoDevice::Platform ArchitectureOf(const QString &toolChain)
+{
+    static const QHash<QString, IKestoDevice::Platform> table{
+        {QStringLiteral("win32"), IKestoDevice::PLATFORM_WIN32},
+        {QStringLiteral("rvct22arm9"), IKestoDevice::PLATFORM_ARM},
+        {QStringLiteral("rvct30arm11"), IKestoDevice::PLATFORM_ARM},
+        {QStringLiteral("mingw"), IKestoDevice::PLATFORM_ARM},
+        {QStringLiteral("armgcc"), IKestoDevice::PLATFORM_ARM},
+    };
+    return table.value(toolChain.toLower(), IKestoDevice::PLATFORM_UNKNOWN);
+}
+
+// Class ID of a framework's main component, by lower-cased framework name.
+unsigned int FrameworkClassId(const QString &name)
+{
+    static const QHash<QString, unsigned int> table{
+        {QStringLiteral("ctf"), 0x0102F2AAu},
+        {QStringLiteral("ctfapplet"), 0x010C02E5u},
+        {QStringLiteral("uitf"), 0x010421E8u},
+        {QStringLiteral("oat"), 0x0107556Bu},
+    };
+    return table.value(name, 0u);
+}
+
+// Module kind of a description file, by a case-insensitive look at its path;
+// empty when the file describes no module.
+QString DescriptionType(const QString &path)
+{
+    const QString lower = path.toLower();
+    if (lower.contains(QLatin1String("oatmodule.xml")))
+        return OatTestModule::Type();
+    if (lower.contains(QLatin1String("ctfmodule.xml")))
+        return CtfTestModule::Type();
+    if (lower.contains(QLatin1String("ctfappletmodule.xml")))
+        return CtfAppletTestModule::Type();
+    if (lower.contains(QLatin1String("utmodule.xml")))
+        return UTTestModule::Type();
+    if (lower.contains(QLatin1String("secondarymodule.xml")))
+        return SecondaryModule::Type();
+    return QString();
+}
+
+QList<QFileInfo> ListEntries(const QString &dir)
+{
+    return QDir(dir).entryInfoList(QDir::Dirs | QDir::Files | QDir::NoDotAndDotDot,
+                                   QDir::Name | QDir::IgnoreCase);
+}
+
+bool IsPackageFile(const QFileInfo &entry)
+{
+    return entry.isFile() && entry.completeSuffix().toLower() == kPackageSuffix;
+}
+
+// A package file named <name>_<tool-chain>_<build>.kestix as a compiler
+// variant; null when the name does not split so. name receives the leading
+// part.
+QSharedPointer<_CompilerVariant> PackageVariant(const QFileInfo &package, QString &name)
+{
+    QString first, toolChain, build;
+    if (!BreakPackageName(package.baseName(), first, toolChain, build))
+        return {};
+    QSharedPointer<_CompilerVariant> variant(new _CompilerVariant);
+    variant->name = package.baseName();
+    variant->variant = toolChain;
+    variant->build = build;
+    variant->packagePath = QDir::cleanPath(package.absoluteFilePath());
+    variant->arch = ArchitectureOf(toolChain);
+    name = first;
+    return variant;
+}
+
+} // namespace
+
+bool Manifest::GenerateManifest(bool force)
+{
+    if (QFileInfo::exists(cacheFile) && IsVersionOkay() && !force)
+        return ReadManifest();
+
+    ScanState state;
+    m_scan = &state;
+    ProcessTheSubDir(kitPath);
+    m_scan = nullptr;
+    ProcessSecondaryModules();
+    return WriteManifest(QString());
+}
+
+QList<QFileInfo> Manifest::Listing(const QString &dir)
+{
+    if (!m_scan)
+        return ListEntries(dir);
+    auto found = m_scan->listings.constFind(dir);
+    if (found != m_scan->listings.constEnd())
+        return found.value();
+    const QList<QFileInfo> entries = ListEntries(dir);
+    m_scan->listings.insert(dir, entries);
+    return entries;
+}
+
+void Manifest::ForgetListing(const QString &dir)
+{
+    if (!m_scan)
+        return;
+    auto found = m_scan->listings.find(dir);
+    if (found == m_scan->listings.end())
+        return;
+    for (const QFileInfo &entry : std::as_const(found.value())) {
+        if (IsPackageFile(entry))
+            m_scan->packages.remove(entry.absoluteFilePath());
+    }
+    m_scan->listings.erase(found);
+}
+
+void Manifest::ProcessTheSubDir(const QString &dir)
+{
+    const QFileInfo info(dir);
+    if (!info.isDir())
+        return;
+    if (m_scan) {
+        const QString canonical = info.canonicalFilePath();
+        if (m_scan->visited.contains(canonical))
+            return;
+        m_scan->visited.insert(canonical);
+    }
+
+    const QList<QFileInfo> entries = Listing(dir);
+    QStringList packageDirs;
+    for (const QFileInfo &entry : entries) {
+        if (entry.isDir()) {
+            const QString base = entry.baseName().toLower();
+            if (base == QLatin1String("testframeworks") && !isPlatform) {
+                ProcessFrameworkDirectory(QDir::cleanPath(entry.filePath()));
+            } else if (base == QLatin1String("package")) {
+                QSharedPointer<_TestModule> module(new SecondaryModule);
+                const QString path = entry.absoluteFilePath();
+                ProcessPackageDir(module, path);
+                secondaryModules.insert(module->moduleName, module);
+                packageDirs.append(path);
+            } else {
+                ProcessTheSubDir(QDir::cleanPath(entry.filePath()));
+            }
+        } else if (entry.suffix().toLower() == QLatin1String("xml")) {
+            ProcessXMLDocument(QDir::cleanPath(entry.absoluteFilePath()));
+        }
+    }
+
+    // Nothing below this folder asks for these listings again.
+    for (const QString &path : std::as_const(packageDirs))
+        ForgetListing(path);
+    ForgetListing(QDir::cleanPath(dir + QDir::separator() + QStringLiteral("package")));
+    ForgetListing(dir);
+}
+
+void Manifest::ProcessFrameworkDirectory(const QString &dir)
+{
+    const QString runDir = dir + QDir::separator() + QStringLiteral("run");
+    if (QFileInfo::exists(runDir)) {
+        for (const QFileInfo &entry : ListEntries(runDir)) {
+            if (!IsPackageFile(entry))
+                continue;
+            QString name;
+            const QSharedPointer<_CompilerVariant> variant = PackageVariant(entry, name);
+            if (!variant)
+                continue;
+            QSharedPointer<_Framework> framework = frameworks.value(name);
+            if (!framework) {
+                const QString lower = name.toLower();
+                framework = CreateFramework(lower);
+                framework->name = lower;
+                framework->classId = FrameworkClassId(lower);
+                frameworks.insert(name, framework);
+            }
+            framework->variants.insert(variant->name, variant);
+        }
+        return;
+    }
+
+    for (const QFileInfo &entry : ListEntries(dir)) {
+        if (!entry.isDir())
+            continue;
+        const QString lower = entry.fileName().toLower();
+        if (!ModuleKindWords().contains(lower))
+            continue;
+        QSharedPointer<_Framework> framework(new _Framework);
+        framework->name = lower;
+        frameworks.insert(lower, framework);
+    }
+}
+
+bool Manifest::ProcessXMLDocument(const QString &path)
+{
+    QSharedPointer<_TestModule> module = CreateModule(DescriptionType(path));
+    if (!module)
+        return false;
+    module->SetSource(isPlatform ? QStringLiteral("PVS") : QStringLiteral("KVK"));
+    if (!module->ProcessModuleXML(path))
+        return false;
+
+    const QString key = module->moduleName.toLower();
+    const QSharedPointer<_TestModule> stored = testModules.value(key);
+    if (stored) {
+        // The first description of a name wins; a later one only adds what
+        // its folder holds.
+        module = stored;
+    } else {
+        testModules.insert(key, module);
+        if (module->family.isEmpty()) {
+            QStringList parts = QString(path).remove(kitPath).split(QLatin1Char('/'));
+            while (!parts.isEmpty()
+                   && (parts.first().isEmpty() || PathWordsToSkip().contains(parts.first().toLower())))
+                parts.removeFirst();
+            if (parts.size() >= 2) {
+                module->family = parts.at(0);
+                module->subFamily = parts.at(1);
+            }
+        }
+    }
+
+    ProcessXMLDir(path, module);
+    return true;
+}
+
+void Manifest::ProcessXMLDir(const QString &xmlPath, QSharedPointer<_TestModule> module)
+{
+    const QString dir = QFileInfo(xmlPath).absolutePath();
+    const QList<QFileInfo> entries = Listing(dir);
+    if (entries.isEmpty())
+        return;
+
+    enum class Kind { None, Source, Prebuilt };
+    Kind kind = Kind::None;
+    bool kindFound = false;
+    bool packageDone = false;
+    // Only OAT modules come with a base-line file.
+    bool baseLineDone = module->TestType() != OatTestModule::Type();
+
+    for (const QFileInfo &entry : entries) {
+        const QString name = entry.fileName().toLower();
+        if (name.contains(QLatin1String(".mod")) || name.contains(QLatin1String(".dll"))) {
+            kind = Kind::Prebuilt;
+            kindFound = true;
+        } else if (name.contains(QLatin1String(".c")) || name.contains(QLatin1String("src"))
+                   || name.contains(QLatin1String("inc")) || name.contains(QLatin1String("mif"))) {
+            module->sourcePath = dir;
+            kind = Kind::Source;
+            kindFound = true;
+        } else if (name.contains(QLatin1String(".baseline"))) {
+            module->baseLineFile = entry.absoluteFilePath();
+            baseLineDone = true;
+        } else if (name.contains(QLatin1String("package"))) {
+            packageDone = module->ProcessPackage(entry.absoluteFilePath());
+        }
+        if (kindFound && packageDone && baseLineDone)
+            break;
+    }
+
+    if (kind == Kind::Source)
+        ProcessSource(module, dir);
+    else if (kind == Kind::Prebuilt)
+        ProcessTarget(module, dir);
+}
+
+void Manifest::ProcessSource(QSharedPointer<_TestModule> module, const QString &dir)
+{
+    const QString packageDir = QDir::cleanPath(dir + QDir::separator() + QStringLiteral("package"));
+    if (QFileInfo::exists(packageDir))
+        ProcessPackageDir(module, packageDir);
+}
+
+void Manifest::ProcessTarget(QSharedPointer<_TestModule>, const QString &)
+{
+    // Prebuilt binaries beside a description give the module no targets.
+}
+
+void Manifest::ProcessPackageDir(QSharedPointer<_TestModule> module, const QString &dir)
+{
+    for (const QFileInfo &entry : Listing(dir)) {
+        if (!IsPackageFile(entry))
+            continue;
+        DecompileKestoPackage(module, entry.absoluteFilePath());
+        QString name;
+        const QSharedPointer<_CompilerVariant> variant = PackageVariant(entry, name);
+        if (!variant)
+            continue;
+        if (module->moduleName.isEmpty())
+            module->moduleName = name;
+        if (!module->targets.contains(variant->name))
+            module->targets.insert(variant->name, variant);
+    }
+}
+
+QList<Manifest::MifRecord> Manifest::PackageMifs(const QString &package)
+{
+    if (m_scan) {
+        auto found = m_scan->packages.constFind(package);
+        if (found != m_scan->packages.constEnd())
+            return found.value();
+    }
+
+    QList<MifRecord> records;
+    Tar tar;
+    if (tar.Open(QIODevice::ReadOnly, package)) {
+        const unsigned int count = tar.EntryCount();
+        for (unsigned int index = 0; index < count; ++index) {
+            TarFileEntry entry = tar.Entry(index);
+            MifRecord record;
+            record.lowerName = entry.name.toLower();
+            // Only a member whose name holds ".mif" can ever be asked for.
+            if (!record.lowerName.contains(QLatin1String(".mif")))
+                continue;
+            const QByteArray data = tar.EntryData(entry);
+            KestoResources resources;
+            if (!data.isEmpty() && resources.LoadFrom(data)) {
+                record.loaded = true;
+                resources.GetMifApplets(record.applets);
+                resources.GetMifClasses(record.classes);
+            }
+            records.append(record);
+        }
+        tar.Close();
+    }
+    if (m_scan)
+        m_scan->packages.insert(package, records);
+    return records;
+}
+
+void Manifest::DecompileKestoPackage(QSharedPointer<_TestModule> module, const QString &package)
+{
+    if (!module->classids.isEmpty() || !module->applets.isEmpty())
+        return;
+    const QString wanted = (module->moduleName + QStringLiteral(".mif")).toLower();
+    for (const MifRecord &record : PackageMifs(package)) {
+        if (!record.lowerName.contains(wanted) || !record.loaded)
+            continue;
+        module->applets = record.applets;
+        module->classids = record.classes;
+        return;
+    }
+}
+
+void Manifest::ProcessSecondaryModules()
+{
+    // How many catalogue modules answer to each lower-cased name: the same
+    // answers FindTestModule gives, without walking the catalogue per module.
+    QHash<QString, int> names;
+    for (const QSharedPointer<_TestModule> &module : std::as_const(testModules))
+        ++names[module->moduleName.toLower()];
+    const auto taken = [&names](const QString &name) { return names.value(name.toLower()) > 0; };
+
+    for (auto it = secondaryModules.cbegin(); it != secondaryModules.cend(); ++it) {
+        const QString &key = it.key();
+        if (key.isEmpty() || taken(key))
+            continue;
+        if (key.startsWith(QLatin1String("oat"), Qt::CaseInsensitive)
+            && taken(QString(key).remove(QLatin1String("oat"), Qt::CaseInsensitive)))
+            continue;
+        const QSharedPointer<_TestModule> replaced = testModules.value(key);
+        if (replaced)
+            --names[replaced->moduleName.toLower()];
+        testModules.insert(key, it.value());
+        ++names[it.value()->moduleName.toLower()];
+    }
+}
+
+QSharedPointer<_TestModule> Manifest::CreateTestModuleFromLog(const QString &logPath)
+{
+    const QString suffix = QFileInfo(logPath).suffix().toLower();
+    if (suffix == QLatin1String("txt") || suffix == QLatin1String("xml"))
+        return QSharedPointer<_TestModule>(new UTTestModule);
+    if (suffix == QLatin1String("log")) {
+        if (logPath.contains(QLatin1String("-ctf-"), Qt::CaseInsensitive))
+            return QSharedPointer<_TestModule>(new CtfTestModule);
+        return QSharedPointer<_TestModule>(new CtfAppletTestModule);
+    }
+    if (suffix == QLatin1String("oat"))
+        return QSharedPointer<_TestModule>(new OatTestModule);
+    return {};
+}

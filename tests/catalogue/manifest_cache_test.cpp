@@ -1,0 +1,394 @@
+// The cached catalogue file and the queries on a catalogue.
+
+#include "manifest_fixture.h"
+
+#include "catalogue/framework.h"
+#include "common/stringhash.h"
+#include "modules/ctftestmodule.h"
+#include "modules/oatframework.h"
+#include "modules/oattestmodule.h"
+#include "modules/secondarymodule.h"
+
+#include <QCoreApplication>
+#include <QFile>
+#include <QFileInfo>
+
+namespace {
+
+using kitbuilder::Module;
+
+class ManifestCacheTest : public ManifestFixture
+{
+protected:
+    // A kit with a module of every kind, records in their packages, and
+    // frameworks of both origins.
+    void BuildRichKit()
+    {
+        Module ctf = MakeModule(QStringLiteral("ctf"), QStringLiteral("Timer"));
+        ctf.family = QStringLiteral("Kernel");
+        ctf.minKestoVersion = QStringLiteral("3.1");
+        ctf.secondaryModules = {QStringLiteral("helperlib")};
+        ctf.package.classIds = {0x01020304, 0x01020305};
+        ctf.package.programs = {{QStringLiteral("Timer_k"), QStringLiteral("-all")}, {QStringLiteral("Other"), QString()}};
+        kit->AddSourceModule(QStringLiteral("tests/kernel/timer"), ctf);
+
+        Module applet = MakeModule(QStringLiteral("ctfapplet"), QStringLiteral("Browser"));
+        applet.package.appletIds = {0x0A0B0C0D, 0x0A0B0C0E};
+        kit->AddSourceModule(QStringLiteral("tests/net/browser"), applet);
+
+        Module oat = MakeModule(QStringLiteral("oat"), QStringLiteral("Contacts"));
+        oat.package.suitePrograms = {QStringLiteral("kesto:suite:Contacts")};
+        kit->AddSourceModule(QStringLiteral("tests/pim/contacts"), oat);
+        kit->AddFile(QStringLiteral("tests/pim/contacts/Contacts.baseline"), "b");
+
+        Module menu = MakeModule(QStringLiteral("uitf"), QStringLiteral("Menu"));
+        menu.family = QStringLiteral("Menüs \u65e5\u672c");
+        kit->AddSourceModule(QStringLiteral("tests/ui/menu"), menu);
+        kit->AddPrebuiltModule(QStringLiteral("tests/ui/prebuilt"), MakeModule(QStringLiteral("uitf"), QStringLiteral("Prebuilt")));
+        kit->AddModulePackages(QStringLiteral("libs/helper/package"), MakeModule(QStringLiteral("ctf"), QStringLiteral("helperlib")));
+
+        kit->AddFrameworkPackage(QStringLiteral("testframeworks"), QStringLiteral("oat"), QStringLiteral("RVCT22arm9"), QStringLiteral("Release"));
+        kit->AddFrameworkPackage(QStringLiteral("testframeworks"), QStringLiteral("ctf"), QStringLiteral("Win32"), QStringLiteral("Debug"));
+    }
+
+    // A cache file of the manifest's kit with the given root and entries.
+    void WriteCache(const Manifest &manifest, const QByteArray &text)
+    {
+        testutil::WriteFile(manifest.cacheFile, text);
+    }
+};
+
+TEST_F(ManifestCacheTest, CacheLivesInTheFolderNamedByTheCleanedKitPath)
+{
+    Manifest manifest(kit->Root() + QStringLiteral("/tests/../"), false);
+    EXPECT_EQ(manifest.kitPath, kit->Root());
+    EXPECT_EQ(manifest.RootHash(), StringHashName(kit->Root()));
+    EXPECT_EQ(manifest.ManifestFilePath(),
+              TempPath(QStringLiteral("data/Norvane/TestManifests/")) + manifest.RootHash() + QStringLiteral("/Manifest.xml"));
+    EXPECT_EQ(manifest.ManifestCachePath(), manifest.ManifestFilePath());
+    EXPECT_TRUE(QFileInfo(manifest.cacheDirectory).isDir());
+
+    Manifest other(kit->Root() + QStringLiteral("/tests"), false);
+    EXPECT_NE(other.cacheFile, manifest.cacheFile);
+}
+
+struct VersionCase
+{
+    const char *text;
+    bool current;
+};
+
+class ManifestVersionTest : public ManifestCacheTest, public ::testing::WithParamInterface<VersionCase>
+{
+};
+
+TEST_P(ManifestVersionTest, OnlyAFormatOfFiveOrLaterIsCurrent)
+{
+    Manifest manifest(kit->Root(), false);
+    WriteCache(manifest, GetParam().text);
+    EXPECT_EQ(manifest.IsVersionOkay(), GetParam().current) << GetParam().text;
+}
+
+INSTANTIATE_TEST_SUITE_P(Caches, ManifestVersionTest,
+                         ::testing::Values(VersionCase{"<testkit version='5'/>", true},
+                                           VersionCase{"<TestKit version='7' path='/elsewhere'/>", true},
+                                           VersionCase{"<testkit version='4'/>", false},
+                                           VersionCase{"<testkit/>", false},
+                                           VersionCase{"<testkit version='five'/>", false},
+                                           VersionCase{"<testkit version='-7'/>", false},
+                                           VersionCase{"<testkit version='99999999999'/>", false},
+                                           VersionCase{"<manifest version='5'/>", false},
+                                           VersionCase{"<testkit version='5'>", false},
+                                           VersionCase{"", false}));
+
+TEST_F(ManifestCacheTest, MissingCacheIsNotCurrentAndCannotBeRead)
+{
+    Manifest manifest(kit->Root(), false);
+    EXPECT_FALSE(manifest.IsVersionOkay());
+    EXPECT_FALSE(manifest.ReadManifest());
+}
+
+TEST_F(ManifestCacheTest, CacheNamingAnotherKitIsStillRead)
+{
+    Manifest manifest(kit->Root(), false);
+    WriteCache(manifest,
+               "<testkit path='/some/other/kit' hash='#1' version='5'><testmodules>"
+               "<testmodule testtype='ctf' moduleName='Remote'/></testmodules></testkit>");
+    ASSERT_TRUE(manifest.GenerateManifest(false));
+    EXPECT_EQ(manifest.testModules.keys(), QStringList{"remote"});
+}
+
+TEST_F(ManifestCacheTest, ReadingKeepsKnownKindsAndNamedFrameworksOnly)
+{
+    Manifest manifest(kit->Root(), false);
+    WriteCache(manifest,
+               "<testkit version='5'>"
+               "<TestModules>"
+               "<testmodule testtype='oat' moduleName='One'/>"
+               "<testmodule testtype='CTF' moduleName='Wrong case type'/>"
+               "<testmodule moduleName='No type'/>"
+               "<testmodule testtype='uitf'/>"
+               "<TestModule testtype='ctfapplet' moduleName='ONE'/>"
+               "<other testtype='ctf' moduleName='Other element'/>"
+               "</TestModules>"
+               "<frameworks>"
+               "<framework name='oat'><classid value='17'/></framework>"
+               "<Framework name='OAT'/>"
+               "<framework/>"
+               "</frameworks>"
+               "</testkit>");
+    ASSERT_TRUE(manifest.ReadManifest());
+    // Names differing only in case share one entry: the later one wins.
+    EXPECT_EQ(manifest.testModules.keys(), (QStringList{"", "one"}));
+    EXPECT_EQ(manifest.testModules.value(QStringLiteral("one"))->TestType(), QStringLiteral("ctfapplet"));
+    EXPECT_EQ(manifest.frameworks.keys(), (QStringList{"OAT", "oat"}));
+    EXPECT_TRUE(manifest.frameworks.value(QStringLiteral("oat")).dynamicCast<_OatFramework>());
+    EXPECT_FALSE(manifest.frameworks.value(QStringLiteral("OAT")).dynamicCast<_OatFramework>());
+    EXPECT_EQ(manifest.frameworks.value(QStringLiteral("oat"))->classId, 17u);
+}
+
+TEST_F(ManifestCacheTest, ReadingReplacesModulesButKeepsFrameworks)
+{
+    Manifest manifest(kit->Root(), false);
+    WriteCache(manifest, "<testkit version='5'><testmodules><testmodule testtype='ctf' moduleName='A'/></testmodules>"
+                         "<frameworks><framework name='ctf'/></frameworks></testkit>");
+    ASSERT_TRUE(manifest.ReadManifest());
+    WriteCache(manifest, "<testkit version='5'><testmodules><testmodule testtype='ctf' moduleName='B'/></testmodules>"
+                         "<frameworks><framework name='oat'/></frameworks></testkit>");
+    ASSERT_TRUE(manifest.ReadManifest());
+    EXPECT_EQ(manifest.testModules.keys(), QStringList{"b"});
+    EXPECT_EQ(manifest.frameworks.keys(), (QStringList{"ctf", "oat"}));
+}
+
+TEST_F(ManifestCacheTest, WrittenCatalogueReadsBackTheSame)
+{
+    BuildRichKit();
+    Manifest scanned(kit->Root(), false);
+    Scan(scanned);
+    ASSERT_EQ(scanned.testModules.keys(),
+              (QStringList{"browser", "contacts", "helperlib", "menu", "prebuilt", "timer"}));
+
+    Manifest read(kit->Root(), false);
+    ASSERT_TRUE(read.IsVersionOkay());
+    ASSERT_TRUE(read.ReadManifest());
+
+    // Keys of read modules are lower-cased, so compare by name.
+    ASSERT_EQ(read.testModules.size(), scanned.testModules.size());
+    for (const auto &original : std::as_const(scanned.testModules)) {
+        const auto copy = read.FindTestModule(original->moduleName);
+        ASSERT_TRUE(copy) << original->moduleName.toStdString();
+        EXPECT_EQ(copy->TestType(), original->TestType());
+        EXPECT_EQ(copy->IDHash(), original->IDHash());
+    }
+
+    // What the scan found is really there.
+    const auto timer = read.FindTestModule(QStringLiteral("TIMER")).dynamicCast<CtfTestModule>();
+    ASSERT_TRUE(timer);
+    EXPECT_EQ(timer->classids, (QVector<unsigned int>{0x01020304, 0x01020305}));
+    ASSERT_EQ(timer->programs.size(), 2);
+    EXPECT_EQ(timer->ModuleName(), QStringLiteral("Timer_k"));
+    const auto contacts = read.FindTestModule(QStringLiteral("contacts")).dynamicCast<OatTestModule>();
+    ASSERT_TRUE(contacts);
+    ASSERT_EQ(contacts->programs.size(), 1);
+    EXPECT_EQ(contacts->ModuleName(), QStringLiteral("Contacts"));
+    EXPECT_EQ(read.FindTestModule(QStringLiteral("browser"))->applets.size(), 2);
+    EXPECT_EQ(read.FindTestModule(QStringLiteral("contacts"))->baseLineFile,
+              kit->Path(QStringLiteral("tests/pim/contacts/Contacts.baseline")));
+    EXPECT_TRUE(read.FindTestModule(QStringLiteral("helperlib")).dynamicCast<SecondaryModule>());
+    EXPECT_EQ(read.FindTestModule(QStringLiteral("menu"))->family, QStringLiteral("Menüs \u65e5\u672c"));
+
+    QList<QSharedPointer<_Framework>> frameworks;
+    ASSERT_EQ(read.GetFrameworks(frameworks), 2u);
+    EXPECT_EQ(frameworks[0]->name, QStringLiteral("ctf"));
+    EXPECT_EQ(frameworks[1]->name, QStringLiteral("oat"));
+    EXPECT_TRUE(frameworks[1].dynamicCast<_OatFramework>());
+    EXPECT_EQ(frameworks[1]->classId, 0x0107556Bu);
+    EXPECT_EQ(frameworks[1]->variants.keys(), QStringList{"oat_RVCT22arm9_Release"});
+
+    // Everything, including the kinds' own elements, survives: the read
+    // catalogue writes the same bytes, except for the empty "data" marks of
+    // program records, whose bytes the manifest never holds.
+    const QString again = TempPath(QStringLiteral("again.xml"));
+    ASSERT_TRUE(read.WriteManifest(again));
+    QByteArray expected = testutil::ReadFile(scanned.cacheFile);
+    ASSERT_TRUE(expected.contains("<data/>"));
+    expected.replace("     <data/>\n", "");
+    EXPECT_EQ(testutil::ReadFile(again), expected);
+}
+
+TEST_F(ManifestCacheTest, WrittenCacheIsWellFormedXmlOfTheDocumentedLayout)
+{
+    BuildRichKit();
+    Manifest manifest(kit->Root(), false);
+    Scan(manifest);
+
+    const QByteArray bytes = testutil::ReadFile(manifest.cacheFile);
+    EXPECT_TRUE(bytes.startsWith("<testkit ")) << "no XML declaration";
+    QDomDocument document;
+    ASSERT_TRUE(document.setContent(bytes));
+    const QDomElement root = document.documentElement();
+    EXPECT_EQ(root.attribute(QStringLiteral("version")), QStringLiteral("5"));
+    EXPECT_EQ(root.attribute(QStringLiteral("path")), kit->Root());
+    EXPECT_EQ(root.attribute(QStringLiteral("hash")), manifest.RootHash());
+    EXPECT_EQ(root.firstChildElement().tagName(), QStringLiteral("testmodules"));
+    EXPECT_EQ(root.lastChildElement().tagName(), QStringLiteral("frameworks"));
+    EXPECT_EQ(root.firstChildElement().childNodes().size(), 6);
+    if (testutil::HaveProgram(QStringLiteral("xmllint"))) {
+        QByteArray output;
+        EXPECT_EQ(testutil::RunProgram(QStringLiteral("xmllint"), {QStringLiteral("--noout"), manifest.cacheFile}, &output), 0)
+            << output.toStdString();
+    }
+}
+
+// Run by SameCatalogueGivesTheSameBytesInAnotherProcess in a child process.
+TEST_F(ManifestCacheTest, HelperWritesTheCatalogueOfAKit)
+{
+    const QString kitPath = qEnvironmentVariable("MANIFEST_TEST_KIT");
+    const QString output = qEnvironmentVariable("MANIFEST_TEST_OUTPUT");
+    if (kitPath.isEmpty() || output.isEmpty())
+        GTEST_SKIP() << "runs only as a helper process";
+    Manifest manifest(kitPath, false);
+    ASSERT_TRUE(manifest.GenerateManifest(true));
+    ASSERT_TRUE(manifest.WriteManifest(output));
+}
+
+TEST_F(ManifestCacheTest, SameCatalogueGivesTheSameBytesInAnotherProcess)
+{
+    BuildRichKit();
+    Manifest manifest(kit->Root(), false);
+    Scan(manifest);
+
+    const QString output = TempPath(QStringLiteral("child.xml"));
+    testutil::EnvGuard env;
+    env.Set("MANIFEST_TEST_KIT", kit->Root());
+    env.Set("MANIFEST_TEST_OUTPUT", output);
+    QByteArray log;
+    ASSERT_EQ(testutil::RunProgram(QCoreApplication::applicationFilePath(),
+                                   {QStringLiteral("--gtest_filter=ManifestCacheTest.HelperWritesTheCatalogueOfAKit")},
+                                   &log),
+              0)
+        << log.toStdString();
+    EXPECT_EQ(testutil::ReadFile(output), testutil::ReadFile(manifest.cacheFile));
+}
+
+TEST_F(ManifestCacheTest, EmptyCatalogueIsNeverWritten)
+{
+    kit->AddFrameworkPackage(QStringLiteral("testframeworks"), QStringLiteral("ctf"), QStringLiteral("Win32"), QStringLiteral("Debug"));
+    Manifest manifest(kit->Root(), false);
+    manifest.SetLogger(&logger);
+    EXPECT_FALSE(manifest.GenerateManifest(false));
+    EXPECT_FALSE(QFile::exists(manifest.cacheFile));
+    EXPECT_TRUE(LogText().contains(QStringLiteral("WriteManifest has zero test cases to write")));
+    EXPECT_FALSE(manifest.WriteManifest(TempPath(QStringLiteral("empty.xml"))));
+    EXPECT_FALSE(QFile::exists(TempPath(QStringLiteral("empty.xml"))));
+}
+
+TEST_F(ManifestCacheTest, UnwritableDestinationAnswersFalseWithAMessage)
+{
+    kit->AddSourceModule(QStringLiteral("tests/a"), MakeModule(QStringLiteral("ctf"), QStringLiteral("A")));
+    Manifest manifest(kit->Root(), false);
+    Scan(manifest);
+
+    testutil::WriteFile(TempPath(QStringLiteral("plainfile")), "x");
+    const QString destination = TempPath(QStringLiteral("plainfile/Manifest.xml"));
+    EXPECT_FALSE(manifest.WriteManifest(destination));
+    EXPECT_TRUE(LogText().contains(destination)) << LogText().toStdString();
+
+    // The cache path itself may be unwritable too.
+    ASSERT_TRUE(QFile::remove(manifest.cacheFile));
+    ASSERT_TRUE(QDir().mkpath(manifest.cacheFile));
+    EXPECT_FALSE(manifest.WriteManifest(QString()));
+    EXPECT_TRUE(QFileInfo(manifest.cacheFile).isDir());
+}
+
+TEST_F(ManifestCacheTest, WritingRecreatesAMissingCacheFolder)
+{
+    kit->AddSourceModule(QStringLiteral("tests/a"), MakeModule(QStringLiteral("ctf"), QStringLiteral("A")));
+    Manifest manifest(kit->Root(), false);
+    ASSERT_TRUE(QDir(manifest.cacheDirectory).removeRecursively());
+    Scan(manifest);
+    EXPECT_TRUE(QFile::exists(manifest.cacheFile));
+}
+
+class ManifestQueryTest : public ManifestCacheTest
+{
+protected:
+    void SetUp() override
+    {
+        ManifestCacheTest::SetUp();
+        manifest = std::make_unique<Manifest>(kit->Root(), false);
+        WriteCache(*manifest,
+                   "<testkit version='5'><testmodules>"
+                   "<testmodule testtype='ctf' moduleName='Net' family='Connectivity'/>"
+                   "<testmodule testtype='ctf' moduleName='EtherNet' family='Connectivity' subFamily='Wired'/>"
+                   "<testmodule testtype='oat' moduleName='NetWork' family='MultiMedia' subFamily='Streaming'/>"
+                   "<testmodule testtype='uitf' moduleName='SubNetTool' family='media'/>"
+                   "<testmodule testtype='ctfapplet' moduleName='Audio' family='Multimedia' subFamily='Playback'/>"
+                   "<testmodule testtype='secondary' moduleName='NetLib' family='Media'/>"
+                   "</testmodules></testkit>");
+        ASSERT_TRUE(manifest->ReadManifest());
+    }
+
+    QStringList Select(const QStringList &names, const QString &family = QString(),
+                       const QString &subFamily = QString())
+    {
+        QList<QSharedPointer<_TestModule>> out;
+        const unsigned int count = manifest->GetTestModules(out, names, family, subFamily);
+        EXPECT_EQ(count, static_cast<unsigned int>(out.size()));
+        return Names(out);
+    }
+
+    std::unique_ptr<Manifest> manifest;
+};
+
+TEST_F(ManifestQueryTest, NamePatternsUseLeadingAndTrailingWildCards)
+{
+    EXPECT_EQ(Select({QStringLiteral("*net")}), (QStringList{"EtherNet", "Net"}));
+    EXPECT_EQ(Select({QStringLiteral("net*")}), (QStringList{"Net", "NetWork"}));
+    EXPECT_EQ(Select({QStringLiteral("*NET*")}), (QStringList{"EtherNet", "Net", "NetWork", "SubNetTool"}));
+    EXPECT_EQ(Select({QStringLiteral("net")}), QStringList{"Net"});
+    EXPECT_EQ(Select({QStringLiteral("nothing")}), QStringList{});
+    // Each module is taken once, on the first pattern that fits; the family
+    // filters do not apply to names.
+    EXPECT_EQ(Select({QStringLiteral("*net"), QStringLiteral("net*"), QStringLiteral("audio")}, QStringLiteral("none")),
+              (QStringList{"Audio", "EtherNet", "Net", "NetWork"}));
+    EXPECT_EQ(Select({QStringLiteral("*")}).size(), 5);
+}
+
+TEST_F(ManifestQueryTest, FamiliesAreMatchedByContainmentIgnoringCase)
+{
+    EXPECT_EQ(Select({}, QStringLiteral("Media")), (QStringList{"Audio", "NetWork", "SubNetTool"}));
+    EXPECT_EQ(Select({}, QStringLiteral("media"), QStringLiteral("PLAY")), QStringList{"Audio"});
+    EXPECT_EQ(Select({}), (QStringList{"Audio", "EtherNet", "Net", "NetWork", "SubNetTool"}));
+    // A sub-family alone filters nothing.
+    EXPECT_EQ(Select({}, QString(), QStringLiteral("Wired")).size(), 5);
+}
+
+TEST_F(ManifestQueryTest, SelectionAppendsToWhatTheListHolds)
+{
+    QList<QSharedPointer<_TestModule>> out{manifest->FindTestModule(QStringLiteral("audio"))};
+    EXPECT_EQ(manifest->GetTestModules(out, {QStringLiteral("net")}, QString(), QString()), 2u);
+}
+
+TEST_F(ManifestQueryTest, FindIgnoresCaseAndFindsSecondaryModules)
+{
+    ASSERT_TRUE(manifest->FindTestModule(QStringLiteral("eTHERnET")));
+    EXPECT_EQ(manifest->FindTestModule(QStringLiteral("ETHERNET"))->moduleName, QStringLiteral("EtherNet"));
+    EXPECT_TRUE(manifest->FindTestModule(QStringLiteral("netlib")).dynamicCast<SecondaryModule>());
+    EXPECT_FALSE(manifest->FindTestModule(QStringLiteral("ether")));
+}
+
+TEST_F(ManifestQueryTest, CopiesShareTheirEntries)
+{
+    Manifest copy(*manifest);
+    Manifest assigned(TempPath(QStringLiteral("elsewhere")), true);
+    assigned = *manifest;
+    EXPECT_EQ(copy.FindTestModule(QStringLiteral("net")), manifest->FindTestModule(QStringLiteral("net")));
+    EXPECT_EQ(assigned.FindTestModule(QStringLiteral("net")), manifest->FindTestModule(QStringLiteral("net")));
+    EXPECT_EQ(assigned.cacheFile, manifest->cacheFile);
+    EXPECT_FALSE(assigned.isPlatform);
+    copy.testModules.clear();
+    EXPECT_EQ(manifest->testModules.size(), 6);
+}
+
+} // namespace

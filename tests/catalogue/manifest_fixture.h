@@ -1,0 +1,66 @@
+#pragma once
+
+// What the manifest tests share: a private data root and kit folder per test.
+
+#include "catalogue/manifest.h"
+#include "catalogue/testmodule.h"
+#include "support/kitbuilder.h"
+#include "log/log.h"
+#include "support/testutil.h"
+
+#include <QDir>
+#include <QTemporaryDir>
+
+#include <gtest/gtest.h>
+
+#include <memory>
+
+class ManifestFixture : public ::testing::Test
+{
+protected:
+    void SetUp() override
+    {
+        ASSERT_TRUE(m_dir.isValid());
+        m_env.Set("KESTIX_DATA_ROOT", m_dir.path() + QStringLiteral("/data"));
+        kit = std::make_unique<kitbuilder::KitBuilder>(m_dir.path() + QStringLiteral("/kit"));
+        logger.SetLogPath(m_dir.path() + QStringLiteral("/log.txt"));
+    }
+
+    QString TempPath(const QString &relative) const { return m_dir.path() + QLatin1Char('/') + relative; }
+
+    static kitbuilder::Module MakeModule(const QString &kind, const QString &name)
+    {
+        kitbuilder::Module module;
+        module.kind = kind;
+        module.name = name;
+        module.testCases = {name + QStringLiteral("_1"), name + QStringLiteral("_2")};
+        return module;
+    }
+
+    // Scans the kit from scratch into manifest.
+    void Scan(Manifest &manifest)
+    {
+        ASSERT_TRUE(kit->Ok()) << kit->Errors().join(QLatin1Char('\n')).toStdString();
+        manifest.SetLogger(&logger);
+        ASSERT_TRUE(manifest.GenerateManifest(true));
+    }
+
+    // The names of the modules in key order.
+    static QStringList Names(const QList<QSharedPointer<_TestModule>> &modules)
+    {
+        QStringList names;
+        for (const auto &module : modules)
+            names.append(module->moduleName);
+        return names;
+    }
+
+    QString LogText() const
+    {
+        return QString::fromLatin1(testutil::ReadFile(m_dir.path() + QStringLiteral("/log.txt")));
+    }
+
+    QTemporaryDir m_dir;
+    testutil::EnvGuard m_env;
+    std::unique_ptr<kitbuilder::KitBuilder> kit;
+    Log logger;
+};
