@@ -7,6 +7,8 @@
 #include "modules/uttestmodule.h"
 #include "support/testutil.h"
 
+#include <QDir>
+#include <QFileInfo>
 #include <QTemporaryDir>
 
 #include <gtest/gtest.h>
@@ -70,6 +72,14 @@ TEST_F(LogFiles, CtfLogWithoutSuiteOrManifestNameIsNotRecognised)
     EXPECT_EQ(results.caseResults.size(), 1); // this log's own entry only
     EXPECT_FALSE(module.ParseLog(Write(QStringLiteral("x.txt"), "Suite: A\n"), results));
     EXPECT_FALSE(module.ParseLog(dir.filePath(QStringLiteral("missing.log")), results));
+    ASSERT_TRUE(QDir().mkpath(dir.filePath(QStringLiteral("folder.log"))));
+    EXPECT_FALSE(module.ParseLog(dir.filePath(QStringLiteral("folder.log")), results));
+    // A link to an endless device is no log.
+    const QString zero = dir.filePath(QStringLiteral("zero.oat"));
+    if (QFile::link(QStringLiteral("/dev/zero"), zero)) {
+        OatTestModule oat;
+        EXPECT_FALSE(oat.ParseLog(zero, results));
+    }
 }
 
 TEST_F(LogFiles, AppletTakesTheFirstWordAndDropsKFromSuiteNames)
