@@ -1,0 +1,98 @@
+#include "support/benchutil.h"
+
+#include <QCoreApplication>
+#include <QDir>
+#include <QDirIterator>
+#include <QFile>
+#include <QMap>
+#include <QProcess>
+#include <QTemporaryDir>
+
+#include <sys/resource.h>
+
+#include <memory>
+
+namespace benchutil {
+
+namespace {
+
+QMap<QString, ChildFunction> &Children()
+{
+    static QMap<QString, ChildFunction> children;
+    return children;
+}
+
+} // namespace
+
+bool RegisterChild(const QString &name, ChildFunction function)
+{
+    Children().insert(name, std::move(function));
+    return true;
+}
+
+bool RunChildMode(int argc, char **argv, int *status)
+{
+    if (argc < 3 || QByteArray(argv[1]) != "--child")
+        return false;
+    const QString name = QString::fromLocal8Bit(argv[2]);
+    QStringList arguments;
+    for (int i = 3; i < argc; ++i)
+        arguments << QString::fromLocal8Bit(argv[i]);
+    auto it = Children().constFind(name);
+    *status = it == Children().constEnd() ? 2 : (*it)(arguments);
+    return true;
+}
+
+QByteArray RunChild(const QString &name, const QStringList &arguments, QString *error)
+{
+    QProcess process;
+    process.setProcessChannelMode(QProcess::ForwardedErrorChannel);
+    process.start(QCoreApplication::applicationFilePath(),
+                  QStringList{QStringLiteral("--child"), name} + arguments);
+    if (!process.waitForStarted() || !process.waitForFinished(-1)) {
+        *error = process.errorString();
+        return QByteArray();
+    }
+    if (process.exitStatus() != QProcess::NormalExit || process.exitCode() != 0) {
+        *error = QStringLiteral("child %1 failed with status %2").arg(name).arg(process.exitCode());
+        return QByteArray();
+    }
+    return process.readAllStandardOutput();
+}
+
+long PeakRssKiB()
+{
+    struct rusage usage {};
+    if (getrusage(RUSAGE_SELF, &usage) != 0)
+        return -1;
+    return usage.ru_maxrss;
+}
+
+qint64 ReadTree(const QString &root)
+{
+    qint64 total = 0;
+    QDirIterator it(root, QDir::Files | QDir::NoDotAndDotDot | QDir::Hidden,
+                    QDirIterator::Subdirectories);
+    while (it.hasNext()) {
+        QFile file(it.next());
+        if (file.open(QIODevice::ReadOnly))
+            total += file.readAll().size();
+    }
+    return total;
+}
+
+QString WorkFolder()
+{
+    static const QString folder = [] {
+        const QString given = qEnvironmentVariable("HARNESS_BENCH_WORK");
+        if (!given.isEmpty()) {
+            QDir().mkpath(given);
+            return QDir(given).absolutePath();
+        }
+        static QTemporaryDir temporary;
+        return temporary.path();
+    }();
+    return folder;
+}
+
+} // namespace benchutil
