@@ -20,7 +20,10 @@ int DecodeEveryByte(QEncoding &encoding, const QByteArray &in, QString &out,
 {
     const auto *bytes = reinterpret_cast<const unsigned char *>(in.constData());
     const qsizetype size = in.size();
-    out.reserve(out.size() + size);
+    // At most one unit per byte: write into out's buffer, then cut it.
+    const qsizetype start = out.size();
+    out.resize(start + size);
+    QChar *next = out.data() + start;
     for (qsizetype i = 0; i < size;) {
         unsigned int code = bytes[i];
         if (isLead(bytes[i])) {
@@ -34,8 +37,9 @@ int DecodeEveryByte(QEncoding &encoding, const QByteArray &in, QString &out,
             unit = '?';
         if (unit == 0)
             break;
-        out.append(QChar(char16_t(unit)));
+        *next++ = QChar(char16_t(unit));
     }
+    out.resize(next - out.constData());
     return int(out.size());
 }
 
@@ -45,7 +49,9 @@ int DecodeUpToNul(QEncoding &encoding, const QByteArray &in, QString &out)
     qsizetype size = in.indexOf('\0');
     if (size < 0)
         size = in.size();
-    out.reserve(out.size() + size);
+    const qsizetype start = out.size();
+    out.resize(start + size);
+    QChar *next = out.data() + start;
     for (qsizetype i = 0; i < size;) {
         unsigned int code = bytes[i];
         if (code & 0x80) {
@@ -57,8 +63,9 @@ int DecodeUpToNul(QEncoding &encoding, const QByteArray &in, QString &out)
         quint16 unit = 0;
         if (!encoding.CharToUnicode(code, &unit) || unit == 0)
             unit = ' ';
-        out.append(QChar(char16_t(unit)));
+        *next++ = QChar(char16_t(unit));
     }
+    out.resize(next - out.constData());
     return int(out.size());
 }
 

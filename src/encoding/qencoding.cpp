@@ -80,16 +80,30 @@ QEncoding::~QEncoding() = default;
 
 unsigned int QEncoding::FromUnicode(const QString &in, QByteArray &out)
 {
-    out.clear();
-    out.reserve(in.size());
-    char bytes[kMaxEncodedSize + 1];
+    // Each unit is encoded straight into out's buffer, which always has room
+    // for one more sequence and its NUL: it starts at one byte per unit (the
+    // common case), grows by doubling and is cut to size at the end.
+    out.resize(in.size() + kMaxEncodedSize);
+    char *buffer = out.data();
+    qsizetype used = 0;
     for (QChar c : in) {
-        std::memset(bytes, 0, sizeof bytes);
-        if (UnicodeToChar(c.unicode(), bytes))
-            out.append(bytes, int(std::strlen(bytes)));
-        else
-            out.append('?');
+        if (out.size() - used < kMaxEncodedSize) {
+            out.resize(out.size() * 2);
+            buffer = out.data();
+        }
+        char *bytes = buffer + used;
+        bytes[0] = 0;
+        if (UnicodeToChar(c.unicode(), bytes)) {
+            int length = 0;
+            while (length < kMaxEncodedSize - 1 && bytes[length])
+                ++length;
+            used += length;
+        } else {
+            bytes[0] = '?';
+            used += 1;
+        }
     }
+    out.resize(used);
     return unsigned(out.size());
 }
 
