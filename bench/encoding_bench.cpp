@@ -8,6 +8,8 @@
 #include <QString>
 #include <QVector>
 
+#include "support/benchutil.h"
+
 #include <benchmark/benchmark.h>
 
 #include <iconv.h>
@@ -244,7 +246,8 @@ void Encodings(benchmark::internal::Benchmark *benchmark)
     benchmark->ArgName("encoding");
     for (int i = 0; i < int(std::size(kEncodings)); ++i)
         benchmark->Arg(i);
-    benchmark->Unit(benchmark::kMillisecond)->MinTime(0.3);
+    benchmark->Unit(benchmark::kMillisecond);
+    benchutil::SetMinTime(benchmark, 0.3);
 }
 
 BENCHMARK(BM_Decode)->Apply(Encodings);

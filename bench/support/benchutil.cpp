@@ -95,4 +95,14 @@ QString WorkFolder()
     return folder;
 }
 
+void SetMinTime(benchmark::internal::Benchmark *benchmark, double seconds)
+{
+    bool ok = false;
+    const double given = qEnvironmentVariable("HARNESS_BENCH_MIN_TIME").toDouble(&ok);
+    if (ok && given <= 0)
+        benchmark->Iterations(1);
+    else
+        benchmark->MinTime(ok ? given : seconds);
+}
+
 } // namespace benchutil

@@ -9,6 +9,8 @@
 
 #include <functional>
 
+#include <benchmark/benchmark.h>
+
 namespace benchutil {
 
 // A bench program started as "<program> --child <name> <arguments...>" runs
@@ -34,5 +36,9 @@ qint64 ReadTree(const QString &root);
 // once per program and shared by its benchmarks. HARNESS_BENCH_WORK names a
 // folder to use instead (kept, so that a later run reuses what it holds).
 QString WorkFolder();
+
+// Sets the minimum time of a benchmark: HARNESS_BENCH_MIN_TIME when set (0
+// runs it exactly once, for profiling under callgrind), otherwise seconds.
+void SetMinTime(benchmark::internal::Benchmark *benchmark, double seconds);
 
 } // namespace benchutil

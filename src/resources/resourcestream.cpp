@@ -17,20 +17,6 @@ constexpr int kOffsetSize = 4;
 // Map entries, block indexes and IDs are 16-bit in the file.
 constexpr int kMaxEntries = 0xFFFF;
 
-void PutU16(QByteArray &out, quint16 value)
-{
-    uchar bytes[2];
-    qToLittleEndian(value, bytes);
-    out.append(reinterpret_cast<const char *>(bytes), 2);
-}
-
-void PutU32(QByteArray &out, quint32 value)
-{
-    uchar bytes[4];
-    qToLittleEndian(value, bytes);
-    out.append(reinterpret_cast<const char *>(bytes), 4);
-}
-
 // "%1(0x%2)": decimal, then hexadecimal right-aligned in 8 characters.
 QString Line(const char *format, quint32 value)
 {
@@ -230,29 +216,47 @@ bool ResourceStream::ProcessStructures()
 
 QByteArray ResourceStream::Serialize() const
 {
-    QByteArray out;
-    out.reserve(qsizetype(m_header.offsetToResources) + m_header.lengthOfResources);
-    out.append(char(m_header.fileType));
-    out.append(char(m_header.reserved));
-    PutU16(out, m_header.version);
-    PutU16(out, m_header.oldestCodeVersion);
-    PutU16(out, m_header.mapEntries);
-    PutU32(out, m_header.offsetToMap);
-    PutU32(out, m_header.lengthOfMap);
-    PutU32(out, m_header.offsetToEntries);
-    PutU32(out, m_header.resourceCount);
-    PutU32(out, m_header.offsetToResources);
-    PutU32(out, m_header.lengthOfResources);
+    qsizetype size = kHeaderSize + qsizetype(kMapEntrySize) * _fileMap.size()
+                     + qsizetype(kOffsetSize) * _offsetTable.size();
+    for (const QByteArray &block : _resources)
+        size += block.size();
+    // Everything is written through one cursor into a buffer of the final
+    // size: appending field by field costs more than the fields themselves.
+    QByteArray out(size, Qt::Uninitialized);
+    uchar *cursor = reinterpret_cast<uchar *>(out.data());
+    const auto put16 = [&cursor](quint16 value) {
+        qToLittleEndian(value, cursor);
+        cursor += 2;
+    };
+    const auto put32 = [&cursor](quint32 value) {
+        qToLittleEndian(value, cursor);
+        cursor += 4;
+    };
+    *cursor++ = m_header.fileType;
+    *cursor++ = m_header.reserved;
+    put16(m_header.version);
+    put16(m_header.oldestCodeVersion);
+    put16(m_header.mapEntries);
+    put32(m_header.offsetToMap);
+    put32(m_header.lengthOfMap);
+    put32(m_header.offsetToEntries);
+    put32(m_header.resourceCount);
+    put32(m_header.offsetToResources);
+    put32(m_header.lengthOfResources);
     for (const FileMapEntry &entry : _fileMap) {
-        PutU16(out, entry.type);
-        PutU16(out, entry.beginningResId);
-        PutU16(out, entry.additionalResId);
-        PutU16(out, entry.offsetIndex);
+        put16(entry.type);
+        put16(entry.beginningResId);
+        put16(entry.additionalResId);
+        put16(entry.offsetIndex);
     }
     for (quint32 offset : _offsetTable)
-        PutU32(out, offset);
-    for (const QByteArray &block : _resources)
-        out.append(block);
+        put32(offset);
+    for (const QByteArray &block : _resources) {
+        if (!block.isEmpty())
+            std::memcpy(cursor, block.constData(), size_t(block.size()));
+        cursor += block.size();
+    }
+    Q_ASSERT(cursor == reinterpret_cast<const uchar *>(out.constData()) + out.size());
     return out;
 }
 

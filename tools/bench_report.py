@@ -1,0 +1,144 @@
+#!/usr/bin/env python3
+"""Prints the results of the benchmark programs (Google Benchmark JSON files)
+as figures beside their baselines, with ratios and targets.
+
+Times are CPU times of the benchmarking thread (the machine is shared, so wall
+times mostly measure the neighbours); each is the mean per iteration.
+"""
+import json
+import re
+import sys
+
+# (what, measured benchmark, baseline benchmark, largest ratio allowed or None)
+# Names are without "BM_" and without the "/min_time:..." and
+# "/iterations:..." parts; "{}" stands for the argument part shared by both.
+PAIRS = [
+    ("Catalogue scan, GenerateManifest(true)", "Scan/{}", "ReadKitFiles/{}", 4.0),
+    ("Cached catalogue read, ReadManifest", "ReadManifest/{}", "ParseManifestDom/{}", 2.0),
+    ("Log reprocessing, Process(0)", "Process/{}", "ParseLogsOnly/{}", 2.0),
+    ("Resource file save", "SaveResourceFile/{}", "WriteFileBaseline/{}", None),
+    ("Resource file load", "LoadResourceFile/{}", "ReadFileBaseline/{}", None),
+    ("Decode 10 MB", "Decode/{}", "DecodeIconv/{}", 2.0),
+    ("Encode 10 MB", "Encode/{}", "EncodeIconv/{}", 2.0),
+]
+
+# (what, benchmark of the small size, of the large size, largest ratio allowed)
+GROWTH = [
+    ("Scan 8,000 / 2,000 modules", "Scan/modules:2000", "Scan/modules:8000", 4.5),
+    ("Reprocessing 8,000 / 2,000 logs", "Process/modules:2000", "Process/modules:8000", 4.5),
+    ("Resource save 65,535 / 16,383", "SaveResourceFile/16383", "SaveResourceFile/65535", 4.5),
+    ("Resource load 65,535 / 16,383", "LoadResourceFile/16383", "LoadResourceFile/65535", 4.5),
+]
+
+# (what, benchmark, largest time allowed in seconds)
+LIMITS = [
+    ("Resource save of 65,535 resources", "SaveResourceFile/65535", 1.0),
+    ("Resource load of 65,535 resources", "LoadResourceFile/65535", 1.0),
+]
+
+UNITS = {"ns": 1e-9, "us": 1e-6, "ms": 1e-3, "s": 1.0}
+
+
+def clean(name):
+    name = re.sub(r"^BM_", "", name)
+    return re.sub(r"/(min_time|iterations|repeats|real_time)[^/]*", "", name)
+
+
+def load(paths):
+    results = {}
+    for path in paths:
+        try:
+            with open(path) as f:
+                data = json.load(f)
+        except (OSError, ValueError) as error:
+            print(f"cannot read {path}: {error}", file=sys.stderr)
+            continue
+        for b in data.get("benchmarks", []):
+            if b.get("run_type") == "aggregate" and b.get("aggregate_name") != "mean":
+                continue
+            if b.get("error_occurred"):
+                results[clean(b["run_name"] if "run_name" in b else b["name"])] = b
+                continue
+            results[clean(b.get("run_name", b["name"]))] = b
+    return results
+
+
+def seconds(b):
+    return b["cpu_time"] * UNITS.get(b.get("time_unit", "ns"), 1e-9)
+
+
+def show(value):
+    if value >= 1.0:
+        return f"{value:9.3f} s "
+    if value >= 1e-3:
+        return f"{value * 1e3:9.3f} ms"
+    return f"{value * 1e6:9.3f} us"
+
+
+def verdict(ratio, limit):
+    if limit is None:
+        return ""
+    return f"<= {limit:<4g} {'ok' if ratio <= limit else 'MISSED'}"
+
+
+def main(paths):
+    results = load(paths)
+    missed = []
+    lines = []
+    width = 62
+    lines.append(f"{'figure':{width}} {'time':>12} {'baseline':>12} {'ratio':>7}  target")
+    for what, measured, baseline, limit in PAIRS:
+        pattern = re.compile("^" + re.escape(measured).replace(r"\{\}", "(.*)") + "$")
+        for name in sorted(results, key=lambda n: (len(n), n)):
+            m = pattern.match(name)
+            if not m:
+                continue
+            b = results[name]
+            base = results.get(baseline.replace("{}", m.group(1)))
+            label = f"{what} [{m.group(1)}{' ' + b['label'] if b.get('label') else ''}]"
+            if b.get("error_occurred") or base is None or base.get("error_occurred"):
+                why = b.get("error_message") or (base or {}).get("error_message") or "no baseline"
+                lines.append(f"{label:{width}} {'ERROR: ' + why}")
+                missed.append(label)
+                continue
+            t, tb = seconds(b), seconds(base)
+            ratio = t / tb if tb > 0 else float("inf")
+            lines.append(f"{label:{width}} {show(t)} {show(tb)} {ratio:7.2f}  {verdict(ratio, limit)}")
+            if limit is not None and ratio > limit:
+                missed.append(label)
+    for what, small, large, limit in GROWTH:
+        if small in results and large in results:
+            a, b = seconds(results[small]), seconds(results[large])
+            ratio = b / a if a > 0 else float("inf")
+            lines.append(f"{what:{width}} {show(b)} {show(a)} {ratio:7.2f}  {verdict(ratio, limit)}")
+            if ratio > limit:
+                missed.append(what)
+    for what, name, limit in LIMITS:
+        if name in results:
+            t = seconds(results[name])
+            ok = t <= limit
+            lines.append(f"{what:{width}} {show(t)} {'':>12} {'':>7}  <= {limit:g} s {'ok' if ok else 'MISSED'}")
+            if not ok:
+                missed.append(what)
+    for name, b in sorted(results.items()):
+        counters = b.get("report_lines")
+        if counters:
+            lines.extend(counters)
+    extra = [b for n, b in sorted(results.items()) if "peak_MiB" in b]
+    for b in extra:
+        label = f"Peak memory, {clean(b['name'])}"
+        peak, base = b["peak_MiB"], b.get("baseline_MiB", 0.0)
+        limit = b.get("limit_MiB")
+        ok = limit is None or peak <= limit
+        lines.append(f"{label:{width}} {peak:9.1f} MiB {base:9.1f} MiB {peak / base if base else 0:7.2f}"
+                     f"  {'<= %g MiB ' % limit if limit else ''}{'ok' if ok else 'MISSED'}")
+        if not ok:
+            missed.append(label)
+    print("\n".join(lines))
+    print()
+    print("All targets met." if not missed else "Targets missed: " + "; ".join(missed))
+    return 0
+
+
+if __name__ == "__main__":
+    sys.exit(main(sys.argv[1:]))
