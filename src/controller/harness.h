@@ -12,6 +12,8 @@
 
 class Log;
 class Manifest;
+class ProcessedResults;
+class _Framework;
 class _TestModule;
 
 // Drives test runs against one handset: holds the run configuration, the
@@ -106,12 +108,93 @@ public:
     // the compiler's output.
     bool AltCompileResource(const QString &source, const QString &output);
 
+    // ---- Test selection and catalogues ----
+
+    // Appends the modules of the kit catalogue (when the kit was selected)
+    // and then of the platform catalogue that match the filters: name
+    // patterns with "*" wild cards at either end, or else a family and
+    // sub-family contained in the module's. The list is not cleared. Returns
+    // its count; set-up failures add nothing.
+    unsigned int GetTestModules(QList<QSharedPointer<_TestModule>> &modules,
+                                const QStringList &names, const QString &family,
+                                const QString &subFamily);
+    // Clears the list and fills it with the modules named by the "testModule"
+    // attributes of the "feature" elements of a feature list file. A missing
+    // or malformed file, a file without features and unknown names are
+    // logged. Returns the count.
+    unsigned int GetTestModules(QList<QSharedPointer<_TestModule>> &modules,
+                                const QString &featureFile);
+    // Scans the kit and the platform again and writes their catalogues to
+    // outputPath (each to its own cache when outputPath is empty); a file
+    // that cannot be opened is written to the home folder under the same
+    // name instead. True when at least one catalogue was written.
+    bool GenerateManifest(const QString &outputPath);
+
+    // ---- Running ----
+
+    // Queues a module for the next run; null is ignored.
+    void AddTest(QSharedPointer<_TestModule> module);
+    // Runs every queued module, sorted by test type and then by name: loads
+    // each framework, starts the module, waits for its log, copies it,
+    // removes the module, post-processes and records the verdicts. False
+    // when nothing was queued, set-up or the connection failed, or the
+    // handset was lost during the run.
+    bool Run();
+    // Installs the module's secondary modules and starts the module; false
+    // when it could not be started.
+    bool Run(QSharedPointer<_TestModule> module);
+    // Runs the kit module of that name (any letter case); false when none.
+    bool Run(const QString &name);
+    // Makes sure the framework is on the handset; false with a message when
+    // it cannot be loaded.
+    bool Load(QSharedPointer<_Framework> framework);
+    // Loads the kit framework of exactly that name; false when none.
+    bool Load(const QString &name);
+    // Removes the framework from the handset; false without a connection.
+    bool Unload(QSharedPointer<_Framework> framework);
+    // Removes every framework of the kit catalogue; true when one was.
+    bool Unload();
+    // The kit framework of that name (any letter case); null when none.
+    QSharedPointer<_Framework> GetFramework(const QString &name);
+    // Replaces the list by the kit catalogue's frameworks; returns the count.
+    unsigned int ListFrameworks(QList<QSharedPointer<_Framework>> &frameworks);
+
+    // ---- Reprocessing saved logs ----
+
+    // Records every log found below the log folder (sub-folders too, but not
+    // "oatRawLogs" and "ProcessedResults") in one processed-results file,
+    // without a handset. depth indents the messages; the host passes 0.
+    // False when set-up fails or there is no log folder.
+    bool Process(int depth);
+    // Fills paths (cleared first) with the handset paths of the module's
+    // logs, connecting first; returns the count.
+    unsigned int GetLogFilePaths(QSharedPointer<_TestModule> module, QStringList &paths);
+
 private:
     friend class HarnessTestAccess;
+    friend class HarnessControllerAccess;
+    class ResultsSession;
 
     // Resolves test kit and platform and fills the run keys of the
     // environment map; false when no test kit can be found.
     bool SetupEnvironment();
+    // Reads (or generates) the catalogues that the settings call for; true
+    // when one of them is usable.
+    bool SetupManifest();
+    // SetupEnvironment and then SetupManifest.
+    bool Setup();
+
+    // Parses the module's logs and records the verdicts in the
+    // processed-results file.
+    void UpdateProcessedModulesXML(QSharedPointer<_TestModule> module);
+    // Sets "ProcessedResultsPath" below "LogPath" + "/" + folder when absent.
+    void EnsureProcessedResultsPath(const QString &folder);
+    // The log wait of the run loop; false when the handset was lost.
+    bool WaitForLog(QSharedPointer<_TestModule> module);
+    // Writes one generated catalogue to outputPath (or its home-folder
+    // fall-back, or its cache when outputPath is empty); true when written.
+    bool WriteGeneratedManifest(Manifest &manifest, const QString &setting,
+                                const QString &outputPath, const QString &fallbackName);
 
     // Stores a non-empty, changed kit or platform setting under key and
     // clears the environment-ready flag; false when nothing changed.
@@ -142,4 +225,10 @@ private:
     // The kit path that set-up chose as a default only for the platform;
     // keeps the kit unselected when set-up runs again with that kit.
     QString m_defaultOnlyKit;
+    // The processed-results document held in memory while Run or Process
+    // works; null otherwise.
+    QSharedPointer<ProcessedResults> m_results;
+    // Process writes the held document once at the end; Run after every
+    // module.
+    bool m_deferResultsSave = false;
 };

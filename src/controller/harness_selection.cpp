@@ -1,0 +1,239 @@
+// The kit and platform catalogues, test selection and catalogue export.
+
+#include "controller/harness.h"
+
+#include "catalogue/manifest.h"
+#include "catalogue/testmodule.h"
+#include "controller/environmentkeys.h"
+
+#include <QDir>
+#include <QDomDocument>
+#include <QFile>
+#include <QFileInfo>
+#include <QSet>
+
+namespace {
+
+const QString kGenerating = QStringLiteral("Generating manifest for ");
+const QString kNotGenerated = QStringLiteral("Manifest %1 could not be generated.");
+const QString kDefaultDevicePack =
+    QStringLiteral("/testframeworks/oat/tools/reference/deviceref.dso");
+
+// The "testModule" attributes of every "feature" element, at any depth, in
+// document order; features counts the elements.
+void CollectFeatures(const QDomElement &parent, QStringList &names, int &features)
+{
+    for (QDomElement element = parent.firstChildElement(); !element.isNull();
+         element = element.nextSiblingElement()) {
+        if (element.tagName().toLower() == QLatin1String("feature")) {
+            ++features;
+            const QString name = element.attribute(QStringLiteral("testModule"));
+            if (!name.isEmpty())
+                names.append(name);
+        }
+        CollectFeatures(element, names, features);
+    }
+}
+
+} // namespace
+
+bool Harness::Setup()
+{
+    return SetupEnvironment() && SetupManifest();
+}
+
+bool Harness::SetupManifest()
+{
+    bool kitReady = true;
+    const QString kit = GetTestkit();
+    if (!m_kitManifest && !kit.isEmpty()) {
+        kitReady = false;
+        m_kitManifest.reset(new Manifest(kit, false));
+        m_kitManifest->SetLogger(m_logger);
+        const bool current = m_kitManifest->IsVersionOkay();
+        if (current && m_kitManifest->ReadManifest()) {
+            kitReady = true;
+        } else {
+            if (!current)
+                LogMessage(QStringLiteral("Manifest out of date for ") + kit, true);
+            LogMessage(kGenerating + kit, true);
+            kitReady = m_kitManifest->GenerateManifest(true);
+            if (!kitReady) {
+                LogMessage(kNotGenerated.arg(kit), true);
+                m_kitManifest.reset();
+            }
+        }
+    }
+
+    const QString platform = GetPlatform();
+    if (m_platformManifest || platform.isEmpty())
+        return true;
+
+    m_platformManifest.reset(new Manifest(platform, true));
+    m_platformManifest->SetLogger(m_logger);
+    bool platformReady = m_platformManifest->ReadManifest();
+    if (!platformReady) {
+        LogMessage(kGenerating + platform, true);
+        platformReady = m_platformManifest->GenerateManifest(false);
+        if (!platformReady) {
+            LogMessage(kNotGenerated.arg(platform), true);
+            m_platformManifest.reset();
+        }
+    }
+
+    if (!m_environment.contains(EnvironmentKey::DevicePack)) {
+        LogMessage(QStringLiteral("Using the default device pack."), true);
+        SetDPK(platform + kDefaultDevicePack);
+    }
+    return kitReady || platformReady;
+}
+
+unsigned int Harness::GetTestModules(QList<QSharedPointer<_TestModule>> &modules,
+                                     const QStringList &names, const QString &family,
+                                     const QString &subFamily)
+{
+    if (Setup()) {
+        if (m_kitManifest && !m_kitNotSelected)
+            m_kitManifest->GetTestModules(modules, names, family, subFamily);
+        if (m_platformManifest)
+            m_platformManifest->GetTestModules(modules, names, family, subFamily);
+    }
+    return unsigned(modules.size());
+}
+
+unsigned int Harness::GetTestModules(QList<QSharedPointer<_TestModule>> &modules,
+                                     const QString &featureFile)
+{
+    modules.clear();
+    QFile file(featureFile);
+    if (!file.open(QIODevice::ReadOnly)) {
+        LogMessage(QStringLiteral("BFS File %1 not found.").arg(featureFile), true);
+        return 0;
+    }
+
+    QDomDocument document;
+    QString error;
+    int line = 0;
+    int column = 0;
+    if (!document.setContent(&file, &error, &line, &column)) {
+        LogMessage(QStringLiteral("Error Parsing BFS File %1, Error:%2 Line:%3 Column:%4")
+                       .arg(featureFile, error)
+                       .arg(line)
+                       .arg(column),
+                   true);
+        return 0;
+    }
+
+    QStringList names;
+    int features = 0;
+    CollectFeatures(document.documentElement(), names, features);
+    if (document.documentElement().tagName().toLower() == QLatin1String("feature")) {
+        ++features;
+        const QString name = document.documentElement().attribute(QStringLiteral("testModule"));
+        if (!name.isEmpty())
+            names.prepend(name);
+    }
+    if (features == 0) {
+        LogMessage(QStringLiteral("No testcases in BFS File %1.").arg(featureFile), true);
+        return 0;
+    }
+    if (!Setup())
+        return 0;
+
+    if (!names.isEmpty()) {
+        if (m_kitManifest && !m_kitNotSelected)
+            m_kitManifest->GetTestModules(modules, names, QString(), QString());
+        if (m_platformManifest)
+            m_platformManifest->GetTestModules(modules, names, QString(), QString());
+    }
+
+    QSet<QString> found;
+    for (const QSharedPointer<_TestModule> &module : modules)
+        found.insert(module->moduleName.toLower());
+    for (const QString &name : names) {
+        if (!found.contains(name.toLower())) {
+            LogMessage(QStringLiteral("   Warning: Testmodule \"%1\" not found in test manifests.")
+                           .arg(name),
+                       true);
+        }
+    }
+    return unsigned(modules.size());
+}
+
+bool Harness::WriteGeneratedManifest(Manifest &manifest, const QString &setting,
+                                     const QString &outputPath, const QString &fallbackName)
+{
+    if (outputPath.isEmpty()) {
+        LogMessage(QStringLiteral("Manifest written to ") + manifest.ManifestFilePath(), true);
+        return true;
+    }
+
+    // Opened for appending, so an existing file is not emptied before the
+    // catalogue is known to be written.
+    const QIODevice::OpenMode probeMode = QIODevice::WriteOnly | QIODevice::Append;
+    QString path = outputPath;
+    QFile probe(path);
+    if (!probe.open(probeMode)) {
+        QString name = QFileInfo(outputPath).fileName();
+        if (name.isEmpty())
+            name = fallbackName;
+        path = QDir::cleanPath(QDir::homePath() + QDir::separator() + name);
+        probe.setFileName(path);
+        if (!probe.open(probeMode)) {
+            LogMessage(QStringLiteral("Manifest can't be opened for writing."), true);
+            return false;
+        }
+    }
+    probe.close();
+    if (!manifest.WriteManifest(path))
+        return false;
+    LogMessage(QStringLiteral("Manifest ") + setting + QStringLiteral(" written to ") + path, true);
+    return true;
+}
+
+bool Harness::GenerateManifest(const QString &outputPath)
+{
+    const bool kitGiven = !GetTestkit().isEmpty();
+    const bool platformGiven = !GetPlatform().isEmpty();
+    if (!SetupEnvironment())
+        return false;
+
+    m_kitManifest.reset();
+    m_platformManifest.reset();
+
+    QString output = outputPath;
+    if (!output.isEmpty()) {
+        if (QDir::isRelativePath(output))
+            output = QDir::cleanPath(QDir::currentPath() + QDir::separator() + output);
+        QDir().mkpath(QFileInfo(output).absolutePath());
+    }
+
+    bool written = false;
+    const QString kit = GetTestkit();
+    if (kitGiven && !kit.isEmpty()) {
+        m_kitManifest.reset(new Manifest(kit, false));
+        m_kitManifest->SetLogger(m_logger);
+        LogMessage(kGenerating + kit, true);
+        if (m_kitManifest->GenerateManifest(true)) {
+            written = WriteGeneratedManifest(*m_kitManifest, kit, output,
+                                             QStringLiteral("KVKManifest.xml"));
+        } else {
+            m_kitManifest.reset();
+        }
+    }
+
+    const QString platform = GetPlatform();
+    if (platformGiven && !platform.isEmpty()) {
+        m_platformManifest.reset(new Manifest(platform, true));
+        m_platformManifest->SetLogger(m_logger);
+        LogMessage(kGenerating + platform, true);
+        if (m_platformManifest->GenerateManifest(true)) {
+            written = WriteGeneratedManifest(*m_platformManifest, platform, output,
+                                             QStringLiteral("PlatformManifest.xml"))
+                      || written;
+        } else {
+            m_platformManifest.reset();
+        }
+    }
+    return written;
+}

@@ -1,0 +1,154 @@
+#pragma once
+
+// Fixture pieces for the selection, run, results and reprocessing tests:
+// access to the Harness's private operations, a scripted test module, and
+// catalogues filled in memory.
+
+#include "harnesstest.h"
+
+#include "catalogue/manifest.h"
+#include "catalogue/testmodule.h"
+#include "controller/harness.h"
+#include "modules/testresults.h"
+
+#include <QDomDocument>
+#include <QSharedPointer>
+
+// The Harness befriends this class too.
+class HarnessControllerAccess
+{
+public:
+    static QMap<QString, QString> &Environment(Harness &harness) { return harness.m_environment; }
+    static void SetCatalogues(Harness &harness, QSharedPointer<Manifest> kit,
+                              QSharedPointer<Manifest> platform)
+    {
+        harness.m_kitManifest = kit;
+        harness.m_platformManifest = platform;
+        // Set-up must not replace the catalogues given here.
+        harness.m_environmentReady = true;
+    }
+    static Manifest *Kit(Harness &harness) { return harness.m_kitManifest.data(); }
+    static Manifest *Platform(Harness &harness) { return harness.m_platformManifest.data(); }
+    static bool SetupManifest(Harness &harness) { return harness.SetupManifest(); }
+    static void Update(Harness &harness, QSharedPointer<_TestModule> module)
+    {
+        harness.UpdateProcessedModulesXML(module);
+    }
+    static bool KitNotSelected(const Harness &harness) { return harness.m_kitNotSelected; }
+    static void SetKitNotSelected(Harness &harness, bool value) { harness.m_kitNotSelected = value; }
+    static const QStringList &TestCases(const Harness &harness) { return harness.m_testCases; }
+};
+
+namespace controllertest {
+
+// A module whose log parser answers with a prepared record, and whose run
+// steps only count their calls.
+class ScriptedModule : public _TestModule
+{
+public:
+    explicit ScriptedModule(const QString &name, const QString &type = QStringLiteral("ctf"))
+        : m_type(type)
+    {
+        moduleName = name;
+    }
+
+    QString TestType() override { return m_type; }
+    bool Run(IKestoDevice *, const QMap<QString, QString> &) override { return true; }
+    bool GetLogFilePaths(IKestoDevice *, QStringList &) override { return false; }
+    bool IsLogComplete(IKestoDevice *) override { return true; }
+    bool ParseLog(TestResults &results) override
+    {
+        ++parseCalls;
+        if (!parses)
+            return false;
+        results = parsed;
+        return true;
+    }
+    bool ParseLog(const QString &, TestResults &) override { return false; }
+    void PostProcess(QMap<QString, QString> &) override {}
+    QString ModuleName() override { return moduleName; }
+    QString ModuleXMLName() override { return QStringLiteral("scripted.xml"); }
+    bool ProcessModuleMIF(const QString &) override { return false; }
+
+    // Makes the log report these verdicts for the module named name.
+    void Report(const QString &name, const QList<TestCaseResult> &verdicts,
+                const QString &hash = QString())
+    {
+        parsed.manifestName = name;
+        parsed.idHash = hash;
+        parsed.caseResults = verdicts;
+    }
+
+    bool parses = true;
+    int parseCalls = 0;
+    TestResults parsed;
+
+private:
+    unsigned int KestoID() override { return 0; }
+    QString m_type;
+};
+
+// A catalogue module with test cases.
+inline QSharedPointer<ScriptedModule> CatalogueModule(const QString &name, const QString &hash,
+                                                      const QStringList &cases,
+                                                      const QString &family = QString(),
+                                                      const QString &type = QStringLiteral("ctf"))
+{
+    QSharedPointer<ScriptedModule> module(new ScriptedModule(name, type));
+    module->idHash = hash;
+    module->family = family;
+    module->subFamily = family.isEmpty() ? QString() : family + QStringLiteral("-sub");
+    for (const QString &testCase : cases)
+        module->testCases.append(TestCase(testCase, QStringLiteral("auto")));
+    return module;
+}
+
+// A catalogue held in memory only (its cache folder is created below the
+// test's data root).
+inline QSharedPointer<Manifest> MakeCatalogue(const QString &path, bool isPlatform,
+                                              const QList<QSharedPointer<ScriptedModule>> &modules)
+{
+    QSharedPointer<Manifest> catalogue(new Manifest(path, isPlatform));
+    for (const QSharedPointer<ScriptedModule> &module : modules) {
+        if (module->TestType() == QLatin1String("secondary"))
+            module->selectable = false;
+        catalogue->testModules.insert(module->moduleName.toLower(), module);
+    }
+    return catalogue;
+}
+
+// The verdicts of a results file: "module/testcase" -> result, plus the
+// order of test case names per module.
+struct ResultsView
+{
+    bool ok = false;
+    QDomElement root;
+    QMap<QString, QString> verdicts;
+    QMap<QString, QStringList> caseOrder;
+    QMap<QString, QDomElement> modules;
+};
+
+inline ResultsView ReadResults(const QString &path)
+{
+    ResultsView view;
+    QDomDocument document;
+    if (!document.setContent(testutil::ReadFile(path)))
+        return view;
+    view.ok = true;
+    view.root = document.documentElement();
+    for (QDomElement module = view.root.firstChildElement(QStringLiteral("module"));
+         !module.isNull(); module = module.nextSiblingElement(QStringLiteral("module"))) {
+        const QString name = module.attribute(QStringLiteral("name"));
+        view.modules.insert(name, module);
+        for (QDomElement testCase = module.firstChildElement(QStringLiteral("testcase"));
+             !testCase.isNull(); testCase = testCase.nextSiblingElement(QStringLiteral("testcase"))) {
+            const QString caseName = testCase.attribute(QStringLiteral("name"));
+            view.verdicts.insert(name + QLatin1Char('/') + caseName,
+                                 testCase.attribute(QStringLiteral("result")));
+            view.caseOrder[name].append(caseName);
+        }
+    }
+    return view;
+}
+
+} // namespace controllertest
