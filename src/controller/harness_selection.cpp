@@ -208,32 +208,27 @@ bool Harness::GenerateManifest(const QString &outputPath)
         QDir().mkpath(QFileInfo(output).absolutePath());
     }
 
+    // Scans one catalogue afresh and writes it; a failed scan leaves the
+    // Harness without that catalogue.
+    const auto generate = [&](QSharedPointer<Manifest> &catalogue, const QString &setting,
+                              bool isPlatform, const QString &fallbackName) {
+        catalogue.reset(new Manifest(setting, isPlatform));
+        catalogue->SetLogger(m_logger);
+        LogMessage(kGenerating + setting, true);
+        if (!catalogue->GenerateManifest(true)) {
+            catalogue.reset();
+            return false;
+        }
+        return WriteGeneratedManifest(*catalogue, setting, output, fallbackName);
+    };
+
     bool written = false;
     const QString kit = GetTestkit();
-    if (kitGiven && !kit.isEmpty()) {
-        m_kitManifest.reset(new Manifest(kit, false));
-        m_kitManifest->SetLogger(m_logger);
-        LogMessage(kGenerating + kit, true);
-        if (m_kitManifest->GenerateManifest(true)) {
-            written = WriteGeneratedManifest(*m_kitManifest, kit, output,
-                                             QStringLiteral("KVKManifest.xml"));
-        } else {
-            m_kitManifest.reset();
-        }
-    }
-
+    if (kitGiven && !kit.isEmpty())
+        written = generate(m_kitManifest, kit, false, QStringLiteral("KVKManifest.xml"));
     const QString platform = GetPlatform();
-    if (platformGiven && !platform.isEmpty()) {
-        m_platformManifest.reset(new Manifest(platform, true));
-        m_platformManifest->SetLogger(m_logger);
-        LogMessage(kGenerating + platform, true);
-        if (m_platformManifest->GenerateManifest(true)) {
-            written = WriteGeneratedManifest(*m_platformManifest, platform, output,
-                                             QStringLiteral("PlatformManifest.xml"))
-                      || written;
-        } else {
-            m_platformManifest.reset();
-        }
-    }
+    if (platformGiven && !platform.isEmpty())
+        written = generate(m_platformManifest, platform, true, QStringLiteral("PlatformManifest.xml"))
+                  || written;
     return written;
 }
