@@ -20,18 +20,26 @@ const QString kDefaultDevicePack =
     QStringLiteral("/testframeworks/oat/tools/reference/deviceref.dso");
 
 // The "testModule" attributes of every "feature" element, at any depth, in
-// document order; features counts the elements.
-void CollectFeatures(const QDomElement &parent, QStringList &names, int &features)
+// document order; features counts the elements. The walk keeps no stack of
+// its own, so a deeply nested file cannot exhaust the call stack.
+void CollectFeatures(const QDomDocument &document, QStringList &names, int &features)
 {
-    for (QDomElement element = parent.firstChildElement(); !element.isNull();
-         element = element.nextSiblingElement()) {
+    const QDomElement root = document.documentElement();
+    QDomElement element = root;
+    while (!element.isNull()) {
         if (element.tagName().toLower() == QLatin1String("feature")) {
             ++features;
             const QString name = element.attribute(QStringLiteral("testModule"));
             if (!name.isEmpty())
                 names.append(name);
         }
-        CollectFeatures(element, names, features);
+        QDomElement next = element.firstChildElement();
+        while (next.isNull() && element != root) {
+            next = element.nextSiblingElement();
+            if (next.isNull())
+                element = element.parentNode().toElement();
+        }
+        element = next;
     }
 }
 
@@ -126,13 +134,7 @@ unsigned int Harness::GetTestModules(QList<QSharedPointer<_TestModule>> &modules
 
     QStringList names;
     int features = 0;
-    CollectFeatures(document.documentElement(), names, features);
-    if (document.documentElement().tagName().toLower() == QLatin1String("feature")) {
-        ++features;
-        const QString name = document.documentElement().attribute(QStringLiteral("testModule"));
-        if (!name.isEmpty())
-            names.prepend(name);
-    }
+    CollectFeatures(document, names, features);
     if (features == 0) {
         LogMessage(QStringLiteral("No testcases in BFS File %1.").arg(featureFile), true);
         return 0;

@@ -371,3 +371,35 @@ TEST_F(RunLoopTest, RunByNameTakesTheKitModule)
 }
 
 } // namespace
+
+namespace {
+
+class ListingModule : public controllertest::ScriptedModule
+{
+public:
+    ListingModule() : ScriptedModule(QStringLiteral("Lister")) {}
+    bool GetLogFilePaths(IKestoDevice *device, QStringList &paths) override
+    {
+        if (!device)
+            return false;
+        paths << QStringLiteral("fs:/a.log") << QStringLiteral("fs:/b.log");
+        return true;
+    }
+};
+
+TEST_F(RunLoopTest, LogFilePathsComeFromTheModuleOnceConnected)
+{
+    QSharedPointer<_TestModule> module(new ListingModule);
+    QStringList paths{QStringLiteral("stale")};
+    EXPECT_EQ(m_harness.GetLogFilePaths(module, paths), 2u);
+    EXPECT_EQ(paths, (QStringList{QStringLiteral("fs:/a.log"), QStringLiteral("fs:/b.log")}));
+
+    m_harness.SetTarget(QStringLiteral("absent"));
+    EXPECT_EQ(m_harness.GetLogFilePaths(module, paths), 0u);
+    EXPECT_TRUE(paths.isEmpty());
+    EXPECT_FALSE(m_harness.Unload(m_ctf));
+    EXPECT_FALSE(m_harness.Load(m_ctf));
+    EXPECT_TRUE(m_log.Text().contains(QStringLiteral("Load Error: A device is not available.\n")));
+}
+
+} // namespace

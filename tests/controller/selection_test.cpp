@@ -79,6 +79,22 @@ TEST_F(FeatureListTest, NamesMatchInAnyLetterCaseAtAnyDepth)
     EXPECT_FALSE(m_log.Text().contains(QStringLiteral("Warning")));
 }
 
+TEST_F(FeatureListTest, DeeplyNestedFeatureIsFoundAndRootFeatureCounts)
+{
+    constexpr int kDepth = 3000;
+    QByteArray xml = "<feature testModule=\"Bar\">";
+    for (int i = 0; i < kDepth; ++i)
+        xml += "<g>";
+    xml += "<feature testModule=\"Shell\"/>";
+    for (int i = 0; i < kDepth; ++i)
+        xml += "</g>";
+    xml += "<feature testModule=\"Foo\"/></feature>";
+    Modules modules;
+    EXPECT_EQ(m_harness.GetTestModules(modules, Features(xml)), 3u);
+    EXPECT_EQ(Names(modules),
+              (QStringList{QStringLiteral("Bar"), QStringLiteral("Foo"), QStringLiteral("Shell")}));
+}
+
 TEST_F(FeatureListTest, UnknownNamesAreWarnedOneByOne)
 {
     const QString path = Features("<f><feature testModule=\"Ghost\"/><feature testModule=\"Bar\"/>"
