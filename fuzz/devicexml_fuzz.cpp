@@ -2,37 +2,23 @@
 // beside it: one well-formed, one not.
 #include "environment/testdirectories.h"
 
-#include <QFile>
-#include <QTemporaryDir>
-
-#include <cstddef>
-#include <cstdint>
-#include <cstdlib>
-
-namespace {
-
-bool WriteBytes(const QString &path, const QByteArray &bytes)
-{
-    QFile file(path);
-    return file.open(QIODevice::WriteOnly | QIODevice::Truncate) && file.write(bytes) == bytes.size();
-}
-
-} // namespace
+#include "fuzzutil.h"
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size)
 {
-    static QTemporaryDir folder;
     // Includes are also looked for below the home folder: keep it private.
-    static const bool ready = folder.isValid() && qputenv("HOME", folder.path().toLocal8Bit())
-        && WriteBytes(folder.filePath(QStringLiteral("keys.xml")), "<i><keys><key n=\"1\"/></keys></i>")
-        && WriteBytes(folder.filePath(QStringLiteral("broken.xml")), "<i><open></i>");
-    if (!ready)
-        abort();
+    static const bool ready = [] {
+        qputenv("HOME", fuzzutil::Scratch().path().toLocal8Bit());
+        fuzzutil::WriteBytes(fuzzutil::ScratchPath(QStringLiteral("keys.xml")),
+                             "<i><keys><key n=\"1\"/></keys></i>");
+        fuzzutil::WriteBytes(fuzzutil::ScratchPath(QStringLiteral("broken.xml")), "<i><open></i>");
+        return true;
+    }();
+    (void)ready;
 
-    const QString source = folder.filePath(QStringLiteral("device.xml"));
-    const QString destination = folder.filePath(QStringLiteral("device.dso"));
-    if (!WriteBytes(source, QByteArray(reinterpret_cast<const char *>(data), int(size))))
-        abort();
+    const QString source = fuzzutil::ScratchPath(QStringLiteral("device.xml"));
+    const QString destination = fuzzutil::ScratchPath(QStringLiteral("device.dso"));
+    fuzzutil::WriteBytes(source, fuzzutil::Bytes(data, size));
     FlattenDeviceXml(source, destination);
     return 0;
 }

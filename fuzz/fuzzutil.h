@@ -1,0 +1,64 @@
+#pragma once
+
+// Helpers shared by the fuzz targets.
+
+#include <QByteArray>
+#include <QDir>
+#include <QFile>
+#include <QFileInfo>
+#include <QString>
+#include <QTemporaryDir>
+
+#include <cstddef>
+#include <cstdint>
+#include <cstdlib>
+
+namespace fuzzutil {
+
+// Stops the run with a crash report when an invariant does not hold.
+inline void Check(bool condition)
+{
+    if (!condition)
+        __builtin_trap();
+}
+
+inline QByteArray Bytes(const uint8_t *data, size_t size)
+{
+    return QByteArray(reinterpret_cast<const char *>(data), qsizetype(size));
+}
+
+// A folder for the files of one target, kept for the whole run; in memory
+// (/dev/shm) where there is one, since the library syncs the files it
+// writes atomically and a disk would make every execution wait for that.
+inline const QTemporaryDir &Scratch()
+{
+    static const QTemporaryDir folder = [] {
+        const QString shm = QStringLiteral("/dev/shm");
+        const QString base = QFileInfo(shm).isDir() && QFileInfo(shm).isWritable() ? shm : QDir::tempPath();
+        return QTemporaryDir(base + QStringLiteral("/harness-fuzz-XXXXXX"));
+    }();
+    if (!folder.isValid())
+        abort();
+    return folder;
+}
+
+inline QString ScratchPath(const QString &name)
+{
+    return Scratch().filePath(name);
+}
+
+// Writes bytes to path; a failure is the harness's own and ends the run.
+inline void WriteBytes(const QString &path, const QByteArray &bytes)
+{
+    QFile file(path);
+    if (!file.open(QIODevice::WriteOnly | QIODevice::Truncate) || file.write(bytes) != bytes.size())
+        abort();
+}
+
+inline QByteArray ReadBytes(const QString &path)
+{
+    QFile file(path);
+    return file.open(QIODevice::ReadOnly) ? file.readAll() : QByteArray();
+}
+
+} // namespace fuzzutil
