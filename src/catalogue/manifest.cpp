@@ -180,29 +180,34 @@ bool Manifest::WriteManifest(const QString &path)
         return false;
     }
 
+    // A catalogue of thousands of modules would make a DOM of hundreds of
+    // megabytes: each module is built in a small document of its own and
+    // written out before the next one.
     QDomDocument document;
     QDomElement root = document.createElement(QStringLiteral("testkit"));
     root.setAttribute(QStringLiteral("path"), kitPath);
     root.setAttribute(QStringLiteral("hash"), rootHash);
     root.setAttribute(QStringLiteral("version"), QString::number(kManifestVersion));
-    document.appendChild(root);
-
-    QDomElement modules = document.createElement(QStringLiteral("testmodules"));
-    root.appendChild(modules);
+    XmlWriter::DocumentStream out(1);
+    out.Open(root);
+    out.Open(document.createElement(QStringLiteral("testmodules")));
     for (const QSharedPointer<_TestModule> &module : std::as_const(testModules)) {
-        QDomElement entry = document.createElement(QStringLiteral("testmodule"));
+        QDomDocument piece;
+        QDomElement entry = piece.createElement(QStringLiteral("testmodule"));
+        piece.appendChild(entry);
         module->WriteToManifest(entry);
-        modules.appendChild(entry);
+        out.Write(entry);
     }
+    out.Close();
 
     if (!frameworks.isEmpty()) {
         QDomElement list = document.createElement(QStringLiteral("frameworks"));
-        root.appendChild(list);
         for (const QSharedPointer<_Framework> &framework : std::as_const(frameworks)) {
             QDomElement entry = document.createElement(QStringLiteral("framework"));
-            framework->WriteToManifest(entry);
             list.appendChild(entry);
+            framework->WriteToManifest(entry);
         }
+        out.Write(list);
     }
 
     QString destination = path;
@@ -212,7 +217,7 @@ bool Manifest::WriteManifest(const QString &path)
         QDir().mkpath(cacheDirectory);
     }
     QString error;
-    if (!XmlWriter::WriteDocument(document, destination, 1, true, &error)) {
+    if (!XmlWriter::WriteFile(destination, out.Finish(), true, &error)) {
         LogMessage(QStringLiteral("Manifest::WriteManifest could not write %1: %2\n")
                        .arg(destination, error),
                    true);

@@ -5,6 +5,7 @@
 #include <QSaveFile>
 
 #include <algorithm>
+#include <utility>
 #include <vector>
 
 namespace XmlWriter {
@@ -23,11 +24,41 @@ void AppendCharacterReference(QString &out, char32_t c)
     out += QLatin1String("&#x") + QString::number(static_cast<uint>(c), 16) + QLatin1Char(';');
 }
 
+// Whether c can be copied as it is: no markup, no line or tab characters
+// (attributes escape them), nothing XML cannot carry and, for ASCII output,
+// nothing above 0x7F.
+bool IsPlain(char16_t c, bool ascii)
+{
+    if (c < 0x20)
+        return false;
+    switch (c) {
+    case '&':
+    case '<':
+    case '>':
+    case '"':
+        return false;
+    default:
+        break;
+    }
+    return ascii ? c <= 0x7F : (c <= 0xD7FF || (c >= 0xE000 && c <= 0xFFFD));
+}
+
 void AppendEscaped(QString &out, const QString &text, bool attribute, bool ascii)
 {
     const qsizetype n = text.size();
+    const QChar *chars = text.constData();
     for (qsizetype i = 0; i < n; ++i) {
-        const QChar c = text.at(i);
+        // Runs of plain characters, usually the whole text, are copied at once.
+        qsizetype run = i;
+        while (run < n && IsPlain(chars[run].unicode(), ascii))
+            ++run;
+        if (run > i) {
+            out.append(chars + i, run - i);
+            i = run;
+            if (i == n)
+                break;
+        }
+        const QChar c = chars[i];
         if (c.isHighSurrogate() && i + 1 < n && text.at(i + 1).isLowSurrogate()) {
             if (ascii) {
                 AppendCharacterReference(out, QChar::surrogateToUcs4(c, text.at(i + 1)));
@@ -73,13 +104,24 @@ QString Quoted(const QString &value)
 // in a seeded hash, so their own order changes from run to run.
 std::vector<QDomNode> SortedByName(const QDomNamedNodeMap &map)
 {
+    const int count = map.count();
     std::vector<QDomNode> sorted;
-    sorted.reserve(static_cast<size_t>(map.count()));
-    for (int i = 0; i < map.count(); ++i)
-        sorted.push_back(map.item(i));
-    std::sort(sorted.begin(), sorted.end(), [](const QDomNode &a, const QDomNode &b) {
-        return a.nodeName() < b.nodeName();
-    });
+    sorted.reserve(static_cast<size_t>(count));
+    if (count == 1) {
+        sorted.push_back(map.item(0));
+        return sorted;
+    }
+    // Each name is taken once, not at every comparison.
+    std::vector<std::pair<QString, QDomNode>> named;
+    named.reserve(static_cast<size_t>(count));
+    for (int i = 0; i < count; ++i) {
+        const QDomNode node = map.item(i);
+        named.emplace_back(node.nodeName(), node);
+    }
+    std::sort(named.begin(), named.end(),
+              [](const auto &a, const auto &b) { return a.first < b.first; });
+    for (auto &entry : named)
+        sorted.push_back(std::move(entry.second));
     return sorted;
 }
 
@@ -147,6 +189,25 @@ public:
     }
 
     QString Result() const { return m_out; }
+    QString &Out() { return m_out; }
+    int IndentWidth() const { return m_indent; }
+
+    // The start tag of element with its attributes, left open ("<name a=..."):
+    // the caller finishes it with ">" or "/>".
+    void StartTag(const QDomElement &element, int depth)
+    {
+        AppendSpaces(depth * m_indent);
+        m_out += QLatin1Char('<');
+        m_out += element.tagName();
+        AppendAttributes(element);
+    }
+
+    void AppendSpaces(int count)
+    {
+        if (m_spaces.size() < count)
+            m_spaces = QString(count * 2, QLatin1Char(' '));
+        m_out.append(m_spaces.constData(), count);
+    }
 
 private:
     // A section cannot hold character references: non-ASCII runs are
@@ -204,7 +265,19 @@ private:
     void Indent(const QDomNode &node, int depth)
     {
         if (!IsTextLike(node.previousSibling()))
-            m_out += QString(depth * m_indent, QLatin1Char(' '));
+            AppendSpaces(depth * m_indent);
+    }
+
+    void AppendAttributes(const QDomElement &element)
+    {
+        for (const QDomNode &node : SortedByName(element.attributes())) {
+            const QDomAttr attr = node.toAttr();
+            m_out += QLatin1Char(' ');
+            m_out += attr.name();
+            m_out += QLatin1String("=\"");
+            AppendEscaped(m_out, attr.value(), true, m_ascii);
+            m_out += QLatin1Char('"');
+        }
     }
 
     void LineEnd(const QDomNode &node)
@@ -217,14 +290,9 @@ private:
     {
         Indent(element, depth);
         const QString name = element.tagName();
-        m_out += QLatin1Char('<') + name;
-
-        for (const QDomNode &node : SortedByName(element.attributes())) {
-            const QDomAttr attr = node.toAttr();
-            m_out += QLatin1Char(' ') + attr.name() + QLatin1String("=\"");
-            AppendEscaped(m_out, attr.value(), true, m_ascii);
-            m_out += QLatin1Char('"');
-        }
+        m_out += QLatin1Char('<');
+        m_out += name;
+        AppendAttributes(element);
 
         if (element.hasChildNodes()) {
             m_out += QLatin1Char('>');
@@ -232,8 +300,10 @@ private:
                 m_out += QLatin1Char('\n');
             SaveChildren(element, depth + 1);
             if (!IsTextLike(element.lastChild()))
-                m_out += QString(depth * m_indent, QLatin1Char(' '));
-            m_out += QLatin1String("</") + name + QLatin1Char('>');
+                AppendSpaces(depth * m_indent);
+            m_out += QLatin1String("</");
+            m_out += name;
+            m_out += QLatin1Char('>');
         } else {
             m_out += QLatin1String("/>");
         }
@@ -301,9 +371,75 @@ private:
     int m_indent;
     bool m_ascii;
     QString m_out;
+    // Blanks to indent with, grown as deeper levels need them.
+    QString m_spaces;
 };
 
 } // namespace
+
+struct DocumentStream::Private
+{
+    Private(int indent) : writer(indent, false) {}
+    Writer writer;
+    // The elements opened and not yet closed, and whether each has received
+    // a child (until then its start tag is left open for "/>").
+    QList<QString> open;
+    bool startTagOpen = false;
+
+    // Finishes the start tag of the innermost open element: its content
+    // begins.
+    void BeginContent()
+    {
+        if (startTagOpen) {
+            writer.Out() += QLatin1String(">\n");
+            startTagOpen = false;
+        }
+    }
+};
+
+DocumentStream::DocumentStream(int indent) : d(new Private(indent < 0 ? 0 : indent)) {}
+
+DocumentStream::~DocumentStream() = default;
+
+void DocumentStream::Open(const QDomElement &element)
+{
+    d->BeginContent();
+    d->writer.StartTag(element, int(d->open.size()));
+    d->open.append(element.tagName());
+    d->startTagOpen = true;
+}
+
+void DocumentStream::Write(const QDomElement &element)
+{
+    d->BeginContent();
+    d->writer.Save(element, int(d->open.size()));
+}
+
+void DocumentStream::Close()
+{
+    if (d->open.isEmpty())
+        return;
+    const QString name = d->open.takeLast();
+    QString &out = d->writer.Out();
+    if (d->startTagOpen) {
+        out += QLatin1String("/>\n");
+        d->startTagOpen = false;
+        return;
+    }
+    d->writer.AppendSpaces(int(d->open.size()) * d->writer.IndentWidth());
+    out += QLatin1String("</");
+    out += name;
+    out += QLatin1String(">\n");
+}
+
+QByteArray DocumentStream::Finish()
+{
+    while (!d->open.isEmpty())
+        Close();
+    const QByteArray bytes = d->writer.Out().toUtf8();
+    d->writer.Out().clear();
+    return bytes;
+}
 
 QString ToString(const QDomNode &node, int indent)
 {

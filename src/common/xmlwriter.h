@@ -6,6 +6,8 @@
 #include <QDomDocument>
 #include <QString>
 
+#include <memory>
+
 // Serialises DOM documents the same way in every process. Qt keeps
 // attributes in a seeded hash, so QDomDocument::toString orders them
 // differently from run to run; this writer orders attributes by name, indents
@@ -34,5 +36,39 @@ HARNESS_EXPORT bool WriteFile(const QString &path, const QByteArray &bytes, bool
 // Serialize(document) written with WriteFile.
 HARNESS_EXPORT bool WriteDocument(const QDomDocument &document, const QString &path,
                                   int indent = 1, bool atomic = true, QString *error = nullptr);
+
+// Writes one large document element by element, exactly as ToString would
+// write the whole tree, so that it never has to be held as one DOM: each
+// piece can be built in a small document of its own and dropped once
+// written. Every element given is taken as followed by an element sibling
+// (a line end after it); text between the pieces cannot be written.
+//
+//   XmlWriter::DocumentStream out;
+//   out.Open(root);              // "<testkit a=...>" (its children are not written)
+//   out.Write(module);           // a whole element, one level deeper
+//   out.Close();                 // "</testkit>", or "/>" when nothing was written inside
+//   XmlWriter::WriteFile(path, out.Finish());
+class HARNESS_EXPORT DocumentStream
+{
+public:
+    explicit DocumentStream(int indent = 1);
+    ~DocumentStream();
+    DocumentStream(const DocumentStream &) = delete;
+    DocumentStream &operator=(const DocumentStream &) = delete;
+
+    // Starts element (its name and attributes) inside the innermost open one.
+    void Open(const QDomElement &element);
+    // Writes element with everything below it inside the innermost open one.
+    void Write(const QDomElement &element);
+    // Ends the innermost open element.
+    void Close();
+    // Ends every open element and returns the UTF-8 text; the stream is
+    // empty afterwards.
+    QByteArray Finish();
+
+private:
+    struct Private;
+    std::unique_ptr<Private> d;
+};
 
 } // namespace XmlWriter

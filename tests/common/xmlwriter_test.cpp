@@ -173,3 +173,39 @@ TEST(XmlWriterDeclarations, AsciiStringEscapesEverythingBeyondAscii)
 }
 
 } // namespace
+
+// Writing a document piece by piece gives the bytes of writing it whole,
+// escaping and attribute order included; an opened element that receives
+// nothing closes as an empty one.
+TEST(XmlWriterStream, PiecesGiveTheBytesOfTheWholeDocument)
+{
+    const QString text = QStringLiteral(
+        "<kit z=\"1\" a=\"x &amp; &quot;y&quot;\">"
+        "<modules>"
+        "<module n=\"1\" b=\"2\"><case name=\"t&lt;1&gt;\"/><case name=\"t2\">text &amp; more</case></module>"
+        "<module n=\"\u00e9\"/>"
+        "</modules>"
+        "<empty k=\"v\"/>"
+        "<frameworks><framework name=\"ctf\"><variant/></framework></frameworks>"
+        "</kit>");
+    const QDomDocument whole = Parse(text);
+
+    XmlWriter::DocumentStream out;
+    const QDomElement kit = whole.documentElement();
+    out.Open(kit);
+    const QDomElement modules = kit.firstChildElement();
+    out.Open(modules);
+    for (QDomElement module = modules.firstChildElement(); !module.isNull();
+         module = module.nextSiblingElement()) {
+        // Each piece in a document of its own, as a caller builds it.
+        QDomDocument piece;
+        piece.appendChild(piece.importNode(module, true));
+        out.Write(piece.documentElement());
+    }
+    out.Close();
+    out.Open(modules.nextSiblingElement());
+    out.Close();
+    out.Write(kit.lastChildElement());
+    EXPECT_EQ(QString::fromUtf8(out.Finish()), XmlWriter::ToString(whole));
+    EXPECT_TRUE(out.Finish().isEmpty());
+}
