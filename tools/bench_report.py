@@ -16,6 +16,8 @@ PAIRS = [
     ("Catalogue scan, GenerateManifest(true)", "Scan/{}", "ReadKitFiles/{}", 4.0),
     ("Cached catalogue read, ReadManifest", "ReadManifest/{}", "ParseManifestDom/{}", 2.0),
     ("Log reprocessing, Process(0)", "Process/{}", "ParseLogsOnly/{}", 2.0),
+    ("Record one module in a run (with write)", "RecordModule/{}", "ParseOneLog/{}", None),
+    ("Record one module in a run (no write)", "RecordModuleNoWrite/{}", "ParseOneLog/{}", None),
     ("Resource file save", "SaveResourceFile/{}", "WriteFileBaseline/{}", None),
     ("Resource file load", "LoadResourceFile/{}", "ReadFileBaseline/{}", None),
     ("Decode 10 MB", "Decode/{}", "DecodeIconv/{}", 2.0),
@@ -26,6 +28,8 @@ PAIRS = [
 GROWTH = [
     ("Scan 8,000 / 2,000 modules", "Scan/modules:2000", "Scan/modules:8000", 4.5),
     ("Reprocessing 8,000 / 2,000 logs", "Process/modules:2000", "Process/modules:8000", 4.5),
+    ("Recording one module without the write, 8,000 / 500 kit", "RecordModuleNoWrite/modules:500",
+     "RecordModuleNoWrite/modules:8000", 1.5),
     ("Resource save 65,535 / 16,383", "SaveResourceFile/16383", "SaveResourceFile/65535", 4.5),
     ("Resource load 65,535 / 16,383", "LoadResourceFile/16383", "LoadResourceFile/65535", 4.5),
 ]

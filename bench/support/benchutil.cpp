@@ -62,6 +62,16 @@ QByteArray RunChild(const QString &name, const QStringList &arguments, QString *
 
 long PeakRssKiB()
 {
+    // VmHWM belongs to this program alone; ru_maxrss would also count what
+    // the parent held when it started this process (Linux keeps it across
+    // fork and exec).
+    QFile status(QStringLiteral("/proc/self/status"));
+    if (status.open(QIODevice::ReadOnly)) {
+        for (const QByteArray &line : status.readAll().split('\n')) {
+            if (line.startsWith("VmHWM:"))
+                return line.mid(6).trimmed().split(' ').value(0).toLong();
+        }
+    }
     struct rusage usage {};
     if (getrusage(RUSAGE_SELF, &usage) != 0)
         return -1;

@@ -26,7 +26,7 @@ bool RunChildMode(int argc, char **argv, int *status);
 // standard output (empty when it fails, with the reason in *error).
 QByteArray RunChild(const QString &name, const QStringList &arguments, QString *error);
 
-// The peak resident set size of this process so far, in KiB.
+// The peak resident set size of this program so far (VmHWM), in KiB.
 long PeakRssKiB();
 
 // Reads every file below root once (sorted walk); returns the bytes read.
