@@ -33,8 +33,6 @@ mkdir -p usermods/CTF
 helper=Fail
 [ -d usermods/Helper ] && helper=Pass
 printf 'Suite: Audio\nTest: play\nResult: Pass\nTest: helper\nResult: %s\nTest: record.1\nResult: Fail\n[/VERBOSE]\n' "$helper" > usermods/CTF/CTF.log
-[ -f "$HANDSET_FS/../go-offline" ] && : > "$HANDSET_FS/../offline"
-exit 0
 )SH";
 
 // CTF applet "Browser": a log in its own module folder.
@@ -50,8 +48,10 @@ printf '<TestRunLog><case name="open"/></TestRunLog>\n' > "$HANDSET_MODULE_DIR/l
 )SH";
 
 // The OAT framework applet: runs the OAT program named in its arguments
-// ("-dk -ra Name" or "-dk -rs Name,case,..."), writing "<name>.oat".
+// ("-dk -ra Name" or "-dk -rs Name,case,..."), writing "<name>.oat". With
+// "go-offline" beside the handset it takes the handset offline instead.
 const char kOatBehaviour[] = R"SH(
+[ -f "$HANDSET_FS/../go-offline" ] && { : > "$HANDSET_FS/../offline"; exit 0; }
 shift 2
 echo "$@" >> "$HANDSET_FS/../oat-calls.txt"
 program=$(echo "$3" | cut -d, -f1)
@@ -327,15 +327,20 @@ TEST_F(HandsetRunTest, TestCasesReachTheFirstOatModuleOnly)
                                      QStringLiteral("-dk -ra Pim")}));
 }
 
-TEST_F(HandsetRunTest, HandsetGoingOfflineEndsTheRun)
+TEST_F(HandsetRunTest, HandsetGoingOfflineEndsTheRunAndKeepsWhatWasRecorded)
 {
     WriteFile(m_handsets.HandsetFolder(QStringLiteral("phone")) + QStringLiteral("/go-offline"), "");
-    Queue({QStringLiteral("Pim"), QStringLiteral("Audio")});
+    Queue({QStringLiteral("Pim"), QStringLiteral("Audio"), QStringLiteral("Menu")});
     EXPECT_FALSE(m_harness.Run());
     const QString log = m_log.Text();
-    EXPECT_TRUE(log.contains(QStringLiteral("Device Connection has died."))) << log.toStdString();
-    EXPECT_FALSE(log.contains(QStringLiteral("Unloading Framework")));
-    EXPECT_FALSE(log.contains(QStringLiteral("Running KVK test Pim")));
+    EXPECT_TRUE(log.endsWith(QStringLiteral("Device Connection has died."))) << log.toStdString();
+    EXPECT_TRUE(log.contains(QStringLiteral("Unloading Framework ctf\nLoading Framework oat\n")));
+    EXPECT_FALSE(log.contains(QStringLiteral("Unloading Framework oat")));
+    EXPECT_FALSE(log.contains(QStringLiteral("Running KVK test Menu")));
+    // The module run before the handset went away is in the file.
+    const ResultsView view = Results();
+    EXPECT_EQ(view.verdicts.value(QStringLiteral("Audio/play")), QStringLiteral("pass"));
+    EXPECT_EQ(view.verdicts.value(QStringLiteral("Pim/Pim_first")), QStringLiteral("unexecuted"));
 }
 
 class HandsetRunWithoutUtFrameworkTest : public HandsetRunTest
