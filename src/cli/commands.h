@@ -25,6 +25,7 @@ struct Command
 // The commands each part of the tool contributes.
 QList<Command> InspectionCommands();
 QList<Command> RunCommands();
+QList<Command> RunnerCommands();
 QList<Command> DemoCommands();
 
 // Writes to standard output / standard error as UTF-8.

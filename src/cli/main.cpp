@@ -25,6 +25,7 @@ namespace {
 QList<Command> AllCommands()
 {
     QList<Command> commands;
+    commands += RunnerCommands();
     commands += RunCommands();
     commands += InspectionCommands();
     commands += DemoCommands();

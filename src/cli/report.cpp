@@ -92,7 +92,8 @@ int RunReport::Total(const QString &result) const
 
 QString RunReport::Summary(bool withHandset) const
 {
-    int nameWidth = 6;
+    const QString totalLabel = QStringLiteral("Total (%1 modules)").arg(modules.size());
+    int nameWidth = int(totalLabel.size());
     int handsetWidth = 7;
     for (const ModuleReport &module : modules) {
         nameWidth = qMax(nameWidth, int(module.name.size()));
@@ -113,7 +114,7 @@ QString RunReport::Summary(bool withHandset) const
         text += row(m.name, m.handset, QString::number(m.Count(kPass)), QString::number(m.Count(kFail)),
                     QString::number(m.Count(kUnsupported)), QString::number(m.Count(kUnexecuted)));
     }
-    text += row(QStringLiteral("Total (%1 modules)").arg(modules.size()), QString(),
+    text += row(totalLabel, QString(),
                 QString::number(Total(kPass)), QString::number(Total(kFail)),
                 QString::number(Total(kUnsupported)), QString::number(Total(kUnexecuted)));
     return text;

@@ -104,6 +104,12 @@ void Harness::SetLogOutputPath(const QString &path)
     m_environment.insert(EnvironmentKey::LogPath, path);
 }
 
+void Harness::SetProcessedResultsPath(const QString &path)
+{
+    if (!path.isEmpty())
+        m_environment.insert(EnvironmentKey::ProcessedResultsPath, path);
+}
+
 void Harness::SetTestCases(const QStringList &testCases)
 {
     m_testCases = testCases;

@@ -66,6 +66,9 @@ public:
     QString GetPlatform() const;
     // Host folder for copied logs; overrides the per-handset default.
     void SetLogOutputPath(const QString &path);
+    // The processed-results file to record verdicts in; overrides the
+    // per-handset default (and, for Process, the file below the log folder).
+    void SetProcessedResultsPath(const QString &path);
     void SetTestCases(const QStringList &testCases);
 
     // Takes a device pack: compiles it (once per source file and change) with
