@@ -23,17 +23,6 @@ namespace {
 // Caches older than this format are stale and trigger a new scan.
 constexpr unsigned int kManifestVersion = 5;
 
-bool ReadCacheDocument(const QString &path, QDomDocument &document)
-{
-    QFile file(path);
-    if (!file.open(QIODevice::ReadOnly))
-        return false;
-    const bool parsed = document.setContent(&file, false);
-    file.close();
-    return parsed && !document.documentElement().isNull()
-        && document.documentElement().tagName().toLower() == QLatin1String("testkit");
-}
-
 // The child elements of parent whose lower-cased name is name.
 QList<QDomElement> ChildrenNamed(const QDomElement &parent, QLatin1String name)
 {
@@ -103,12 +92,26 @@ QString Manifest::ManifestCachePath()
     return cacheFile;
 }
 
+bool Manifest::ReadCacheDocument(const QString &path, QDomDocument &document)
+{
+    QFile file(path);
+    if (!file.open(QIODevice::ReadOnly))
+        return false;
+    const bool parsed = document.setContent(&file, false);
+    file.close();
+    return parsed && !document.documentElement().isNull()
+        && document.documentElement().tagName().toLower() == QLatin1String("testkit");
+}
+
 bool Manifest::IsVersionOkay()
 {
     testModules.clear();
     QDomDocument document;
-    if (!ReadCacheDocument(cacheFile, document))
-        return false;
+    return ReadCacheDocument(cacheFile, document) && IsCurrent(document);
+}
+
+bool Manifest::IsCurrent(const QDomDocument &document)
+{
     QString version = document.documentElement().attribute(QStringLiteral("version"));
     if (version.isEmpty())
         version = QStringLiteral("0");
@@ -145,7 +148,12 @@ bool Manifest::ReadManifest()
     QDomDocument document;
     if (!ReadCacheDocument(cacheFile, document))
         return false;
+    ReadDocument(document);
+    return true;
+}
 
+void Manifest::ReadDocument(const QDomDocument &document)
+{
     const QDomElement root = document.documentElement();
     for (QDomElement section = root.firstChildElement(); !section.isNull();
          section = section.nextSiblingElement()) {
@@ -170,7 +178,6 @@ bool Manifest::ReadManifest()
             }
         }
     }
-    return true;
 }
 
 bool Manifest::WriteManifest(const QString &path)

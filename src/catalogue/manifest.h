@@ -9,6 +9,7 @@
 #include <QStringList>
 
 class Log;
+class QDomDocument;
 class QFileInfo;
 class _Framework;
 class _TestModule;
@@ -101,6 +102,13 @@ private:
     void ProcessPackageDir(QSharedPointer<_TestModule> module, const QString &dir);
     void DecompileKestoPackage(QSharedPointer<_TestModule> module, const QString &package);
     void ProcessSecondaryModules();
+
+    // Parses a cache file; false unless it is well-formed with a "testkit" root.
+    static bool ReadCacheDocument(const QString &path, QDomDocument &document);
+    // Whether a parsed cache carries a current format version.
+    static bool IsCurrent(const QDomDocument &document);
+    // Fills the maps from a parsed cache.
+    void ReadDocument(const QDomDocument &document);
 
     // An empty module of the kind whose type word is type; null when none.
     static QSharedPointer<_TestModule> CreateModule(const QString &type);

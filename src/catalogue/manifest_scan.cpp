@@ -14,6 +14,7 @@
 #include "resources/kestoresources.h"
 
 #include <QDir>
+#include <QDomDocument>
 #include <QFileInfo>
 #include <QHash>
 #include <QSet>
@@ -132,8 +133,15 @@ QSharedPointer<_CompilerVariant> PackageVariant(const QFileInfo &package, QStrin
 
 bool Manifest::GenerateManifest(bool force)
 {
-    if (QFileInfo::exists(cacheFile) && IsVersionOkay() && !force)
-        return ReadManifest();
+    // IsVersionOkay followed by ReadManifest, parsing the cache only once.
+    if (QFileInfo::exists(cacheFile)) {
+        testModules.clear();
+        QDomDocument document;
+        if (ReadCacheDocument(cacheFile, document) && IsCurrent(document) && !force) {
+            ReadDocument(document);
+            return true;
+        }
+    }
 
     ScanState state;
     m_scan = &state;

@@ -108,6 +108,21 @@ TEST_F(ManifestCacheTest, MissingCacheIsNotCurrentAndCannotBeRead)
     EXPECT_FALSE(manifest.ReadManifest());
 }
 
+TEST_F(ManifestCacheTest, StaleOrBrokenCacheIsReplacedByAScan)
+{
+    kit->AddSourceModule(QStringLiteral("tests/a"), MakeModule(QStringLiteral("ctf"), QStringLiteral("Scanned")));
+    for (const QByteArray &stale :
+         {QByteArray("<testkit version='4'><testmodules><testmodule testtype='ctf' moduleName='Old'/></testmodules></testkit>"),
+          QByteArray("<testkit version='5'><testmodules><testmodule testtype='ctf' moduleName='Cut'/>")}) {
+        Manifest manifest(kit->Root(), false);
+        WriteCache(manifest, stale);
+        ASSERT_TRUE(manifest.GenerateManifest(false));
+        EXPECT_EQ(manifest.testModules.keys(), QStringList{"scanned"}) << stale.constData();
+        Manifest reread(kit->Root(), false);
+        EXPECT_TRUE(reread.IsVersionOkay());
+    }
+}
+
 TEST_F(ManifestCacheTest, CacheNamingAnotherKitIsStillRead)
 {
     Manifest manifest(kit->Root(), false);
