@@ -12,6 +12,7 @@
 
 class Log;
 class Manifest;
+class ModuleSource;
 class ProcessedResults;
 class _Framework;
 class _TestModule;
@@ -85,6 +86,7 @@ public:
     // Selects the handset by full or partial name. A new name drops an open
     // connection, so the next operation connects to the new handset.
     void SetTarget(const QString &name);
+    QString GetTarget() const;
     // True when at least one handset is reachable.
     bool IsTargetAvailable();
     // Connects to the first listed handset whose name or description contains
@@ -94,6 +96,8 @@ public:
     bool ConnectToTarget(const QString &name);
     bool ConnectToTarget(const ConnectTarget &target);
     void DisconnectTarget();
+    // The name of the connected handset; empty while disconnected.
+    QString ConnectedTarget() const;
     // Copies a handset file to the host, connecting first; true on success.
     bool CopyFileFromDevice(const QString &handsetPath, const QString &hostPath);
     // The per-handset log folder of the connected handset, connecting first;
@@ -143,11 +147,25 @@ public:
     // when nothing was queued, set-up or the connection failed, or the
     // handset was lost during the run.
     bool Run();
+    // Runs the modules that source hands out one at a time, as Run() runs
+    // its queue: set-up and connection first, each module's framework loaded
+    // when needed, and every framework the run loaded unloaded at the end
+    // (or as soon as another test type comes, unless the source keeps
+    // frameworks). The queued tests are not touched. False when set-up or
+    // the connection failed, or the handset was lost during the run (the
+    // source was told Interrupted for the module then in hand).
+    bool Run(ModuleSource &source);
+    // Sorts modules into run order: by test type, then by name.
+    static void SortForRun(QList<QSharedPointer<_TestModule>> &modules);
     // Installs the module's secondary modules and starts the module; false
     // when it could not be started.
     bool Run(QSharedPointer<_TestModule> module);
     // Runs the kit module of that name (any letter case); false when none.
     bool Run(const QString &name);
+    // After set-up, this Harness's own catalogue module of that name (any
+    // letter case) from the kit ("KVK") or platform ("PVS") catalogue; null
+    // when there is none.
+    QSharedPointer<_TestModule> FindTestModule(const QString &name, const QString &source);
     // Makes sure the framework is on the handset; false with a message when
     // it cannot be loaded.
     bool Load(QSharedPointer<_Framework> framework);
@@ -192,6 +210,8 @@ private:
     void UpdateProcessedModulesXML(QSharedPointer<_TestModule> module);
     // Sets "ProcessedResultsPath" below "LogPath" + "/" + folder when absent.
     void EnsureProcessedResultsPath(const QString &folder);
+    // The run loop over the modules of source, once set up and connected.
+    bool RunModules(ModuleSource &source);
     // The log wait of the run loop; false when the handset was lost.
     bool WaitForLog(QSharedPointer<_TestModule> module);
     // Writes one generated catalogue to outputPath (or its home-folder

@@ -6,6 +6,7 @@
 #include "catalogue/manifest.h"
 #include "catalogue/testmodule.h"
 #include "common/clock.h"
+#include "controller/modulesource.h"
 #include "controller/resultssession.h"
 
 #include <algorithm>
@@ -51,6 +52,48 @@ bool Harness::WaitForLog(QSharedPointer<_TestModule> module)
     }
 }
 
+namespace {
+
+// The modules of a list in order.
+class ListSource : public ModuleSource
+{
+public:
+    explicit ListSource(const QList<QSharedPointer<_TestModule>> &modules) : m_modules(modules) {}
+    QSharedPointer<_TestModule> Next() override
+    {
+        return m_next < m_modules.size() ? m_modules.at(m_next++) : QSharedPointer<_TestModule>();
+    }
+
+private:
+    QList<QSharedPointer<_TestModule>> m_modules;
+    qsizetype m_next = 0;
+};
+
+// A framework on the handset during a run, and whether the run found it there.
+struct RunFramework
+{
+    QSharedPointer<_Framework> framework;
+    bool wasLoaded = false;
+};
+
+} // namespace
+
+ModuleSource::~ModuleSource() = default;
+
+void ModuleSource::Finished(const QSharedPointer<_TestModule> &, Outcome)
+{
+}
+
+bool ModuleSource::KeepFrameworks() const
+{
+    return false;
+}
+
+void Harness::SortForRun(QList<QSharedPointer<_TestModule>> &modules)
+{
+    std::stable_sort(modules.begin(), modules.end(), RunsBefore);
+}
+
 bool Harness::Run()
 {
     if (m_tests.isEmpty()) {
@@ -63,41 +106,75 @@ bool Harness::Run()
         return false;
 
     QList<QSharedPointer<_TestModule>> order = m_tests;
-    std::stable_sort(order.begin(), order.end(), RunsBefore);
+    SortForRun(order);
+    ListSource source(order);
+    return RunModules(source);
+}
 
+bool Harness::Run(ModuleSource &source)
+{
+    if (!Setup())
+        return false;
+    if (!ConnectToTarget(m_target) || !m_device)
+        return false;
+    return RunModules(source);
+}
+
+bool Harness::RunModules(ModuleSource &source)
+{
     const ResultsSession session(*this, false);
-    QSharedPointer<_Framework> framework;
-    bool frameworkWasLoaded = false;
+    const bool keepFrameworks = source.KeepFrameworks();
+    // The frameworks on the handset for this run, in load order; the current
+    // one (the last module's) is at `current`, -1 when there is none.
+    QList<RunFramework> frameworks;
+    qsizetype current = -1;
     bool result = false;
 
-    for (const QSharedPointer<_TestModule> &module : order) {
+    const auto unload = [this](const RunFramework &entry) {
+        if (entry.wasLoaded)
+            return;
+        LogMessage(QStringLiteral("Unloading Framework %1\n").arg(entry.framework->name), true);
+        entry.framework->Unload(m_device, m_environment);
+    };
+
+    while (const QSharedPointer<_TestModule> module = source.Next()) {
         module->SetLogger(m_logger);
         const QString name = module->moduleName;
         const QString testType = module->TestType();
 
-        if (!framework || testType != framework->name) {
-            if (framework && !frameworkWasLoaded) {
-                LogMessage(QStringLiteral("Unloading Framework %1\n").arg(framework->name), true);
-                framework->Unload(m_device, m_environment);
+        if (current < 0 || testType != frameworks.at(current).framework->name) {
+            if (current >= 0 && !keepFrameworks) {
+                unload(frameworks.at(current));
+                frameworks.removeAt(current);
             }
-            framework = GetFramework(testType);
-            if (!framework) {
+            current = -1;
+            for (qsizetype i = 0; i < frameworks.size(); ++i) {
+                if (frameworks.at(i).framework->name.toLower() == testType.toLower())
+                    current = i;
+            }
+        }
+        if (current < 0) {
+            RunFramework entry;
+            entry.framework = GetFramework(testType);
+            if (!entry.framework) {
                 LogMessage(QStringLiteral("Framework %1 not found.\n").arg(testType), true);
                 result = true;
+                source.Finished(module, ModuleSource::NoFramework);
                 continue;
             }
-            framework->SetLogger(m_logger);
-            if (framework->IsLoaded(m_device)) {
-                framework->PostLoad(m_device, m_environment);
-                LogMessage(
-                    QStringLiteral("Harness::Run Framework %1 already loaded").arg(framework->name),
-                    false);
-                frameworkWasLoaded = true;
+            entry.framework->SetLogger(m_logger);
+            if (entry.framework->IsLoaded(m_device)) {
+                entry.framework->PostLoad(m_device, m_environment);
+                LogMessage(QStringLiteral("Harness::Run Framework %1 already loaded")
+                               .arg(entry.framework->name),
+                           false);
+                entry.wasLoaded = true;
             } else {
-                LogMessage(QStringLiteral("Loading Framework %1\n").arg(framework->name), true);
-                framework->Load(m_device, m_environment);
-                frameworkWasLoaded = false;
+                LogMessage(QStringLiteral("Loading Framework %1\n").arg(entry.framework->name), true);
+                entry.framework->Load(m_device, m_environment);
             }
+            frameworks.append(entry);
+            current = frameworks.size() - 1;
         }
 
         LogMessage(QStringLiteral("Running %1 test %2 ID:%3\n")
@@ -114,15 +191,19 @@ bool Harness::Run()
             LogMessage(QStringLiteral("Test %1 Failed\n").arg(name), true);
             // A handset that went away fails every module after this one.
             if (m_device->connectionLost) {
+                source.Finished(module, ModuleSource::Interrupted);
                 LogMessage(kConnectionDied, true);
                 return false;
             }
+            source.Finished(module, ModuleSource::StartFailed);
             continue;
         }
 
         LogMessage(QStringLiteral("   Test %1 Run\n").arg(name), true);
-        if (!WaitForLog(module))
+        if (!WaitForLog(module)) {
+            source.Finished(module, ModuleSource::Interrupted);
             return false;
+        }
 
         if (m_copyDelay > 0) {
             LogMessage(QStringLiteral("   Sleeping %1 Milliseconds\n").arg(m_copyDelay), true);
@@ -130,6 +211,10 @@ bool Harness::Run()
         }
         if (!module->CopyLog(m_device, m_environment)) {
             LogMessage(QStringLiteral("   No logs found for %1\n").arg(name), true);
+            // Logs that could not be fetched from a handset that went away
+            // are not the module's fault: it has to run again elsewhere.
+            source.Finished(module, m_device->connectionLost ? ModuleSource::Interrupted
+                                                             : ModuleSource::NoLogs);
             continue;
         }
         if (!m_noDelete) {
@@ -138,12 +223,11 @@ bool Harness::Run()
         }
         module->PostProcess(m_environment);
         UpdateProcessedModulesXML(module);
+        source.Finished(module, ModuleSource::Recorded);
     }
 
-    if (framework && !frameworkWasLoaded) {
-        LogMessage(QStringLiteral("Unloading Framework %1\n").arg(framework->name), true);
-        framework->Unload(m_device, m_environment);
-    }
+    for (const RunFramework &entry : frameworks)
+        unload(entry);
     return result;
 }
 
