@@ -18,6 +18,8 @@ bool g_firstOpen = true;
 
 void Echo(bool newLine, unsigned int indent, char mark)
 {
+    // Handsets run from several threads share the console.
+    QMutexLocker locker(&LogMutex());
     if (newLine)
         std::cout << std::endl << std::string(indent, ' ');
     std::cout << mark;

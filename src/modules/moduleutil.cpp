@@ -152,7 +152,8 @@ bool WaitForLogMarker(IKestoDevice *device, const QString &devicePath, const QBy
                     logger->EchoDash(newLine, kProgressIndent);
             }
         }
-        if (waited > kLogWaitLimitMs)
+        // A handset that went away will never complete the log.
+        if (waited > kLogWaitLimitMs || (device && device->connectionLost))
             return false;
     }
 }

@@ -157,7 +157,8 @@ bool UTTestModule::IsLogComplete(IKestoDevice *device)
         done(textLog, kTextEndMarker);
         if (xmlLog.isEmpty() && textLog.isEmpty())
             return true;
-        if (waited > kLogWaitLimitMs)
+        // A handset that went away will never complete the logs.
+        if (waited > kLogWaitLimitMs || (device && device->connectionLost))
             return false;
     }
 }
