@@ -3,7 +3,9 @@
 #include "cli/report.h"
 
 #include "catalogue/testmodule.h"
+#include "catalogue/testcase.h"
 #include "controller/harness.h"
+#include "controller/shardedrun.h"
 #include "environment/testdirectories.h"
 #include "log/log.h"
 
@@ -11,7 +13,10 @@
 #include <QFileInfo>
 #include <QSet>
 
+#include <functional>
 #include <iostream>
+#include <memory>
+#include <vector>
 
 namespace {
 
@@ -143,6 +148,26 @@ QSet<QString> NotPassedModules(const QString &resultsPath)
     return names;
 }
 
+// Keeps the modules that no processed-results file shows with every test
+// case passed. A handset without a results file has passed nothing.
+void KeepNotPassed(QList<QSharedPointer<_TestModule>> &modules, const QStringList &resultsPaths)
+{
+    QSet<QString> notPassed;
+    bool any = false;
+    for (const QString &path : resultsPaths) {
+        if (!QFileInfo(path).isFile())
+            continue;
+        const QSet<QString> here = NotPassedModules(path);
+        notPassed = any ? notPassed.intersect(here) : here;
+        any = true;
+    }
+    if (!any)
+        return;
+    modules.erase(std::remove_if(modules.begin(), modules.end(),
+                                 [&](const QSharedPointer<_TestModule> &m) { return !notPassed.contains(m->moduleName.toLower()); }),
+                  modules.end());
+}
+
 // The report rows of the modules run, in run order.
 RunReport ReportOf(const QString &resultsPath, const QList<QSharedPointer<_TestModule>> &modules)
 {
@@ -165,9 +190,9 @@ RunReport ReportOf(const QString &resultsPath, const QList<QSharedPointer<_TestM
     return report;
 }
 
-int Publish(const RunReport &report, const QCommandLineParser &parser)
+int Publish(const RunReport &report, const QCommandLineParser &parser, bool withHandset = false)
 {
-    Out(QStringLiteral("\n") + report.Summary(false));
+    Out(QStringLiteral("\n") + report.Summary(withHandset));
     QString error;
     for (const auto &[option, json] : {std::pair{&kJUnit, false}, std::pair{&kJson, true}}) {
         if (!parser.isSet(*option))
@@ -181,6 +206,159 @@ int Publish(const RunReport &report, const QCommandLineParser &parser)
         Out(QStringLiteral("%1: %2\n").arg(json ? QStringLiteral("JSON summary") : QStringLiteral("JUnit report"), path));
     }
     return ExitSuccess;
+}
+
+QString DefaultLibraryLog()
+{
+    return QFileInfo(TestDirectories::GetTestDataPath()).absolutePath() + QStringLiteral("/harness.log");
+}
+
+// What a run on several handsets needs beyond the Harness settings.
+struct ShardedOptions
+{
+    QStringList arguments;
+    QStringList targets;  // names or parts of names, as given
+    bool allTargets = false;
+    QString logDir;       // each handset logs into <logDir>/<handset>
+    bool retry = false;
+    QStringList testCases;
+    QString libraryLog;
+};
+
+// The full names of the handsets the options ask for: every listed one, or
+// for each given text the first listed handset whose name or description
+// contains it (any letter case). Empty with a message when one is unknown.
+QStringList ResolveTargets(const ShardedOptions &options)
+{
+    QList<ConnectTarget> listed;
+    Harness::ListTargets(listed);
+    QStringList names;
+    if (options.allTargets) {
+        for (const ConnectTarget &handset : listed)
+            names.append(handset.name);
+    }
+    for (const QString &wanted : options.targets) {
+        const QString lower = wanted.toLower();
+        QString found;
+        for (const ConnectTarget &handset : listed) {
+            if (handset.name.toLower().contains(lower) || handset.description.toLower().contains(lower)) {
+                found = handset.name;
+                break;
+            }
+        }
+        if (found.isEmpty()) {
+            Err(options.arguments.at(0) + QStringLiteral(": no handset matching '%1' (see 'harness targets')\n").arg(wanted));
+            return {};
+        }
+        names.append(found);
+    }
+    names.removeDuplicates();
+    if (names.isEmpty())
+        Err(options.arguments.at(0) + QStringLiteral(": no handset attached (see 'harness targets')\n"));
+    return names;
+}
+
+// Runs the selection on several handsets at once and prints one summary
+// naming the handset of every module.
+int RunSharded(const QCommandLineParser &parser, const ShardedOptions &options,
+               const std::function<void(Harness &, Log &, const QString &, const QString &)> &configure)
+{
+    const QStringList names = ResolveTargets(options);
+    if (names.isEmpty())
+        return ExitUsage;
+
+    Log log;
+    std::vector<std::unique_ptr<Harness>> harnesses;
+    for (const QString &name : names) {
+        harnesses.push_back(std::make_unique<Harness>());
+        configure(*harnesses.back(), log, name,
+                  options.logDir.isEmpty() ? QString() : options.logDir + QLatin1Char('/') + name);
+    }
+    QList<QSharedPointer<_TestModule>> modules = Select(*harnesses.front(), parser);
+    QMap<QString, QString> resultsPaths;
+    for (const QString &name : names)
+        resultsPaths.insert(name, TestDirectories::GetProcessResultsPath(name));
+    if (options.retry) {
+        KeepNotPassed(modules, resultsPaths.values());
+        if (modules.isEmpty()) {
+            Out(QStringLiteral("Every selected module has passed on these handsets: nothing to retry.\n"));
+            return ExitSuccess;
+        }
+    }
+    if (modules.isEmpty()) {
+        Err(options.arguments.at(0) + QStringLiteral(": no test module selected (see 'harness modules')\n"));
+        return ExitUsage;
+    }
+
+    ShardedRun run(&log);
+    for (const std::unique_ptr<Harness> &harness : harnesses)
+        run.AddHandset(harness.get());
+    run.SetTestCases(options.testCases);
+    const bool allRan = run.Run(modules);
+    for (const std::unique_ptr<Harness> &harness : harnesses)
+        harness->DisconnectTarget();
+
+    // One row per module, from the results file of the handset that ran it;
+    // modules that never ran keep their test cases unexecuted.
+    QMap<QString, RunReport> byHandset;
+    RunReport report;
+    for (const ShardedRun::ModuleResult &result : run.Modules()) {
+        ModuleReport row;
+        row.name = result.name;
+        row.source = result.source;
+        if (!result.handset.isEmpty() && resultsPaths.contains(result.handset)) {
+            if (!byHandset.contains(result.handset)) {
+                QString error;
+                byHandset[result.handset].Read(resultsPaths.value(result.handset), &error);
+            }
+            for (const ModuleReport &candidate : std::as_const(byHandset[result.handset].modules)) {
+                if (candidate.name.compare(result.name, Qt::CaseInsensitive) == 0
+                    && (candidate.source.isEmpty() || candidate.source == result.source)) {
+                    row = candidate;
+                    break;
+                }
+            }
+        } else {
+            for (const QSharedPointer<_TestModule> &module : std::as_const(modules)) {
+                if (module->moduleName == result.name && module->Source() == result.source) {
+                    row.family = module->family;
+                    row.subFamily = module->subFamily;
+                    for (const TestCase &testCase : std::as_const(module->testCases))
+                        row.testCases.append({testCase.name, QStringLiteral("unexecuted")});
+                    break;
+                }
+            }
+        }
+        row.handset = result.handset;
+        report.modules.append(row);
+    }
+    const int status = Publish(report, parser, true);
+
+    QString text;
+    for (const ShardedRun::HandsetResult &handset : run.Handsets()) {
+        if (!handset.lost)
+            continue;
+        text += handset.connected
+                    ? QStringLiteral("Handset %1 dropped out at %2, after %3 modules; its work went to the other handsets.\n")
+                          .arg(handset.handset, handset.lostAt.toString(Qt::ISODateWithMs))
+                          .arg(handset.modulesRun)
+                    : QStringLiteral("Handset %1 could not be connected (%2).\n")
+                          .arg(handset.handset, handset.lostAt.toString(Qt::ISODateWithMs));
+    }
+    const QStringList notRun = run.NotRun();
+    if (!notRun.isEmpty())
+        text += QStringLiteral("Every handset dropped out. Modules that never ran (run again with --retry): %1\n")
+                    .arg(notRun.join(QStringLiteral(", ")));
+    for (const QString &name : names)
+        text += QStringLiteral("Processed results of %1: %2\n").arg(name, resultsPaths.value(name));
+    text += QStringLiteral("Library log: %1\n").arg(options.libraryLog);
+    Out(text);
+    if (status != ExitSuccess)
+        return status;
+    bool notExecuted = !allRan;
+    for (const ModuleReport &row : std::as_const(report.modules))
+        notExecuted = notExecuted || !row.Executed();
+    return notExecuted || report.Total(QStringLiteral("fail")) > 0 ? ExitTestFailed : ExitSuccess;
 }
 
 int RunCommand(const QStringList &arguments)
@@ -200,9 +378,10 @@ int RunCommand(const QStringList &arguments)
     const QCommandLineOption noDelete(QStringLiteral("no-delete"), QStringLiteral("Leave the modules installed on the handset."));
     const QCommandLineOption copyDelay(QStringLiteral("copy-delay"), QStringLiteral("Pause before copying each log."), QStringLiteral("MS"));
     const QCommandLineOption logDir(QStringLiteral("log-dir"), QStringLiteral("Folder for the copied logs (default: the handset's log folder)."), QStringLiteral("DIR"));
-    const QCommandLineOption retry(QStringLiteral("retry"), QStringLiteral("Run only the modules that the handset's processed results show with a test case not passed."));
+    const QCommandLineOption retry(QStringLiteral("retry"), QStringLiteral("Run only the modules that the handset's processed results show with a test case not passed (with several handsets: not passed on any of them)."));
+    const QCommandLineOption allTargets(QStringLiteral("all-targets"), QStringLiteral("Share the modules among every handset 'harness targets' lists."));
     parser.addOptions({target, testData, dpk, kFamily, kSubFamily, kFeatures, testCases, runOption, noDelete,
-                       copyDelay, logDir, kJUnit, kJson, retry});
+                       copyDelay, logDir, kJUnit, kJson, retry, allTargets});
     parser.addPositionalArgument(QStringLiteral("PATTERN"), QStringLiteral("Module name patterns ('*' at either end)."), QStringLiteral("[PATTERN...]"));
     int status = ExitSuccess;
     if (!ParseArguments(parser, arguments, status))
@@ -216,22 +395,40 @@ int RunCommand(const QStringList &arguments)
         }
     }
 
+    // Configures a Harness for one handset; logFolder empty keeps the
+    // handset's own log folder.
+    const auto configure = [&](Harness &harness, Log &log, const QString &name, const QString &logFolder) {
+        setup.Apply(parser, harness, log);
+        harness.SetTarget(name);
+        if (!logFolder.isEmpty()) {
+            QDir().mkpath(logFolder);
+            harness.SetLogOutputPath(QFileInfo(logFolder).absoluteFilePath());
+        }
+        if (parser.isSet(testData))
+            harness.SetTestData(parser.value(testData));
+        if (parser.isSet(dpk))
+            harness.SetDPK(parser.value(dpk));
+        harness.SetRunOption(parser.value(runOption));
+        harness.SetNoDelete(parser.isSet(noDelete));
+        if (parser.isSet(copyDelay))
+            harness.SetCopyDelay(parser.value(copyDelay));
+    };
+
+    if (parser.isSet(allTargets) || parser.values(target).size() > 1) {
+        ShardedOptions options;
+        options.arguments = arguments;
+        options.targets = parser.values(target);
+        options.allTargets = parser.isSet(allTargets);
+        options.logDir = parser.value(logDir);
+        options.retry = parser.isSet(retry);
+        options.testCases = parser.value(testCases).split(QLatin1Char(','), Qt::SkipEmptyParts);
+        options.libraryLog = parser.isSet(setup.log) ? parser.value(setup.log) : DefaultLibraryLog();
+        return RunSharded(parser, options, configure);
+    }
+
     Harness harness;
     Log log;
-    setup.Apply(parser, harness, log);
-    harness.SetTarget(parser.value(target));
-    if (parser.isSet(logDir)) {
-        QDir().mkpath(parser.value(logDir));
-        harness.SetLogOutputPath(QFileInfo(parser.value(logDir)).absoluteFilePath());
-    }
-    if (parser.isSet(testData))
-        harness.SetTestData(parser.value(testData));
-    if (parser.isSet(dpk))
-        harness.SetDPK(parser.value(dpk));
-    harness.SetRunOption(parser.value(runOption));
-    harness.SetNoDelete(parser.isSet(noDelete));
-    if (parser.isSet(copyDelay))
-        harness.SetCopyDelay(parser.value(copyDelay));
+    configure(harness, log, parser.value(target), parser.value(logDir));
 
     QList<QSharedPointer<_TestModule>> modules = Select(harness, parser);
     if (!harness.ConnectToTarget(parser.value(target))) {
@@ -242,10 +439,7 @@ int RunCommand(const QStringList &arguments)
     const QString handsetLogs = harness.GetDefaultLogFilePath();
     const QString resultsPath = handsetLogs + QStringLiteral("/ProcessedResults/ProcessedResults.xml");
     if (parser.isSet(retry)) {
-        const QSet<QString> notPassed = NotPassedModules(resultsPath);
-        modules.erase(std::remove_if(modules.begin(), modules.end(),
-                                     [&](const QSharedPointer<_TestModule> &m) { return !notPassed.contains(m->moduleName.toLower()); }),
-                      modules.end());
+        KeepNotPassed(modules, {resultsPath});
         if (modules.isEmpty()) {
             Out(QStringLiteral("Every selected module has passed on this handset: nothing to retry.\n"));
             return ExitSuccess;
@@ -265,8 +459,7 @@ int RunCommand(const QStringList &arguments)
     status = Publish(report, parser);
     Out(QStringLiteral("Logs: %1\nProcessed results: %2\nLibrary log: %3\n")
             .arg(parser.isSet(logDir) ? QFileInfo(parser.value(logDir)).absoluteFilePath() : handsetLogs, resultsPath,
-                 parser.isSet(setup.log) ? parser.value(setup.log)
-                                         : QFileInfo(TestDirectories::GetTestDataPath()).absolutePath() + QStringLiteral("/harness.log")));
+                 parser.isSet(setup.log) ? parser.value(setup.log) : DefaultLibraryLog()));
     harness.DisconnectTarget();
     if (status != ExitSuccess)
         return status;

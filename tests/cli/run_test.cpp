@@ -143,4 +143,81 @@ TEST_F(DemoRun, SetupFailuresAreUsageErrors)
     EXPECT_TRUE(QFile::exists(dir.filePath(QStringLiteral("catalogue.xml"))));
 }
 
+// Handsets beside the demo's own, with its settings.
+void AddDemoHandsets(const QProcessEnvironment &env, const QStringList &names)
+{
+    const QString handsets = env.value(QStringLiteral("KESTIX_HANDSETS"));
+    const QByteArray ini = testutil::ReadFile(handsets + QStringLiteral("/demo-phone/handset.ini"));
+    for (const QString &name : names) {
+        ASSERT_TRUE(QDir().mkpath(handsets + QLatin1Char('/') + name + QStringLiteral("/fs")));
+        testutil::WriteFile(handsets + QLatin1Char('/') + name + QStringLiteral("/handset.ini"), ini);
+    }
+}
+
+// Module name -> handset of its row in a summary with a handset column.
+QMap<QString, QString> HandsetRows(const QByteArray &out, QMap<QString, QString> *counts)
+{
+    QMap<QString, QString> rows;
+    static const QRegularExpression row(QStringLiteral("^(\\w+)\\s+([\\w-]*)\\s+(\\d+)\\s+(\\d+)\\s+(\\d+)\\s+(\\d+)$"));
+    for (const QString &text : QString::fromUtf8(out).split(QLatin1Char('\n'))) {
+        const QRegularExpressionMatch m = row.match(text);
+        if (!m.hasMatch())
+            continue;
+        rows.insert(m.captured(1), m.captured(2));
+        counts->insert(m.captured(1), QStringList{m.captured(3), m.captured(4), m.captured(5), m.captured(6)}.join(QLatin1Char(' ')));
+    }
+    return rows;
+}
+
+TEST_F(DemoRun, AllTargetsShareTheModulesAndNameTheHandsetOfEach)
+{
+    AddDemoHandsets(env, {QStringLiteral("demo-phone2"), QStringLiteral("demo-phone3")});
+    // A handset that cannot be reached leaves the work to the others.
+    testutil::WriteFile(env.value(QStringLiteral("KESTIX_HANDSETS")) + QStringLiteral("/demo-phone3/offline"), "");
+    const QString json = dir.filePath(QStringLiteral("summary.json"));
+    const ToolResult r = Tool({QStringLiteral("run"), QStringLiteral("--all-targets"), QStringLiteral("--test-data"),
+                               root + QStringLiteral("/testdata/demo.ksx"), QStringLiteral("--json"), json});
+    EXPECT_EQ(r.status, 1) << r.err.constData() << r.out.constData();
+    QMap<QString, QString> counts;
+    const QMap<QString, QString> handsets = HandsetRows(r.out, &counts);
+    // The same verdicts as a run on one handset.
+    EXPECT_EQ(counts.value(QStringLiteral("ITimer")), QStringLiteral("3 1 1 0")) << r.out.constData();
+    EXPECT_EQ(counts.value(QStringLiteral("IClock")), QStringLiteral("3 0 0 0"));
+    EXPECT_EQ(counts.value(QStringLiteral("Widgets")), QStringLiteral("2 1 0 0"));
+    EXPECT_EQ(counts.value(QStringLiteral("Sockets")), QStringLiteral("2 1 1 0"));
+    EXPECT_EQ(counts.value(QStringLiteral("PlatformVersion")), QStringLiteral("2 0 0 0"));
+    for (auto it = handsets.cbegin(); it != handsets.cend(); ++it) {
+        EXPECT_TRUE(it.value() == QLatin1String("demo-phone") || it.value() == QLatin1String("demo-phone2"))
+            << it.key().toStdString() << " " << it.value().toStdString();
+    }
+    EXPECT_TRUE(r.out.contains("Handset demo-phone3 could not be connected")) << r.out.constData();
+    EXPECT_TRUE(testutil::ReadFile(json).contains("\"handset\"")) << testutil::ReadFile(json).constData();
+}
+
+TEST_F(DemoRun, WhenEveryHandsetIsGoneRetryRunsWhatNeverRan)
+{
+    AddDemoHandsets(env, {QStringLiteral("demo-phone2")});
+    const QString handsets = env.value(QStringLiteral("KESTIX_HANDSETS"));
+    for (const char *name : {"/demo-phone/offline", "/demo-phone2/offline"})
+        testutil::WriteFile(handsets + QLatin1String(name), "");
+    const ToolResult gone = Tool({QStringLiteral("run"), QStringLiteral("--target"), QStringLiteral("demo-phone"),
+                                  QStringLiteral("--target"), QStringLiteral("demo-phone2")});
+    EXPECT_EQ(gone.status, 1);
+    EXPECT_TRUE(gone.out.contains("Modules that never ran (run again with --retry): ")) << gone.out.constData();
+
+    QFile::remove(handsets + QStringLiteral("/demo-phone/offline"));
+    QFile::remove(handsets + QStringLiteral("/demo-phone2/offline"));
+    const ToolResult retry = Tool({QStringLiteral("run"), QStringLiteral("--retry"), QStringLiteral("--target"),
+                                   QStringLiteral("demo-phone"), QStringLiteral("--target"), QStringLiteral("phone2")});
+    QMap<QString, QString> counts;
+    HandsetRows(retry.out, &counts);
+    EXPECT_EQ(counts.value(QStringLiteral("IClock")), QStringLiteral("3 0 0 0")) << retry.out.constData();
+    EXPECT_EQ(counts.size(), 6);
+
+    const ToolResult unknown = Tool({QStringLiteral("run"), QStringLiteral("--target"), QStringLiteral("demo-phone"),
+                                     QStringLiteral("--target"), QStringLiteral("no-such-phone")});
+    EXPECT_EQ(unknown.status, 2);
+    EXPECT_TRUE(unknown.err.contains("no handset matching 'no-such-phone'")) << unknown.err.constData();
+}
+
 } // namespace
