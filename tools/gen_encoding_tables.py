@@ -117,7 +117,7 @@ def emit(tables, out):
 
 def main():
     output = Path(sys.argv[1]) if len(sys.argv) > 1 else DEFAULT_OUTPUT
-    tables = {name: build(*spec) for name, *spec in TABLES}
+    tables = {name: build(*source) for name, *source in TABLES}
     checks(tables)
     with open(output, "w", encoding="ascii", newline="\n") as out:
         emit(tables, out)

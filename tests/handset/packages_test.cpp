@@ -44,11 +44,11 @@ protected:
         fixture.AddHandset(QStringLiteral("phone"));
         device = fixture.Connect(QStringLiteral("phone"));
         ASSERT_TRUE(device);
-        spec.directory = QStringLiteral("ctfmod");
-        spec.classIds = {kClass, 0x01020305};
-        spec.appletIds = {kApplet};
-        spec.programs = {{QStringLiteral("ctfmod_k"), QStringLiteral("-v")}};
-        spec.files = {{QStringLiteral("data/table.txt"), "rows"}};
+        layout.directory = QStringLiteral("ctfmod");
+        layout.classIds = {kClass, 0x01020305};
+        layout.appletIds = {kApplet};
+        layout.programs = {{QStringLiteral("ctfmod_k"), QStringLiteral("-v")}};
+        layout.files = {{QStringLiteral("data/table.txt"), "rows"}};
     }
 
     QString Host(const char *handsetPath) const
@@ -59,12 +59,12 @@ protected:
 
     HandsetFixture fixture;
     HandsetFixture::Device device;
-    ModuleSpec spec;
+    ModuleSpec layout;
 };
 
 TEST_F(PackageTest, InstalledModuleIsFoundByClassAndAppletAndByItsClassDirectory)
 {
-    const QString package = fixture.MakePackage(QStringLiteral("ctfmod.kestix"), spec);
+    const QString package = fixture.MakePackage(QStringLiteral("ctfmod.kestix"), layout);
     ASSERT_EQ(device->InstallPackage(package), 0u);
     EXPECT_EQ(testutil::ReadFile(Host("fs:/usermods/ctfmod/data/table.txt")), QByteArray("rows"));
 
@@ -96,7 +96,7 @@ TEST_F(PackageTest, PackageMadeByTheTarProgramInstalls)
     if (!testutil::HaveProgram(QStringLiteral("tar")))
         GTEST_SKIP() << "tar is not installed";
     const QString source = fixture.WorkFolder() + QStringLiteral("/src");
-    for (const auto &member : testutil::ModuleMembers(spec))
+    for (const auto &member : testutil::ModuleMembers(layout))
         testutil::WriteFile(source + QLatin1Char('/') + member.first, member.second);
     const QString package = fixture.WorkFolder() + QStringLiteral("/gnu.kestix");
     ASSERT_EQ(testutil::RunProgram(QStringLiteral("tar"), {QStringLiteral("-cf"), package, QStringLiteral("-C"),
@@ -110,18 +110,18 @@ TEST_F(PackageTest, PackageMadeByTheTarProgramInstalls)
 
 TEST_F(PackageTest, ModuleInformationDirectlyInUsermodsNamesNoModule)
 {
-    spec.directory.clear();
-    spec.mifName = QStringLiteral("loose.mif");
-    ASSERT_EQ(device->InstallPackage(fixture.MakePackage(QStringLiteral("loose.kestix"), spec)), 0u);
+    layout.directory.clear();
+    layout.mifName = QStringLiteral("loose.mif");
+    ASSERT_EQ(device->InstallPackage(fixture.MakePackage(QStringLiteral("loose.kestix"), layout)), 0u);
     QString directory;
     EXPECT_EQ(device->FindModule(kClass, directory), HANDSET_ERROR_NOT_FOUND);
 }
 
 TEST_F(PackageTest, FirstModuleByPathWinsWhenTwoListTheSameClass)
 {
-    ModuleSpec other = spec;
+    ModuleSpec other = layout;
     other.directory = QStringLiteral("aaa");
-    ASSERT_EQ(device->InstallPackage(fixture.MakePackage(QStringLiteral("b.kestix"), spec)), 0u);
+    ASSERT_EQ(device->InstallPackage(fixture.MakePackage(QStringLiteral("b.kestix"), layout)), 0u);
     ASSERT_EQ(device->InstallPackage(fixture.MakePackage(QStringLiteral("a.kestix"), other)), 0u);
     QString directory;
     EXPECT_EQ(device->FindModule(kClass, directory), 0u);
@@ -171,7 +171,7 @@ TEST_F(PackageTest, MemberLeadingThroughALinkOutOfTheHandsetRefusesThePackage)
     QDir().mkpath(outside);
     QDir().mkpath(Host("fs:/usermods"));
     ASSERT_TRUE(QFile::link(outside, Host("fs:/usermods/ctfmod")));
-    EXPECT_EQ(device->InstallPackage(fixture.MakePackage(QStringLiteral("p.kestix"), spec)), HANDSET_ERROR_BAD_PACKAGE);
+    EXPECT_EQ(device->InstallPackage(fixture.MakePackage(QStringLiteral("p.kestix"), layout)), HANDSET_ERROR_BAD_PACKAGE);
     EXPECT_TRUE(QDir(outside).isEmpty());
     EXPECT_EQ(Tree(Fs()), (QStringList{QStringLiteral("usermods"), QStringLiteral("usermods/ctfmod")}));
 }
@@ -212,9 +212,9 @@ protected:
     {
         PackageTest::SetUp();
         // Logs what it was asked and where it ran.
-        spec.behaviour = "echo \"$1 $2 [$3] [$4] $(pwd) $HANDSET_FS\" > \"$HANDSET_MODULE_DIR/run.log\"\n"
+        layout.behaviour = "echo \"$1 $2 [$3] [$4] $(pwd) $HANDSET_FS\" > \"$HANDSET_MODULE_DIR/run.log\"\n"
                          "echo '[/VERBOSE]' >> \"$HANDSET_MODULE_DIR/run.log\"\n";
-        ASSERT_EQ(device->InstallPackage(fixture.MakePackage(QStringLiteral("ctfmod.kestix"), spec)), 0u);
+        ASSERT_EQ(device->InstallPackage(fixture.MakePackage(QStringLiteral("ctfmod.kestix"), layout)), 0u);
     }
 
     QByteArray RunLog()

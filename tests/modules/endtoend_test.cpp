@@ -107,16 +107,16 @@ const QString kStamp = QStringLiteral("-\\d{4}-\\d\\d-\\d\\d-\\d\\d-\\d\\d-\\d\\
 
 TEST_F(EndToEnd, CtfModuleRunsItsProgramAndLeavesNothingBehind)
 {
-    testutil::ModuleSpec spec;
-    spec.directory = QStringLiteral("ITimer");
-    spec.programs = {{QStringLiteral("Helper"), QString(), 0x0102FAF7},
+    testutil::ModuleSpec layout;
+    layout.directory = QStringLiteral("ITimer");
+    layout.programs = {{QStringLiteral("Helper"), QString(), 0x0102FAF7},
                      {QStringLiteral("ITimer_k_main"), QStringLiteral("-suite all"), 0x0102FAF7}};
-    spec.behaviour = "log=usermods/CTF/CTF.log\n"
+    layout.behaviour = "log=usermods/CTF/CTF.log\n"
                      "[ -f \"$log\" ] || exit 3\n"
                      "{ echo \"Suite: ITimer\"; echo \"Args: $3 $4\"; echo \"Time: 2026/12/03 14:05:09\";\n"
                      "  echo \"Test: t1\"; echo \"Result: PASS\"; echo \"Result: Fail\"; echo \"Test: t2\";\n"
                      "  echo \"[/VERBOSE]\"; } >> \"$log\"\n";
-    const QString package = fixture.MakePackage(QStringLiteral("ITimer_Win32_Release.kestix"), spec);
+    const QString package = fixture.MakePackage(QStringLiteral("ITimer_Win32_Release.kestix"), layout);
 
     CtfTestModule module;
     module.moduleName = QStringLiteral("ITimer");
@@ -160,14 +160,14 @@ TEST_F(EndToEnd, CtfModuleRunsItsProgramAndLeavesNothingBehind)
 
 TEST_F(EndToEnd, CtfAppletModuleRunsByClassId)
 {
-    testutil::ModuleSpec spec;
-    spec.directory = QStringLiteral("suite");
-    spec.appletIds = {0x10001000};
-    spec.behaviour = "[ \"$1 $2\" = \"applet 0x10001000\" ] || exit 4\n"
+    testutil::ModuleSpec layout;
+    layout.directory = QStringLiteral("suite");
+    layout.appletIds = {0x10001000};
+    layout.behaviour = "[ \"$1 $2\" = \"applet 0x10001000\" ] || exit 4\n"
                      "{ echo \"Suite: Suite_k\"; echo \"Test: t1 with words\"; echo \"Result: Pass\";\n"
                      "  echo \"[/VERBOSE]\"; } > usermods/suite/suite_k.log\n"
                      "echo notes > usermods/suite/notes.txt\n";
-    const QString package = fixture.MakePackage(QStringLiteral("Suite_Win32_Release.kestix"), spec);
+    const QString package = fixture.MakePackage(QStringLiteral("Suite_Win32_Release.kestix"), layout);
 
     CtfAppletTestModule module;
     module.moduleName = QStringLiteral("Suite");
@@ -205,12 +205,12 @@ TEST_F(EndToEnd, OatModuleRunsInTheFrameworkAndIsPostProcessed)
     framework.variants.insert(QStringLiteral("oat"),
                               Target(fixture.MakePackage(QStringLiteral("oat_Win32_Release.kestix"), frameworkSpec)));
 
-    testutil::ModuleSpec spec;
-    spec.directory = QStringLiteral("oattimer");
-    spec.classIds = {0x10002000};
-    spec.suitePrograms = {QStringLiteral("Kesto:Timer:OatSuite1")};
+    testutil::ModuleSpec layout;
+    layout.directory = QStringLiteral("oattimer");
+    layout.classIds = {0x10002000};
+    layout.suitePrograms = {QStringLiteral("Kesto:Timer:OatSuite1")};
     QDir().mkpath(fixture.WorkFolder() + QStringLiteral("/package"));
-    const QString package = fixture.MakePackage(QStringLiteral("package/OatTimer_Win32_Release.kestix"), spec);
+    const QString package = fixture.MakePackage(QStringLiteral("package/OatTimer_Win32_Release.kestix"), layout);
 
     OatTestModule module;
     module.moduleName = QStringLiteral("OatTimer");
@@ -276,16 +276,16 @@ TEST_F(EndToEnd, OatModuleRunsInTheFrameworkAndIsPostProcessed)
 
 TEST_F(EndToEnd, UtModuleReadsItsConfigurationAndWritesBothLogs)
 {
-    testutil::ModuleSpec spec;
-    spec.directory = QStringLiteral("uttimer");
-    spec.appletIds = {0x20002000};
-    spec.behaviour = "allow=$(sed -n 's/^Allow=//p' mod/ututtimer/utconfig.dat)\n"
+    testutil::ModuleSpec layout;
+    layout.directory = QStringLiteral("uttimer");
+    layout.appletIds = {0x20002000};
+    layout.behaviour = "allow=$(sed -n 's/^Allow=//p' mod/ututtimer/utconfig.dat)\n"
                      "mkdir -p usermods/uttimer/log\n"
                      "{ echo \"Unit test run\"; echo \"SuiteName: UTTimer 14:05:09 03-Dec-2026\";\n"
                      "  echo \"------------\"; for t in $(echo $allow | tr , ' '); do echo \"$t PASSED 12 ms\"; done;\n"
                      "  echo \"t9 Failed\"; echo \"------------\"; echo \"Elapsed Time: 1s\"; } > usermods/uttimer/log/run.txt\n"
                      "echo '<TestRunLog cases=\"'$allow'\"></TestRunLog>' > usermods/uttimer/log/run.xml\n";
-    const QString package = fixture.MakePackage(QStringLiteral("UTTimer_Win32_Release.kestix"), spec);
+    const QString package = fixture.MakePackage(QStringLiteral("UTTimer_Win32_Release.kestix"), layout);
     const QString source = fixture.WorkFolder() + QStringLiteral("/src");
     testutil::WriteFile(source + QStringLiteral("/utconfig.dat"), "[Defaults]\nLevel=2");
 
@@ -340,14 +340,14 @@ TEST_F(EndToEnd, SecondaryModulesAreInstalledAndRemovedWithTheirUser)
     EXPECT_TRUE(OnHandset(QStringLiteral("fs:/usermods/helper/data.bin")));
     EXPECT_FALSE(helper.Run(device.get(), env));
 
-    testutil::ModuleSpec spec;
-    spec.directory = QStringLiteral("user");
-    spec.appletIds = {0x30003000};
+    testutil::ModuleSpec layout;
+    layout.directory = QStringLiteral("user");
+    layout.appletIds = {0x30003000};
     CtfAppletTestModule user;
     user.moduleName = QStringLiteral("user");
     user.applets << AppletWithId(0x30003000);
     user.secondaryModules << QStringLiteral("helper");
-    user.targets.insert(QStringLiteral("t"), Target(fixture.MakePackage(QStringLiteral("user_Win32_Release.kestix"), spec)));
+    user.targets.insert(QStringLiteral("t"), Target(fixture.MakePackage(QStringLiteral("user_Win32_Release.kestix"), layout)));
     ASSERT_TRUE(user.InstallTest(device.get()));
     EXPECT_EQ(user.deviceDirectory, QStringLiteral("fs:/usermods/user/"));
     EXPECT_TRUE(user.RemoveTest(device.get()));
@@ -362,12 +362,12 @@ TEST_F(EndToEnd, PackagesAreFoundUnderEveryNameTheKitUses)
     testutil::ModuleSpec other;
     other.directory = QStringLiteral("other");
     other.programs = {{QStringLiteral("Other_k"), QString(), 0x0102FAF7}};
-    testutil::ModuleSpec spec;
-    spec.directory = QStringLiteral("ITimer");
-    spec.mifName = QStringLiteral("itimer.MIF");
-    spec.programs = {{QStringLiteral("ITimer_k"), QStringLiteral("-a"), 0x0102FAF7},
+    testutil::ModuleSpec layout;
+    layout.directory = QStringLiteral("ITimer");
+    layout.mifName = QStringLiteral("itimer.MIF");
+    layout.programs = {{QStringLiteral("ITimer_k"), QStringLiteral("-a"), 0x0102FAF7},
                      {QStringLiteral("NotAProgram"), QString(), 0x0102C305}};
-    testutil::Members members = testutil::ModuleMembers(other) + testutil::ModuleMembers(spec);
+    testutil::Members members = testutil::ModuleMembers(other) + testutil::ModuleMembers(layout);
     const QString folder = fixture.WorkFolder() + QStringLiteral("/package");
     QDir().mkpath(folder);
     fixture.MakePackage(QStringLiteral("package/ctfITimerRVCT22arm9_Release.kestix"), members);

@@ -12,29 +12,29 @@
 
 namespace testutil {
 
-QByteArray BuildMif(const ModuleSpec &spec)
+QByteArray BuildMif(const ModuleSpec &layout)
 {
     MifBuilder mif;
-    for (unsigned int id : spec.classIds)
+    for (unsigned int id : layout.classIds)
         mif.AddClass(id);
-    for (unsigned int id : spec.appletIds)
+    for (unsigned int id : layout.appletIds)
         mif.AddApplet(id);
-    for (const MifProgram &program : spec.programs)
+    for (const MifProgram &program : layout.programs)
         mif.AddProgram(program.name, program.arguments, program.type);
-    for (const QString &key : spec.suitePrograms)
+    for (const QString &key : layout.suitePrograms)
         mif.AddSuiteProgram(key);
     return mif.Build();
 }
 
-Members ModuleMembers(const ModuleSpec &spec)
+Members ModuleMembers(const ModuleSpec &layout)
 {
-    const QString prefix = spec.directory.isEmpty() ? QString() : spec.directory + QLatin1Char('/');
-    const QString mifName = spec.mifName.isEmpty() ? spec.directory + QStringLiteral(".mif") : spec.mifName;
+    const QString prefix = layout.directory.isEmpty() ? QString() : layout.directory + QLatin1Char('/');
+    const QString mifName = layout.mifName.isEmpty() ? layout.directory + QStringLiteral(".mif") : layout.mifName;
     Members members;
-    members.append({prefix + mifName, BuildMif(spec)});
-    if (!spec.behaviour.isEmpty())
-        members.append({prefix + QStringLiteral("behaviour"), spec.behaviour});
-    for (const auto &file : spec.files)
+    members.append({prefix + mifName, BuildMif(layout)});
+    if (!layout.behaviour.isEmpty())
+        members.append({prefix + QStringLiteral("behaviour"), layout.behaviour});
+    for (const auto &file : layout.files)
         members.append({prefix + file.first, file.second});
     return members;
 }
@@ -96,9 +96,9 @@ QString HandsetFixture::HostPath(const QString &name, const QString &handsetPath
     return HandsetPath::ToHost(HandsetFolder(name), handsetPath);
 }
 
-QString HandsetFixture::MakePackage(const QString &fileName, const ModuleSpec &spec) const
+QString HandsetFixture::MakePackage(const QString &fileName, const ModuleSpec &layout) const
 {
-    return MakePackage(fileName, ModuleMembers(spec));
+    return MakePackage(fileName, ModuleMembers(layout));
 }
 
 QString HandsetFixture::MakePackage(const QString &fileName, const Members &members) const

@@ -44,13 +44,13 @@ struct ModuleSpec
 
 using Members = QList<QPair<QString, QByteArray>>;
 
-// The bytes of a module information file listing the spec's class IDs,
+// The bytes of a module information file listing the layout's class IDs,
 // applets and program records (with a 40-byte header block).
-QByteArray BuildMif(const ModuleSpec &spec);
+QByteArray BuildMif(const ModuleSpec &layout);
 
 // The members of the module's package: the .mif, the behaviour (when given)
-// and the further files, all below spec.directory.
-Members ModuleMembers(const ModuleSpec &spec);
+// and the further files, all below layout.directory.
+Members ModuleMembers(const ModuleSpec &layout);
 
 // Writes a tar package of the members (names as given, written by the
 // library's own Tar); false when it cannot be written.
@@ -61,7 +61,7 @@ bool WritePackage(const QString &path, const Members &members);
 //
 //   testutil::HandsetFixture fixture;
 //   fixture.AddHandset("phone", "Test phone", "arm", "1.2");
-//   QString package = fixture.MakePackage("ctf.kestix", spec);
+//   QString package = fixture.MakePackage("ctf.kestix", layout);
 //   auto device = fixture.Connect("phone");
 //   device->InstallPackage(package);
 class HandsetFixture
@@ -87,7 +87,7 @@ public:
 
     // Writes the module's package into the work folder; returns its path
     // (empty, with a test failure, when it cannot be written).
-    QString MakePackage(const QString &fileName, const ModuleSpec &spec) const;
+    QString MakePackage(const QString &fileName, const ModuleSpec &layout) const;
     QString MakePackage(const QString &fileName, const Members &members) const;
 
     struct Disconnect

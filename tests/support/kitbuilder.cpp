@@ -132,10 +132,10 @@ QString KitBuilder::AddPackage(const QString &folder, const QString &baseName,
 
 QString KitBuilder::AddModulePackages(const QString &folder, const Module &module)
 {
-    testutil::ModuleSpec spec = module.package;
-    if (spec.directory.isEmpty())
-        spec.directory = module.name;
-    const testutil::Members members = testutil::ModuleMembers(spec);
+    testutil::ModuleSpec layout = module.package;
+    if (layout.directory.isEmpty())
+        layout.directory = module.name;
+    const testutil::Members members = testutil::ModuleMembers(layout);
     for (const QString &variant : module.variants) {
         if (AddPackage(folder, module.name + QLatin1Char('_') + variant, members).isEmpty())
             return QString();
@@ -165,11 +165,11 @@ QString KitBuilder::AddPrebuiltModule(const QString &folder, const Module &modul
 
 QString KitBuilder::AddFrameworkPackage(const QString &testframeworks, const QString &name,
                                         const QString &toolChain, const QString &build,
-                                        const testutil::ModuleSpec *spec)
+                                        const testutil::ModuleSpec *layout)
 {
     testutil::ModuleSpec records;
-    if (spec) {
-        records = *spec;
+    if (layout) {
+        records = *layout;
     } else {
         records.directory = name;
         if (const unsigned int classId = KnownFrameworkClassId(name))

@@ -96,11 +96,11 @@ public:
     QString AddPrebuiltModule(const QString &folder, const Module &module);
 
     // A framework package <testframeworks>/run/<name>_<toolChain>_<build>.kestix
-    // holding spec (by default "<name>/<name>.mif" listing the framework's
+    // holding layout (by default "<name>/<name>.mif" listing the framework's
     // own class ID for the known names "ctf", "ctfapplet", "uitf" and "oat").
     QString AddFrameworkPackage(const QString &testframeworks, const QString &name,
                                 const QString &toolChain, const QString &build,
-                                const testutil::ModuleSpec *spec = nullptr);
+                                const testutil::ModuleSpec *layout = nullptr);
 
 private:
     QString Fail(const QString &message);
