@@ -148,7 +148,7 @@ void KitSizes(benchmark::internal::Benchmark *benchmark)
     benchmark->Arg(500);
     benchmark->Arg(2000);
     benchmark->Arg(8000);
-    benchutil::SetMinTime(benchmark, 1.0);
+    benchutil::SetMinTime(benchmark, 0.5);
 }
 
 BENCHMARK(BM_ReadKitFiles)->Apply(KitSizes);

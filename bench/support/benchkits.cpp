@@ -92,6 +92,9 @@ QString TestCaseName(int index)
 
 QString Kit(int modules, QString *error)
 {
+    QString ignored;
+    if (!error)
+        error = &ignored;
     const QString root = benchutil::WorkFolder() + QStringLiteral("/kit-%1").arg(modules);
     if (Complete(root))
         return root;
@@ -138,6 +141,9 @@ QString Kit(int modules, QString *error)
 
 QString Logs(int modules, QString *error)
 {
+    QString ignored;
+    if (!error)
+        error = &ignored;
     const QString root = benchutil::WorkFolder() + QStringLiteral("/logs-%1").arg(modules);
     if (Complete(root))
         return root;

@@ -25,7 +25,7 @@ QString TestCaseName(int index);
 
 // The root of a kit of `modules` modules (plus one package folder without a
 // description, a secondary package, for every 25 modules, and the four
-// frameworks). Empty on failure, with the reason in *error.
+// frameworks). Empty on failure, with the reason in *error (when given).
 QString Kit(int modules, QString *error);
 
 // A folder of `modules` saved logs, in each kind's format and under the name

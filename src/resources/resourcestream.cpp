@@ -149,7 +149,11 @@ bool ResourceStream::Decompress()
             const int index = entry.offsetIndex + k;
             if (index >= _resources.size())
                 return false;
-            if (!ids.contains(id))
+            // Files list IDs in ascending order: appending at the end takes
+            // no search.
+            if (ids.isEmpty() || ids.lastKey() < id)
+                ids.insert(ids.constEnd(), id, _resources.at(index));
+            else if (!ids.contains(id))
                 ids.insert(id, _resources.at(index));
         }
     }
@@ -163,37 +167,45 @@ bool ResourceStream::ProcessStructures()
     _offsetTable.clear();
     _resources.clear();
 
-    QVector<ResourceEntry> entries;
-    if (GetResources(entries) == 0 || entries.size() > kMaxEntries)
+    qsizetype pairs = 0;
+    for (const QMap<quint16, QByteArray> &ids : std::as_const(m_table))
+        pairs += ids.size();
+    if (pairs == 0 || pairs > kMaxEntries)
         return false;
+    _fileMap.reserve(pairs);
+    _resources.reserve(pairs);
+    _offsetTable.reserve(pairs + 1);
 
-    // The first equal block already collected is shared; the hash finds it
-    // without scanning every block.
+    // The pairs in type, then ID order. The first equal block already
+    // collected is shared; the hash finds it without scanning every block.
     QHash<QByteArray, int> firstIndex;
-    firstIndex.reserve(entries.size());
+    firstIndex.reserve(pairs);
     quint64 end = 0;
-    for (const ResourceEntry &entry : std::as_const(entries)) {
-        int index = firstIndex.value(entry.data, -1);
-        if (index < 0) {
-            index = int(_resources.size());
-            _resources.append(entry.data);
-            firstIndex.insert(entry.data, index);
-            if (_offsetTable.isEmpty())
-                _offsetTable.append(0);
-            end += quint64(entry.data.size());
-            if (end > 0xFFFFFFFFu)
-                return false;
-            _offsetTable.append(quint32(end));
+    for (auto type = m_table.constBegin(); type != m_table.constEnd(); ++type) {
+        for (auto id = type->constBegin(); id != type->constEnd(); ++id) {
+            const QByteArray &data = id.value();
+            int index = firstIndex.value(data, -1);
+            if (index < 0) {
+                index = int(_resources.size());
+                _resources.append(data);
+                firstIndex.insert(data, index);
+                if (_offsetTable.isEmpty())
+                    _offsetTable.append(0);
+                end += quint64(data.size());
+                if (end > 0xFFFFFFFFu)
+                    return false;
+                _offsetTable.append(quint32(end));
+            }
+            FileMapEntry mapEntry;
+            mapEntry.type = type.key();
+            mapEntry.beginningResId = id.key();
+            mapEntry.additionalResId = 0;
+            mapEntry.offsetIndex = quint16(index);
+            _fileMap.append(mapEntry);
         }
-        FileMapEntry mapEntry;
-        mapEntry.type = entry.type;
-        mapEntry.beginningResId = entry.id;
-        mapEntry.additionalResId = 0;
-        mapEntry.offsetIndex = quint16(index);
-        _fileMap.append(mapEntry);
     }
 
-    const quint32 count = quint32(entries.size());
+    const quint32 count = quint32(pairs);
     const quint64 offsetToResources = kHeaderSize + quint64(kMapEntrySize) * count
                                       + quint64(kOffsetSize) * (count + 1);
     if (offsetToResources + end > 0xFFFFFFFFu)
