@@ -27,24 +27,33 @@ inline QByteArray Bytes(const uint8_t *data, size_t size)
     return QByteArray(reinterpret_cast<const char *>(data), qsizetype(size));
 }
 
-// A folder for the files of one target, kept for the whole run; in memory
-// (/dev/shm) where there is one, since the library syncs the files it
-// writes atomically and a disk would make every execution wait for that.
-inline const QTemporaryDir &Scratch()
+// The folder for the files of one target, kept for the whole run: the
+// folder FUZZ_SCRATCH names (kept afterwards, to look at what a target
+// wrote, or to make seeds from it), else a temporary one in memory
+// (/dev/shm) where there is one, since the library syncs the files it writes
+// atomically and a disk would make every execution wait for that.
+inline QString Scratch()
 {
-    static const QTemporaryDir folder = [] {
+    static const QString path = [] {
+        const QString chosen = qEnvironmentVariable("FUZZ_SCRATCH");
+        if (!chosen.isEmpty()) {
+            if (!QDir().mkpath(chosen))
+                abort();
+            return QDir(chosen).absolutePath();
+        }
         const QString shm = QStringLiteral("/dev/shm");
         const QString base = QFileInfo(shm).isDir() && QFileInfo(shm).isWritable() ? shm : QDir::tempPath();
-        return QTemporaryDir(base + QStringLiteral("/harness-fuzz-XXXXXX"));
+        static QTemporaryDir folder(base + QStringLiteral("/harness-fuzz-XXXXXX"));
+        if (!folder.isValid())
+            abort();
+        return folder.path();
     }();
-    if (!folder.isValid())
-        abort();
-    return folder;
+    return path;
 }
 
 inline QString ScratchPath(const QString &name)
 {
-    return Scratch().filePath(name);
+    return Scratch() + QLatin1Char('/') + name;
 }
 
 // Writes bytes to path; a failure is the harness's own and ends the run.

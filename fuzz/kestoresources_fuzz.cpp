@@ -15,6 +15,20 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size)
     resources.Dump();
     MifEntry entry;
     resources.GetMifEntry(entry);
+    MifHeader header;
+    resources.GetMifHeader(header);
+    QVector<unsigned int> classes;
+    resources.GetMifClasses(classes);
+    resources.GetMifExternalClasses(classes);
+    QVector<Applet> applets;
+    resources.GetMifApplets(applets);
+    QVector<Notifier> notifications;
+    resources.GetMifNotifications(notifications);
+    QVector<MimeType> mimeTypes;
+    resources.GetMifMimeTypes(mimeTypes);
+    resources.GetCompanyName();
+    resources.GetCopyright();
+    resources.GetApplicationVersion();
     QVector<quint16> types;
     resources.GetResourceTypes(types);
     for (quint16 type : types) {
@@ -27,6 +41,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size)
             QString mimeType;
             QByteArray bytes;
             resources.GetMimeObject(type, id, mimeType, bytes);
+            resources.GetBinary(type, id, bytes);
             if (type == KestoResources::kTypeSysResource) {
                 SysResource record;
                 resources.GetSysResource(id, record);

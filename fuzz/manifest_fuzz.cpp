@@ -1,29 +1,64 @@
-// Reads arbitrary bytes as a kit's cached catalogue, then writes what was read.
+// Reads arbitrary bytes as a cached catalogue ("Manifest.xml") and runs the
+// catalogue queries on what loads. What loads must write a catalogue that
+// reads back and writes the same bytes again.
+#include "catalogue/framework.h"
 #include "catalogue/manifest.h"
+#include "catalogue/testmodule.h"
 
-#include <QFile>
-#include <QTemporaryDir>
+#include "fuzzutil.h"
 
-#include <cstddef>
-#include <cstdint>
-#include <cstdlib>
+namespace {
+
+using fuzzutil::Check;
+
+void Query(Manifest &catalogue)
+{
+    QList<QSharedPointer<_TestModule>> modules;
+    catalogue.GetTestModules(modules, QStringList(), QString(), QString());
+    catalogue.GetTestModules(modules, QStringList{QStringLiteral("*a*"), QStringLiteral("b*")}, QString(),
+                             QString());
+    catalogue.GetTestModules(modules, QStringList(), QStringLiteral("m"), QStringLiteral("s"));
+    for (const QSharedPointer<_TestModule> &module : std::as_const(catalogue.testModules)) {
+        Check(catalogue.FindTestModule(module->moduleName) != nullptr);
+        module->TestType();
+        module->ModuleName();
+        module->IDHash();
+        for (IKestoDevice::Platform platform : {IKestoDevice::PLATFORM_ARM, IKestoDevice::PLATFORM_WIN32})
+            module->GetCompilerVariant(platform, true);
+    }
+    QList<QSharedPointer<_Framework>> frameworks;
+    catalogue.GetFrameworks(frameworks);
+    for (const QSharedPointer<_Framework> &framework : std::as_const(frameworks)) {
+        for (IKestoDevice::Platform platform : {IKestoDevice::PLATFORM_ARM, IKestoDevice::PLATFORM_WIN32})
+            framework->GetVariant(platform);
+    }
+}
+
+} // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size)
 {
-    static QTemporaryDir folder;
-    if (!folder.isValid() || !qputenv("KESTIX_DATA_ROOT", folder.filePath(QStringLiteral("data")).toLocal8Bit()))
-        abort();
-    static Manifest manifest(folder.filePath(QStringLiteral("kit")), false);
+    const QString kit = fuzzutil::ScratchPath(QStringLiteral("kit"));
+    Manifest catalogue(kit, false);
+    catalogue.cacheFile = fuzzutil::ScratchPath(QStringLiteral("Manifest.xml"));
+    fuzzutil::WriteBytes(catalogue.cacheFile, fuzzutil::Bytes(data, size));
+    catalogue.IsVersionOkay();
+    if (!catalogue.ReadManifest())
+        return 0;
+    Query(catalogue);
+    if (catalogue.testModules.isEmpty())
+        return 0;
 
-    QFile cache(manifest.ManifestFilePath());
-    if (!cache.open(QIODevice::WriteOnly | QIODevice::Truncate)
-        || cache.write(reinterpret_cast<const char *>(data), qint64(size)) != qint64(size))
-        abort();
-    cache.close();
-
-    manifest.frameworks.clear();
-    manifest.IsVersionOkay();
-    if (manifest.ReadManifest())
-        manifest.WriteManifest(folder.filePath(QStringLiteral("written.xml")));
+    const QString first = fuzzutil::ScratchPath(QStringLiteral("first.xml"));
+    const QString second = fuzzutil::ScratchPath(QStringLiteral("second.xml"));
+    Check(catalogue.WriteManifest(first));
+    Manifest back(kit, false);
+    back.cacheFile = first;
+    Check(back.IsVersionOkay());
+    Check(back.ReadManifest());
+    Check(back.testModules.size() == catalogue.testModules.size());
+    Check(back.frameworks.size() == catalogue.frameworks.size());
+    Check(back.WriteManifest(second));
+    Check(fuzzutil::ReadBytes(first) == fuzzutil::ReadBytes(second));
     return 0;
 }
