@@ -214,6 +214,9 @@ private:
     bool RunModules(ModuleSource &source);
     // The log wait of the run loop; false when the handset was lost.
     bool WaitForLog(QSharedPointer<_TestModule> module);
+    // True, with the run loop's message, when the handset has gone away: a
+    // run that loses it at any step ends there with false.
+    bool ConnectionDied();
     // Writes one generated catalogue to outputPath (or its home-folder
     // fall-back, or its cache when outputPath is empty); true when written.
     bool WriteGeneratedManifest(Manifest &manifest, const QString &setting,

@@ -42,10 +42,8 @@ bool Harness::WaitForLog(QSharedPointer<_TestModule> module)
 {
     const Clock::Timer timer;
     for (;;) {
-        if (m_device->connectionLost) {
-            LogMessage(kConnectionDied, true);
+        if (ConnectionDied())
             return false;
-        }
         if (timer.Elapsed() > kLogWaitLimitMs || module->IsLogComplete(m_device))
             return true;
         Clock::Sleep(m_device->platform == IKestoDevice::PLATFORM_WIN32 ? kFastPollMs : kPollMs);
@@ -192,7 +190,7 @@ bool Harness::RunModules(ModuleSource &source)
             // A handset that went away fails every module after this one.
             if (m_device->connectionLost) {
                 source.Finished(module, ModuleSource::Interrupted);
-                LogMessage(kConnectionDied, true);
+                ConnectionDied();
                 return false;
             }
             source.Finished(module, ModuleSource::StartFailed);
@@ -215,6 +213,8 @@ bool Harness::RunModules(ModuleSource &source)
             // are not the module's fault: it has to run again elsewhere.
             source.Finished(module, m_device->connectionLost ? ModuleSource::Interrupted
                                                              : ModuleSource::NoLogs);
+            if (ConnectionDied())
+                return false;
             continue;
         }
         if (!m_noDelete) {
@@ -222,13 +222,27 @@ bool Harness::RunModules(ModuleSource &source)
             LogMessage(QStringLiteral("   Removing test %1\n").arg(name), true);
         }
         module->PostProcess(m_environment);
+        // The copied logs are recorded even when the handset went away while
+        // the module was being removed.
         UpdateProcessedModulesXML(module);
         source.Finished(module, ModuleSource::Recorded);
+        if (ConnectionDied())
+            return false;
     }
 
     for (const RunFramework &entry : frameworks)
         unload(entry);
+    if (ConnectionDied())
+        return false;
     return result;
+}
+
+bool Harness::ConnectionDied()
+{
+    if (!m_device || !m_device->connectionLost)
+        return false;
+    LogMessage(kConnectionDied, true);
+    return true;
 }
 
 bool Harness::Run(QSharedPointer<_TestModule> module)
