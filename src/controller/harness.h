@@ -202,6 +202,9 @@ private:
     // Reads (or generates) the catalogues that the settings call for; true
     // when one of them is usable.
     bool SetupManifest();
+    // Manifest::GenerateManifest; a scan whose cache cannot be written still
+    // counts when it found modules. Failures are logged under path.
+    bool GenerateCatalogue(Manifest &catalogue, bool force, const QString &path);
     // SetupEnvironment and then SetupManifest.
     bool Setup();
 

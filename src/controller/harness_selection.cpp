@@ -50,6 +50,22 @@ bool Harness::Setup()
     return SetupEnvironment() && SetupManifest();
 }
 
+bool Harness::GenerateCatalogue(Manifest &catalogue, bool force, const QString &path)
+{
+    if (catalogue.GenerateManifest(force))
+        return true;
+    // A scan that found modules serves this run even when its cache cannot
+    // be written (a full disk, a cache folder that is not one).
+    if (!catalogue.testModules.isEmpty()) {
+        LogMessage(QStringLiteral("Manifest %1 could not be cached; the catalogue just scanned is used.")
+                       .arg(path),
+                   true);
+        return true;
+    }
+    LogMessage(kNotGenerated.arg(path), true);
+    return false;
+}
+
 bool Harness::SetupManifest()
 {
     bool kitReady = true;
@@ -65,11 +81,9 @@ bool Harness::SetupManifest()
             if (!current)
                 LogMessage(QStringLiteral("Manifest out of date for ") + kit, true);
             LogMessage(kGenerating + kit, true);
-            kitReady = m_kitManifest->GenerateManifest(true);
-            if (!kitReady) {
-                LogMessage(kNotGenerated.arg(kit), true);
+            kitReady = GenerateCatalogue(*m_kitManifest, true, kit);
+            if (!kitReady)
                 m_kitManifest.reset();
-            }
         }
     }
 
@@ -82,11 +96,9 @@ bool Harness::SetupManifest()
     bool platformReady = m_platformManifest->ReadManifest();
     if (!platformReady) {
         LogMessage(kGenerating + platform, true);
-        platformReady = m_platformManifest->GenerateManifest(false);
-        if (!platformReady) {
-            LogMessage(kNotGenerated.arg(platform), true);
+        platformReady = GenerateCatalogue(*m_platformManifest, false, platform);
+        if (!platformReady)
             m_platformManifest.reset();
-        }
     }
 
     if (!m_environment.contains(EnvironmentKey::DevicePack)) {
