@@ -67,6 +67,10 @@ EmulatedHandset::EmulatedHandset(const ConnectTarget &target, const QString &fol
     const QString kind = settings.value(QStringLiteral("platform")).toString();
     platform = kind.trimmed().isEmpty() ? PLATFORM_WIN32 : StringToTarget(kind);
     m_version = settings.value(QStringLiteral("version")).toString();
+    bool ok = false;
+    const qint64 offlineAfter = settings.value(QStringLiteral("offlineAfter")).toString().toLongLong(&ok);
+    if (ok && offlineAfter >= 0)
+        m_offlineAfter = offlineAfter;
 }
 
 EmulatedHandset::~EmulatedHandset() = default;
@@ -80,6 +84,14 @@ bool EmulatedHandset::IsReachable()
 {
     if (connectionLost)
         return false;
+    // The first check is the one made on connecting.
+    if (m_offlineAfter >= 0 && m_checks++ > m_offlineAfter) {
+        QFile offline(m_folder + QStringLiteral("/offline"));
+        if (offline.open(QIODevice::WriteOnly))
+            offline.close();
+        connectionLost = true;
+        return false;
+    }
     if (!QFileInfo(m_folder).isDir()
         || QFileInfo::exists(m_folder + QStringLiteral("/offline")))
         connectionLost = true;

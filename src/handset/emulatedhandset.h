@@ -27,7 +27,8 @@ enum EmulatedHandsetError : unsigned int {
 
 // A handset emulated in a host folder (one subfolder of the handsets folder,
 // see ConnectFactory):
-//   <handset>/handset.ini   description, platform and version
+//   <handset>/handset.ini   description, platform and version; optionally
+//                           "offlineAfter" (see IsReachable)
 //   <handset>/fs/...        the handset's file system, "fs:/..." paths
 //   <handset>/offline       when present the handset is unreachable
 //   <handset>/behaviour.log output of the last behaviour script
@@ -69,7 +70,11 @@ public:
 
     const QString &Folder() const { return m_folder; }
     // True while the folder exists and holds no "offline" file; sets
-    // connectionLost (for good) otherwise.
+    // connectionLost (for good) otherwise. Every operation and the check made
+    // on connecting call it. With handset.ini key "offlineAfter" = N the
+    // handset answers N operations after the connection check and then drops
+    // out as if unplugged: it writes its "offline" file and fails from the
+    // next operation on (a fault to rehearse a handset lost at any step).
     bool IsReachable();
     // Real time a behaviour script may run before it is killed.
     void SetBehaviourTimeout(int milliseconds) { m_behaviourTimeoutMs = milliseconds; }
@@ -136,4 +141,7 @@ private:
     QString m_folder;
     QString m_version;
     int m_behaviourTimeoutMs = kDefaultBehaviourTimeoutMs;
+    // "offlineAfter"; negative when the handset never drops out by itself.
+    qint64 m_offlineAfter = -1;
+    qint64 m_checks = 0;
 };
