@@ -1,6 +1,6 @@
 // Reads arbitrary bytes as a cached catalogue ("Manifest.xml") and runs the
 // catalogue queries on what loads. What loads must write a catalogue that
-// reads back and writes the same bytes again.
+// reads back whole and settles after one write.
 #include "catalogue/framework.h"
 #include "catalogue/manifest.h"
 #include "catalogue/testmodule.h"
@@ -49,16 +49,24 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size)
     if (catalogue.testModules.isEmpty())
         return 0;
 
-    const QString first = fuzzutil::ScratchPath(QStringLiteral("first.xml"));
-    const QString second = fuzzutil::ScratchPath(QStringLiteral("second.xml"));
-    Check(catalogue.WriteManifest(first));
-    Manifest back(kit, false);
-    back.cacheFile = first;
-    Check(back.IsVersionOkay());
-    Check(back.ReadManifest());
-    Check(back.testModules.size() == catalogue.testModules.size());
-    Check(back.frameworks.size() == catalogue.frameworks.size());
-    Check(back.WriteManifest(second));
-    Check(fuzzutil::ReadBytes(first) == fuzzutil::ReadBytes(second));
+    // Written and read back, a catalogue keeps its modules and frameworks;
+    // from the second write on the bytes no longer change. (The first write
+    // may drop what carries no meaning, such as properties without values,
+    // which leave an empty list behind.)
+    Manifest *current = &catalogue;
+    Manifest copies[] = {Manifest(kit, false), Manifest(kit, false), Manifest(kit, false)};
+    QByteArray written[3];
+    for (int i = 0; i < 3; ++i) {
+        const QString path = fuzzutil::ScratchPath(QStringLiteral("written%1.xml").arg(i));
+        Check(current->WriteManifest(path));
+        written[i] = fuzzutil::ReadBytes(path);
+        copies[i].cacheFile = path;
+        Check(copies[i].IsVersionOkay());
+        Check(copies[i].ReadManifest());
+        Check(copies[i].testModules.size() == catalogue.testModules.size());
+        Check(copies[i].frameworks.size() == catalogue.frameworks.size());
+        current = &copies[i];
+    }
+    Check(written[1] == written[2]);
     return 0;
 }

@@ -1,0 +1,53 @@
+// Files found by the fuzz targets (fuzz/) that once made a reader or a
+// writer misbehave, kept under tests/data/<format>/ and replayed here the way
+// the target used them.
+
+#include "catalogue/manifest.h"
+#include "catalogue/testmodule.h"
+#include "modules/ctftestmodule.h"
+#include "support/testutil.h"
+
+#include <QTemporaryDir>
+
+#include <gtest/gtest.h>
+
+namespace {
+
+using testutil::DataPath;
+using testutil::ReadFile;
+
+// A cached catalogue written and read back keeps every module, and from the
+// second write on its bytes no longer change, so a catalogue never drifts from
+// run to run. Properties without values are written as an empty list once
+// and then no more.
+TEST(HostileManifest, ProgramWhosePropertiesHaveNoValuesSettlesAfterOneWrite)
+{
+    QTemporaryDir dir;
+    const QString kit = dir.filePath(QStringLiteral("kit"));
+    Manifest catalogue(kit, false);
+    catalogue.cacheFile = DataPath(QStringLiteral("manifest/program-properties-without-values.xml"));
+    ASSERT_TRUE(catalogue.ReadManifest());
+    ASSERT_EQ(catalogue.testModules.size(), 1);
+
+    QByteArray written[3];
+    Manifest *current = &catalogue;
+    Manifest copies[] = {Manifest(kit, false), Manifest(kit, false), Manifest(kit, false)};
+    for (int i = 0; i < 3; ++i) {
+        const QString path = dir.filePath(QStringLiteral("written%1.xml").arg(i));
+        ASSERT_TRUE(current->WriteManifest(path));
+        written[i] = ReadFile(path);
+        copies[i].cacheFile = path;
+        ASSERT_TRUE(copies[i].ReadManifest());
+        current = &copies[i];
+    }
+    EXPECT_TRUE(written[0].contains("<properties/>"));
+    EXPECT_EQ(written[1], written[2]);
+
+    auto *timer = dynamic_cast<CtfTestModule *>(copies[2].FindTestModule(QStringLiteral("timer")).data());
+    ASSERT_NE(timer, nullptr);
+    ASSERT_EQ(timer->programs.size(), 1);
+    EXPECT_EQ(timer->programs.first().type, 16972535u);
+    EXPECT_EQ(timer->programs.first().keysize, 8);
+}
+
+} // namespace
