@@ -117,7 +117,13 @@ QString EmulatedHandset::ToHost(const QString &handsetPath, unsigned int &error)
         error = HANDSET_ERROR_BAD_PATH;
         return QString();
     }
-    static const QRegularExpression alias(QStringLiteral("^fs:/~0x([0-9a-fA-F]{8})(?:/(.*))?$"));
+    // Compiled once, inside the guarded initialisation: handsets run from
+    // several threads at once then only read it.
+    static const QRegularExpression alias = [] {
+        QRegularExpression expression(QStringLiteral("^fs:/~0x([0-9a-fA-F]{8})(?:/(.*))?$"));
+        expression.optimize();
+        return expression;
+    }();
     const QRegularExpressionMatch match = alias.match(path);
     if (match.hasMatch()) {
         Module module;

@@ -1,15 +1,17 @@
 #include "log/log.h"
 
 #include <QDir>
-#include <QRecursiveMutex>
 
 #include <iostream>
+#include <mutex>
 
 namespace {
 
-QRecursiveMutex &LogMutex()
+// A standard mutex rather than QRecursiveMutex: its locking is visible to
+// ThreadSanitizer, which checks the runs on several handsets.
+std::recursive_mutex &LogMutex()
 {
-    static QRecursiveMutex mutex;
+    static std::recursive_mutex mutex;
     return mutex;
 }
 
@@ -19,7 +21,7 @@ bool g_firstOpen = true;
 void Echo(bool newLine, unsigned int indent, char mark)
 {
     // Handsets run from several threads share the console.
-    QMutexLocker locker(&LogMutex());
+    const std::lock_guard<std::recursive_mutex> locker(LogMutex());
     if (newLine)
         std::cout << std::endl << std::string(indent, ' ');
     std::cout << mark;
@@ -31,7 +33,7 @@ Log::Log() = default;
 
 Log::~Log()
 {
-    QMutexLocker locker(&LogMutex());
+    const std::lock_guard<std::recursive_mutex> locker(LogMutex());
     CloseLog();
 }
 
@@ -42,7 +44,7 @@ void Log::SetVerbose(bool verbose)
 
 void Log::SetLogPath(const QString &path)
 {
-    QMutexLocker locker(&LogMutex());
+    const std::lock_guard<std::recursive_mutex> locker(LogMutex());
     CloseLog();
     if (path.isEmpty())
         m_file.setFileName(QDir::currentPath() + QDir::separator() + QLatin1String("log.txt"));
@@ -52,7 +54,7 @@ void Log::SetLogPath(const QString &path)
 
 void Log::LogMessage(const QString &message, bool echo)
 {
-    QMutexLocker locker(&LogMutex());
+    const std::lock_guard<std::recursive_mutex> locker(LogMutex());
     OpenLog();
     if (m_file.isOpen()) {
         m_file.write(message.toLatin1());

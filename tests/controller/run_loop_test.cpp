@@ -5,9 +5,11 @@
 
 #include "catalogue/framework.h"
 #include "common/clock.h"
+#include "controller/modulesource.h"
 #include "support/handsetfixture.h"
 
 #include <QDir>
+#include <QRegularExpression>
 
 namespace {
 
@@ -400,6 +402,70 @@ TEST_F(RunLoopTest, LogFilePathsComeFromTheModuleOnceConnected)
     EXPECT_FALSE(m_harness.Unload(m_ctf));
     EXPECT_FALSE(m_harness.Load(m_ctf));
     EXPECT_TRUE(m_log.Text().contains(QStringLiteral("Load Error: A device is not available.\n")));
+}
+
+// Hands out modules in the order given and records how each ended.
+class RecordingSource : public ModuleSource
+{
+public:
+    RecordingSource(const QList<QSharedPointer<_TestModule>> &modules, bool keep)
+        : m_modules(modules), m_keep(keep)
+    {
+    }
+    QSharedPointer<_TestModule> Next() override
+    {
+        return m_modules.isEmpty() ? QSharedPointer<_TestModule>() : m_modules.takeFirst();
+    }
+    void Finished(const QSharedPointer<_TestModule> &module, Outcome outcome) override
+    {
+        outcomes.append(module->moduleName + QLatin1Char(' ') + QString::number(int(outcome)));
+    }
+    bool KeepFrameworks() const override { return m_keep; }
+
+    QStringList outcomes;
+
+private:
+    QList<QSharedPointer<_TestModule>> m_modules;
+    bool m_keep;
+};
+
+TEST_F(RunLoopTest, SourceRunKeepsFrameworksUntilTheEndWhenAsked)
+{
+    const QList<QSharedPointer<_TestModule>> modules{Queue(QStringLiteral("A"), QStringLiteral("ctf")),
+                                                     Queue(QStringLiteral("B"), QStringLiteral("oat")),
+                                                     Queue(QStringLiteral("C"), QStringLiteral("ctf")),
+                                                     Queue(QStringLiteral("D"), QStringLiteral("uitf"))};
+    RecordingSource keeping(modules, true);
+    EXPECT_TRUE(m_harness.Run(keeping));
+    EXPECT_EQ(m_events.filter(QRegularExpression(QStringLiteral("^(load|unload|run) "))),
+              (QStringList{"load ctf", "run A", "load oat", "run B", "run C", "unload ctf", "unload oat"}));
+    EXPECT_EQ(keeping.outcomes,
+              (QStringList{QStringLiteral("A %1").arg(ModuleSource::Recorded),
+                           QStringLiteral("B %1").arg(ModuleSource::Recorded),
+                           QStringLiteral("C %1").arg(ModuleSource::Recorded),
+                           QStringLiteral("D %1").arg(ModuleSource::NoFramework)}));
+
+    // Without keeping, a framework goes as soon as another test type comes.
+    m_events.clear();
+    RecordingSource switching(modules.mid(0, 3), false);
+    EXPECT_TRUE(m_harness.Run(switching));
+    EXPECT_EQ(m_events.filter(QRegularExpression(QStringLiteral("^(load|unload|run) "))),
+              (QStringList{"load ctf", "run A", "unload ctf", "load oat", "run B", "unload oat", "load ctf",
+                           "run C", "unload ctf"}));
+}
+
+TEST_F(RunLoopTest, SourceIsToldWhichModuleTheLostHandsetInterrupted)
+{
+    QSharedPointer<RecordingModule> first = Queue(QStringLiteral("A"), QStringLiteral("ctf"));
+    first->pollsNeeded = 5;
+    first->onPoll = [this](IKestoDevice *device) {
+        testutil::WriteFile(m_handsets.HandsetFolder(QStringLiteral("phone")) + QStringLiteral("/offline"),
+                            QByteArray());
+        device->FileExists(QStringLiteral("fs:/anything"));
+    };
+    RecordingSource source({first, Queue(QStringLiteral("B"), QStringLiteral("ctf"))}, true);
+    EXPECT_FALSE(m_harness.Run(source));
+    EXPECT_EQ(source.outcomes, QStringList{QStringLiteral("A %1").arg(ModuleSource::Interrupted)});
 }
 
 } // namespace
