@@ -5,6 +5,7 @@
 #include <QDir>
 #include <QDomDocument>
 #include <QFile>
+#include <QSet>
 #include <QRegularExpression>
 #include <QTemporaryDir>
 
@@ -192,6 +193,25 @@ TEST_F(DemoRun, AllTargetsShareTheModulesAndNameTheHandsetOfEach)
     }
     EXPECT_TRUE(r.out.contains("Handset demo-phone3 could not be connected")) << r.out.constData();
     EXPECT_TRUE(testutil::ReadFile(json).contains("\"handset\"")) << testutil::ReadFile(json).constData();
+}
+
+TEST_F(DemoRun, AHandsetLostMidRunIsNamedAndItsModuleRunsElsewhere)
+{
+    AddDemoHandsets(env, {QStringLiteral("demo-phone2")});
+    // demo-phone2 drops out at its first operation after connecting, with a
+    // module in hand.
+    const QString ini = env.value(QStringLiteral("KESTIX_HANDSETS")) + QStringLiteral("/demo-phone2/handset.ini");
+    testutil::WriteFile(ini, testutil::ReadFile(ini) + "offlineAfter=1\n");
+    const ToolResult r = Tool({QStringLiteral("run"), QStringLiteral("--all-targets"), QStringLiteral("--test-data"),
+                               root + QStringLiteral("/testdata/demo.ksx")});
+    EXPECT_EQ(r.status, 1) << r.err.constData() << r.out.constData();
+    QMap<QString, QString> counts;
+    const QMap<QString, QString> handsets = HandsetRows(r.out, &counts);
+    EXPECT_EQ(counts.size(), 6) << r.out.constData();
+    EXPECT_EQ(counts.value(QStringLiteral("ITimer")), QStringLiteral("3 1 1 0"));
+    EXPECT_EQ(counts.value(QStringLiteral("OatAudio")), QStringLiteral("2 1 1 0"));
+    EXPECT_EQ(QSet<QString>(handsets.cbegin(), handsets.cend()), QSet<QString>{QStringLiteral("demo-phone")});
+    EXPECT_TRUE(r.out.contains("Handset demo-phone2 dropped out at ")) << r.out.constData();
 }
 
 TEST_F(DemoRun, WhenEveryHandsetIsGoneRetryRunsWhatNeverRan)
