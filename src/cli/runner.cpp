@@ -295,8 +295,6 @@ int RunSharded(const QCommandLineParser &parser, const ShardedOptions &options,
         run.AddHandset(harness.get());
     run.SetTestCases(options.testCases);
     const bool allRan = run.Run(modules);
-    for (const std::unique_ptr<Harness> &harness : harnesses)
-        harness->DisconnectTarget();
 
     // One row per module, from the results file of the handset that ran it;
     // modules that never ran keep their test cases unexecuted.

@@ -163,6 +163,9 @@ private:
         m_harness.Run(*this);
         m_result.handset = Name();
         m_result.connected = !m_harness.ConnectedTarget().isEmpty();
+        // The thread that opened the connection closes it: no handset object
+        // outlives its worker or passes to another thread.
+        m_harness.DisconnectTarget();
         // A module still in hand when the loop gave up goes back for the others.
         if (m_current >= 0)
             Finished(nullptr, Interrupted);

@@ -65,8 +65,9 @@ public:
     ShardedRun &operator=(const ShardedRun &) = delete;
 
     // A configured Harness with its target set; not owned. During Run it is
-    // used by its worker thread only. Each needs a log folder of its own
-    // (the handset's default one, or its own SetLogOutputPath).
+    // used by its worker thread only, which connects it and, when its share
+    // of the run is over, disconnects it again. Each needs a log folder of
+    // its own (the handset's default one, or its own SetLogOutputPath).
     void AddHandset(Harness *harness);
     // Test cases for the first module in run order, wherever it runs.
     void SetTestCases(const QStringList &testCases);

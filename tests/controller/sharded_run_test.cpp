@@ -159,6 +159,9 @@ TEST_F(ShardedRunTest, FourHandsetsShareTheQueueAndMatchAOneHandsetRun)
     }
     EXPECT_EQ(total, selection.size());
     EXPECT_TRUE(run.NotRun().isEmpty());
+    // Every worker closed the connection it opened.
+    for (const std::unique_ptr<Harness> &harness : m_harnesses)
+        EXPECT_TRUE(harness->ConnectedTarget().isEmpty());
 }
 
 TEST_F(ShardedRunTest, AHandsetGoingOfflineHandsItsModuleToTheOthers)
