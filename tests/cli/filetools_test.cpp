@@ -84,8 +84,9 @@ TEST_F(InspectTool, TarListAndCatReadAnArchiveMadeByGnuTar)
         const QList<QByteArray> fields = line.split('\t');
         ASSERT_EQ(fields.size(), 3);
         names << QString::fromUtf8(fields.at(2));
-        if (fields.at(2) == "mod/a.txt")
+        if (fields.at(2) == "mod/a.txt") {
             EXPECT_EQ(fields.at(1), "6");
+        }
     }
     names.sort();
     EXPECT_EQ(names, (QStringList{QStringLiteral("mod/"), QStringLiteral("mod/a.txt"), QStringLiteral("mod/empty")}));
