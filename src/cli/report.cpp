@@ -1,6 +1,11 @@
 #include "cli/report.h"
 
+#include "cli/commands.h"
+
 #include "common/xmlwriter.h"
+
+#include <algorithm>
+#include <utility>
 
 #include <QDomDocument>
 #include <QFile>
@@ -190,4 +195,43 @@ bool RunReport::WriteJson(const QString &path, QString *error) const
                              {QStringLiteral("unexecuted"), Total(kUnexecuted)}};
     const QJsonObject root{{QStringLiteral("modules"), list}, {QStringLiteral("totals"), totals}};
     return XmlWriter::WriteFile(path, QJsonDocument(root).toJson(QJsonDocument::Indented), true, error);
+}
+
+void RunReport::DropNotExecuted()
+{
+    modules.erase(std::remove_if(modules.begin(), modules.end(),
+                                 [](const ModuleReport &m) { return !m.Executed(); }),
+                  modules.end());
+}
+
+const QCommandLineOption &JUnitOption()
+{
+    static const QCommandLineOption option(QStringLiteral("junit"), QStringLiteral("Write a JUnit XML report to FILE."),
+                                           QStringLiteral("FILE"));
+    return option;
+}
+
+const QCommandLineOption &JsonOption()
+{
+    static const QCommandLineOption option(QStringLiteral("json"), QStringLiteral("Write a JSON summary to FILE."),
+                                           QStringLiteral("FILE"));
+    return option;
+}
+
+int PublishReport(const RunReport &report, const QCommandLineParser &parser, bool withHandset)
+{
+    Out(QStringLiteral("\n") + report.Summary(withHandset));
+    QString error;
+    for (const auto &[option, json] : {std::pair{&JUnitOption(), false}, std::pair{&JsonOption(), true}}) {
+        if (!parser.isSet(*option))
+            continue;
+        const QString path = parser.value(*option);
+        const bool ok = json ? report.WriteJson(path, &error) : report.WriteJUnit(path, &error);
+        if (!ok) {
+            Err(QStringLiteral("harness: cannot write %1: %2\n").arg(path, error));
+            return ExitUsage;
+        }
+        Out(QStringLiteral("%1: %2\n").arg(json ? QStringLiteral("JSON summary") : QStringLiteral("JUnit report"), path));
+    }
+    return ExitSuccess;
 }

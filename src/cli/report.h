@@ -1,5 +1,7 @@
 #pragma once
 
+#include <QCommandLineOption>
+#include <QCommandLineParser>
 #include <QList>
 #include <QString>
 
@@ -38,4 +40,16 @@ struct RunReport
     bool WriteJson(const QString &path, QString *error) const;
 
     int Total(const QString &result) const;
+
+    // Drops the modules without any executed test case.
+    void DropNotExecuted();
 };
+
+// The --junit FILE and --json FILE options of the commands that report.
+const QCommandLineOption &JUnitOption();
+const QCommandLineOption &JsonOption();
+
+// Prints the summary and writes the exports the parser's options ask for.
+// ExitUsage (with the reason on standard error) when an export cannot be
+// written, else ExitSuccess.
+int PublishReport(const RunReport &report, const QCommandLineParser &parser, bool withHandset);

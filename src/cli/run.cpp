@@ -9,34 +9,6 @@
 
 namespace {
 
-const QCommandLineOption kJUnitOption(QStringLiteral("junit"), QStringLiteral("Write a JUnit XML report to FILE."),
-                                      QStringLiteral("FILE"));
-const QCommandLineOption kJsonOption(QStringLiteral("json"), QStringLiteral("Write a JSON summary to FILE."),
-                                     QStringLiteral("FILE"));
-
-// Prints the summary and writes the exports the options ask for. Returns
-// the exit status: 1 when a test case failed.
-int Publish(const RunReport &report, const QCommandLineParser &parser, bool withHandset)
-{
-    Out(report.Summary(withHandset));
-    QString error;
-    if (parser.isSet(kJUnitOption)) {
-        if (!report.WriteJUnit(parser.value(kJUnitOption), &error)) {
-            Err(QStringLiteral("harness: cannot write %1: %2\n").arg(parser.value(kJUnitOption), error));
-            return ExitUsage;
-        }
-        Out(QStringLiteral("JUnit report: %1\n").arg(parser.value(kJUnitOption)));
-    }
-    if (parser.isSet(kJsonOption)) {
-        if (!report.WriteJson(parser.value(kJsonOption), &error)) {
-            Err(QStringLiteral("harness: cannot write %1: %2\n").arg(parser.value(kJsonOption), error));
-            return ExitUsage;
-        }
-        Out(QStringLiteral("JSON summary: %1\n").arg(parser.value(kJsonOption)));
-    }
-    return report.Total(QStringLiteral("fail")) > 0 ? ExitTestFailed : ExitSuccess;
-}
-
 int ReportCommand(const QStringList &arguments)
 {
     QCommandLineParser parser;
@@ -46,7 +18,7 @@ int ReportCommand(const QStringList &arguments)
         "Exit status 1 when a test case failed."));
     parser.addPositionalArgument(QStringLiteral("RESULTS.xml"), QStringLiteral("The processed-results file."));
     const QCommandLineOption all(QStringLiteral("all"), QStringLiteral("Include modules that never ran."));
-    parser.addOptions({kJUnitOption, kJsonOption, all});
+    parser.addOptions({JUnitOption(), JsonOption(), all});
     int status = ExitSuccess;
     if (!ParseArguments(parser, arguments, status, 1, 1))
         return status;
@@ -57,12 +29,12 @@ int ReportCommand(const QStringList &arguments)
         Err(QStringLiteral("harness report: %1\n").arg(error));
         return ExitUsage;
     }
-    if (!parser.isSet(all)) {
-        report.modules.erase(std::remove_if(report.modules.begin(), report.modules.end(),
-                                            [](const ModuleReport &m) { return !m.Executed(); }),
-                             report.modules.end());
-    }
-    return Publish(report, parser, false);
+    if (!parser.isSet(all))
+        report.DropNotExecuted();
+    const int published = PublishReport(report, parser, false);
+    if (published != ExitSuccess)
+        return published;
+    return report.Total(QStringLiteral("fail")) > 0 ? ExitTestFailed : ExitSuccess;
 }
 
 int ListCommand(const QStringList &arguments, const QString &description,

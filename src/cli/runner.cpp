@@ -62,8 +62,6 @@ private:
 const QCommandLineOption kFamily(QStringLiteral("family"), QStringLiteral("Select modules whose family contains F."), QStringLiteral("F"));
 const QCommandLineOption kSubFamily(QStringLiteral("subfamily"), QStringLiteral("With --family: and whose sub-family contains S."), QStringLiteral("S"));
 const QCommandLineOption kFeatures(QStringLiteral("features"), QStringLiteral("Select the modules named by a feature list file."), QStringLiteral("FILE"));
-const QCommandLineOption kJUnit(QStringLiteral("junit"), QStringLiteral("Write a JUnit XML report to FILE."), QStringLiteral("FILE"));
-const QCommandLineOption kJson(QStringLiteral("json"), QStringLiteral("Write a JSON summary to FILE."), QStringLiteral("FILE"));
 
 QList<QSharedPointer<_TestModule>> Select(Harness &harness, const QCommandLineParser &parser)
 {
@@ -190,24 +188,6 @@ RunReport ReportOf(const QString &resultsPath, const QList<QSharedPointer<_TestM
     return report;
 }
 
-int Publish(const RunReport &report, const QCommandLineParser &parser, bool withHandset = false)
-{
-    Out(QStringLiteral("\n") + report.Summary(withHandset));
-    QString error;
-    for (const auto &[option, json] : {std::pair{&kJUnit, false}, std::pair{&kJson, true}}) {
-        if (!parser.isSet(*option))
-            continue;
-        const QString path = parser.value(*option);
-        const bool ok = json ? report.WriteJson(path, &error) : report.WriteJUnit(path, &error);
-        if (!ok) {
-            Err(QStringLiteral("harness: cannot write %1: %2\n").arg(path, error));
-            return ExitUsage;
-        }
-        Out(QStringLiteral("%1: %2\n").arg(json ? QStringLiteral("JSON summary") : QStringLiteral("JUnit report"), path));
-    }
-    return ExitSuccess;
-}
-
 QString DefaultLibraryLog()
 {
     return QFileInfo(TestDirectories::GetTestDataPath()).absolutePath() + QStringLiteral("/harness.log");
@@ -330,7 +310,7 @@ int RunSharded(const QCommandLineParser &parser, const ShardedOptions &options,
         row.handset = result.handset;
         report.modules.append(row);
     }
-    const int status = Publish(report, parser, true);
+    const int status = PublishReport(report, parser, true);
 
     QString text;
     for (const ShardedRun::HandsetResult &handset : run.Handsets()) {
@@ -379,7 +359,7 @@ int RunCommand(const QStringList &arguments)
     const QCommandLineOption retry(QStringLiteral("retry"), QStringLiteral("Run only the modules that the handset's processed results show with a test case not passed (with several handsets: not passed on any of them)."));
     const QCommandLineOption allTargets(QStringLiteral("all-targets"), QStringLiteral("Share the modules among every handset 'harness targets' lists."));
     parser.addOptions({target, testData, dpk, kFamily, kSubFamily, kFeatures, testCases, runOption, noDelete,
-                       copyDelay, logDir, kJUnit, kJson, retry, allTargets});
+                       copyDelay, logDir, JUnitOption(), JsonOption(), retry, allTargets});
     parser.addPositionalArgument(QStringLiteral("PATTERN"), QStringLiteral("Module name patterns ('*' at either end)."), QStringLiteral("[PATTERN...]"));
     int status = ExitSuccess;
     if (!ParseArguments(parser, arguments, status))
@@ -454,7 +434,7 @@ int RunCommand(const QStringList &arguments)
     const bool ran = harness.Run();
 
     const RunReport report = ReportOf(resultsPath, modules);
-    status = Publish(report, parser);
+    status = PublishReport(report, parser, false);
     Out(QStringLiteral("Logs: %1\nProcessed results: %2\nLibrary log: %3\n")
             .arg(parser.isSet(logDir) ? QFileInfo(parser.value(logDir)).absoluteFilePath() : handsetLogs, resultsPath,
                  parser.isSet(setup.log) ? parser.value(setup.log) : DefaultLibraryLog()));
@@ -477,7 +457,7 @@ int ProcessCommand(const QStringList &arguments)
     setup.AddTo(parser);
     const QCommandLineOption logDir(QStringLiteral("log-dir"), QStringLiteral("The folder of saved logs."), QStringLiteral("DIR"));
     const QCommandLineOption results(QStringLiteral("results"), QStringLiteral("The processed-results file (default: DIR/ProcessedResults/ProcessedResults.xml)."), QStringLiteral("FILE"));
-    parser.addOptions({logDir, results, kJUnit, kJson});
+    parser.addOptions({logDir, results, JUnitOption(), JsonOption()});
     int status = ExitSuccess;
     if (!ParseArguments(parser, arguments, status, 0, 0))
         return status;
@@ -505,10 +485,8 @@ int ProcessCommand(const QStringList &arguments)
         Err(arguments.at(0) + QStringLiteral(": %1\n").arg(error));
         return ExitUsage;
     }
-    report.modules.erase(std::remove_if(report.modules.begin(), report.modules.end(),
-                                        [](const ModuleReport &m) { return !m.Executed(); }),
-                         report.modules.end());
-    status = Publish(report, parser);
+    report.DropNotExecuted();
+    status = PublishReport(report, parser, false);
     Out(QStringLiteral("Processed results: %1\n").arg(resultsPath));
     return status;
 }
