@@ -152,14 +152,25 @@ void SetLabel(benchmark::State &state, int index, qsizetype bytes)
     state.SetBytesProcessed(int64_t(state.iterations()) * bytes);
 }
 
-void BM_Decode(benchmark::State &state)
+// The sample of encoding index, or null (the benchmark skipped with the
+// reason) when it could not be made.
+const Sample *ReadySample(benchmark::State &state, int index)
 {
-    const int index = int(state.range(0));
     const Sample &sample = SampleFor(index);
     if (!sample.error.isEmpty()) {
         state.SkipWithError(sample.error.toStdString().c_str());
-        return;
+        return nullptr;
     }
+    return &sample;
+}
+
+void BM_Decode(benchmark::State &state)
+{
+    const int index = int(state.range(0));
+    const Sample *ready = ReadySample(state, index);
+    if (!ready)
+        return;
+    const Sample &sample = *ready;
     QEncoding *encoder = nullptr;
     CreateEncoder(EncodingAt(index).format, &encoder);
     for (auto _ : state) {
@@ -178,11 +189,10 @@ void BM_Decode(benchmark::State &state)
 void BM_DecodeIconv(benchmark::State &state)
 {
     const int index = int(state.range(0));
-    const Sample &sample = SampleFor(index);
-    if (!sample.error.isEmpty()) {
-        state.SkipWithError(sample.error.toStdString().c_str());
+    const Sample *ready = ReadySample(state, index);
+    if (!ready)
         return;
-    }
+    const Sample &sample = *ready;
     IconvHandle decoder("UTF-16LE", EncodingAt(index).iconvName);
     for (auto _ : state) {
         QByteArray out;
@@ -199,11 +209,10 @@ void BM_DecodeIconv(benchmark::State &state)
 void BM_Encode(benchmark::State &state)
 {
     const int index = int(state.range(0));
-    const Sample &sample = SampleFor(index);
-    if (!sample.error.isEmpty()) {
-        state.SkipWithError(sample.error.toStdString().c_str());
+    const Sample *ready = ReadySample(state, index);
+    if (!ready)
         return;
-    }
+    const Sample &sample = *ready;
     QEncoding *encoder = nullptr;
     CreateEncoder(EncodingAt(index).format, &encoder);
     for (auto _ : state) {
@@ -222,11 +231,10 @@ void BM_Encode(benchmark::State &state)
 void BM_EncodeIconv(benchmark::State &state)
 {
     const int index = int(state.range(0));
-    const Sample &sample = SampleFor(index);
-    if (!sample.error.isEmpty()) {
-        state.SkipWithError(sample.error.toStdString().c_str());
+    const Sample *ready = ReadySample(state, index);
+    if (!ready)
         return;
-    }
+    const Sample &sample = *ready;
     IconvHandle encoder(EncodingAt(index).iconvName, "UTF-16LE");
     for (auto _ : state) {
         QByteArray out;
