@@ -1,8 +1,11 @@
 #include "common/xmlwriter.h"
 
+#include "common/xmlnode.h"
+
 #include <QDomNamedNodeMap>
 #include <QFile>
 #include <QSaveFile>
+#include <QVarLengthArray>
 
 #include <algorithm>
 #include <utility>
@@ -152,33 +155,23 @@ public:
         case QDomNode::TextNode:
             AppendEscaped(m_out, node.nodeValue(), false, m_ascii);
             break;
-        case QDomNode::CDATASectionNode: {
-            // "]]>" cannot stand inside a section: split it across two.
-            QString value = node.nodeValue();
-            value.replace(QLatin1String("]]>"), QLatin1String("]]]]><![CDATA[>"));
-            if (m_ascii)
-                SaveAsciiCData(value);
-            else
-                m_out += QLatin1String("<![CDATA[") + value + QLatin1String("]]>");
+        case QDomNode::CDATASectionNode:
+            SaveCData(node.nodeValue());
             break;
-        }
         case QDomNode::CommentNode:
             Indent(node, depth);
-            m_out += QLatin1String("<!--") + node.nodeValue() + QLatin1String("-->");
+            SaveComment(node.nodeValue());
             LineEnd(node);
             break;
         case QDomNode::ProcessingInstructionNode: {
             const QDomProcessingInstruction pi = node.toProcessingInstruction();
             Indent(node, depth);
-            m_out += QLatin1String("<?") + pi.target();
-            if (!pi.data().isEmpty())
-                m_out += QLatin1Char(' ') + pi.data();
-            m_out += QLatin1String("?>");
+            SaveProcessingInstruction(pi.target(), pi.data());
             LineEnd(node);
             break;
         }
         case QDomNode::EntityReferenceNode:
-            m_out += QLatin1Char('&') + node.nodeName() + QLatin1Char(';');
+            SaveEntityReference(node.nodeName());
             break;
         case QDomNode::DocumentTypeNode:
             SaveDocumentType(node.toDocumentType());
@@ -186,6 +179,67 @@ public:
         default:
             break;
         }
+    }
+
+    // The light tree, written as the same tree held in a DOM document.
+    // previous and next are the node's siblings (null at either end). The
+    // walk keeps its own stack: no nesting depth can exhaust the thread's.
+    void Save(const XmlNode &node, int depth, const XmlNode *previous, const XmlNode *next)
+    {
+        struct Open
+        {
+            const XmlNode *element;
+            size_t child;
+            int depth;
+            const XmlNode *next;
+        };
+        std::vector<Open> open;
+        auto begin = [&](const XmlNode &item, int level, const XmlNode *before, const XmlNode *after) {
+            if (!item.IsElement()) {
+                SaveLeaf(item, level, before, after);
+                return;
+            }
+            Indent(before, level);
+            m_out += QLatin1Char('<');
+            m_out += item.Name();
+            AppendAttributes(item);
+            const auto &children = item.Children();
+            if (children.empty()) {
+                m_out += QLatin1String("/>");
+                LineEnd(after);
+                return;
+            }
+            m_out += QLatin1Char('>');
+            if (!children.front()->IsTextLike())
+                m_out += QLatin1Char('\n');
+            open.push_back({&item, 0, level, after});
+        };
+        begin(node, depth, previous, next);
+        while (!open.empty()) {
+            const Open top = open.back();
+            const auto &children = top.element->Children();
+            if (top.child < children.size()) {
+                const size_t i = open.back().child++;
+                begin(*children[i], top.depth + 1, i > 0 ? children[i - 1].get() : nullptr,
+                      i + 1 < children.size() ? children[i + 1].get() : nullptr);
+                continue;
+            }
+            if (!children.back()->IsTextLike())
+                AppendSpaces(top.depth * m_indent);
+            m_out += QLatin1String("</");
+            m_out += top.element->Name();
+            m_out += QLatin1Char('>');
+            LineEnd(top.next);
+            open.pop_back();
+        }
+    }
+
+    void StartTag(const XmlNode &element, int depth)
+    {
+        AppendSpaces(depth * m_indent);
+        m_out += QLatin1Char('<');
+        m_out += element.Name();
+        AppendAttributes(element);
     }
 
     QString Result() const { return m_out; }
@@ -210,6 +264,92 @@ public:
     }
 
 private:
+    void SaveCData(QString value)
+    {
+        // "]]>" cannot stand inside a section: split it across two.
+        value.replace(QLatin1String("]]>"), QLatin1String("]]]]><![CDATA[>"));
+        if (m_ascii)
+            SaveAsciiCData(value);
+        else
+            m_out += QLatin1String("<![CDATA[") + value + QLatin1String("]]>");
+    }
+
+    void SaveComment(const QString &value)
+    {
+        m_out += QLatin1String("<!--") + value + QLatin1String("-->");
+    }
+
+    void SaveProcessingInstruction(const QString &target, const QString &data)
+    {
+        m_out += QLatin1String("<?") + target;
+        if (!data.isEmpty())
+            m_out += QLatin1Char(' ') + data;
+        m_out += QLatin1String("?>");
+    }
+
+    void SaveEntityReference(const QString &name)
+    {
+        m_out += QLatin1Char('&') + name + QLatin1Char(';');
+    }
+
+    static bool IsTextNode(const XmlNode *node) { return node && node->IsTextLike(); }
+
+    void Indent(const XmlNode *previous, int depth)
+    {
+        if (!IsTextNode(previous))
+            AppendSpaces(depth * m_indent);
+    }
+
+    void LineEnd(const XmlNode *next)
+    {
+        if (!IsTextNode(next))
+            m_out += QLatin1Char('\n');
+    }
+
+    void AppendAttributes(const XmlNode &element)
+    {
+        const XmlNode::AttributeList &attributes = element.Attributes();
+        QVarLengthArray<const QPair<QString, QString> *, 16> sorted;
+        for (const auto &attribute : attributes)
+            sorted.append(&attribute);
+        std::sort(sorted.begin(), sorted.end(),
+                  [](const auto *a, const auto *b) { return a->first < b->first; });
+        for (const auto *attribute : sorted) {
+            m_out += QLatin1Char(' ');
+            m_out += attribute->first;
+            m_out += QLatin1String("=\"");
+            AppendEscaped(m_out, attribute->second, true, m_ascii);
+            m_out += QLatin1Char('"');
+        }
+    }
+
+    void SaveLeaf(const XmlNode &node, int depth, const XmlNode *previous, const XmlNode *next)
+    {
+        switch (node.NodeKind()) {
+        case XmlNode::Text:
+            AppendEscaped(m_out, node.Value(), false, m_ascii);
+            break;
+        case XmlNode::CData:
+            SaveCData(node.Value());
+            break;
+        case XmlNode::Comment:
+            Indent(previous, depth);
+            SaveComment(node.Value());
+            LineEnd(next);
+            break;
+        case XmlNode::ProcessingInstruction:
+            Indent(previous, depth);
+            SaveProcessingInstruction(node.Name(), node.Value());
+            LineEnd(next);
+            break;
+        case XmlNode::EntityReference:
+            SaveEntityReference(node.Name());
+            break;
+        case XmlNode::Element:
+            break;
+        }
+    }
+
     // A section cannot hold character references: non-ASCII runs are
     // written between sections, escaped as text.
     void SaveAsciiCData(const QString &value)
@@ -409,10 +549,24 @@ void DocumentStream::Open(const QDomElement &element)
     d->startTagOpen = true;
 }
 
+void DocumentStream::Open(const XmlNode &element)
+{
+    d->BeginContent();
+    d->writer.StartTag(element, int(d->open.size()));
+    d->open.append(element.Name());
+    d->startTagOpen = true;
+}
+
 void DocumentStream::Write(const QDomElement &element)
 {
     d->BeginContent();
     d->writer.Save(element, int(d->open.size()));
+}
+
+void DocumentStream::Write(const XmlNode &element)
+{
+    d->BeginContent();
+    d->writer.Save(element, int(d->open.size()), nullptr, nullptr);
 }
 
 void DocumentStream::Close()
@@ -460,6 +614,18 @@ QByteArray Serialize(const QDomNode &node, int indent)
     return ToString(node, indent).toUtf8();
 }
 
+QString ToString(const XmlNode &node, int indent)
+{
+    Writer writer(indent, false);
+    writer.Save(node, 0, nullptr, nullptr);
+    return writer.Result();
+}
+
+QByteArray Serialize(const XmlNode &node, int indent)
+{
+    return ToString(node, indent).toUtf8();
+}
+
 bool WriteFile(const QString &path, const QByteArray &bytes, bool atomic, QString *error)
 {
     auto fail = [error](const QString &why) {
@@ -495,6 +661,12 @@ bool WriteDocument(const QDomDocument &document, const QString &path, int indent
                    QString *error)
 {
     return WriteFile(path, Serialize(document, indent), atomic, error);
+}
+
+bool WriteDocument(const XmlNode &root, const QString &path, int indent, bool atomic,
+                   QString *error)
+{
+    return WriteFile(path, Serialize(root, indent), atomic, error);
 }
 
 } // namespace XmlWriter

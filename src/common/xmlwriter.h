@@ -8,6 +8,8 @@
 
 #include <memory>
 
+class XmlNode;
+
 // Serialises DOM documents the same way in every process. Qt keeps
 // attributes in a seeded hash, so QDomDocument::toString orders them
 // differently from run to run; this writer orders attributes by name, indents
@@ -26,6 +28,11 @@ HARNESS_EXPORT QString ToAsciiString(const QDomNode &node, int indent = 1);
 // UTF-8 bytes of ToString.
 HARNESS_EXPORT QByteArray Serialize(const QDomNode &node, int indent = 1);
 
+// A light tree, written exactly as the same tree held in a DOM document
+// (the root element on its own, as a document holding just that element).
+HARNESS_EXPORT QString ToString(const XmlNode &node, int indent = 1);
+HARNESS_EXPORT QByteArray Serialize(const XmlNode &node, int indent = 1);
+
 // Writes bytes to path. With atomic set the file is written beside the
 // destination and renamed over it only once complete, so a crash or a full
 // disk never leaves a truncated file. Returns false (and fills error when
@@ -36,6 +43,8 @@ HARNESS_EXPORT bool WriteFile(const QString &path, const QByteArray &bytes, bool
 // Serialize(document) written with WriteFile.
 HARNESS_EXPORT bool WriteDocument(const QDomDocument &document, const QString &path,
                                   int indent = 1, bool atomic = true, QString *error = nullptr);
+HARNESS_EXPORT bool WriteDocument(const XmlNode &root, const QString &path, int indent = 1,
+                                  bool atomic = true, QString *error = nullptr);
 
 // Writes one large document element by element, exactly as ToString would
 // write the whole tree, so that it never has to be held as one DOM: each
@@ -58,8 +67,10 @@ public:
 
     // Starts element (its name and attributes) inside the innermost open one.
     void Open(const QDomElement &element);
+    void Open(const XmlNode &element);
     // Writes element with everything below it inside the innermost open one.
     void Write(const QDomElement &element);
+    void Write(const XmlNode &element);
     // Ends the innermost open element.
     void Close();
     // Ends every open element and returns the UTF-8 text; the stream is

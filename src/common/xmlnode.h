@@ -1,0 +1,132 @@
+#pragma once
+
+#include "common/export.h"
+
+#include <QByteArray>
+#include <QDomElement>
+#include <QList>
+#include <QPair>
+#include <QString>
+#include <QVarLengthArray>
+
+#include <memory>
+#include <vector>
+
+// A light XML tree for the big documents the library handles by the
+// thousand: module descriptions, catalogue caches and processed-results
+// files. It holds what those documents are made of (elements, attributes,
+// character data, comments, processing instructions) without the DOM's
+// per-node cost, reads documents the way QDomDocument::setContent does
+// (whitespace-only text is dropped) and is written by XmlWriter exactly as
+// the same tree held in a QDomDocument would be.
+//
+//   QString error;
+//   int line = 0, column = 0;
+//   std::unique_ptr<XmlNode> root = XmlNode::Parse(bytes, &error, &line, &column);
+//   for (const XmlNode *child : root->ChildElements())
+//       child->Attribute(QStringLiteral("name"));
+class HARNESS_EXPORT XmlNode
+{
+public:
+    enum Kind : quint8 { Element, Text, CData, Comment, ProcessingInstruction, EntityReference };
+
+    // An element named name, or a node of another kind whose name is the
+    // processing instruction's target or the entity's name.
+    explicit XmlNode(const QString &name, Kind kind = Element);
+    ~XmlNode();
+    XmlNode(const XmlNode &) = delete;
+    XmlNode &operator=(const XmlNode &) = delete;
+
+    // Parses a whole document and returns its root element. Everything
+    // outside the root element (declaration, document type, comments) is not
+    // kept. On malformed input returns null and fills error, line and column
+    // (when given) with the parser's message and position.
+    static std::unique_ptr<XmlNode> Parse(const QByteArray &bytes, QString *error = nullptr,
+                                          int *line = nullptr, int *column = nullptr);
+
+    // Parse through QXmlStreamReader alone. Parse gives the same tree faster
+    // for plain documents; this is the reference it is held to.
+    static std::unique_ptr<XmlNode> ParseFully(const QByteArray &bytes, QString *error = nullptr,
+                                               int *line = nullptr, int *column = nullptr);
+
+    Kind NodeKind() const { return m_kind; }
+    bool IsElement() const { return m_kind == Element; }
+    bool IsTextLike() const { return m_kind == Text || m_kind == CData || m_kind == EntityReference; }
+    const QString &Name() const { return m_name; }
+    // The characters of text, CDATA and comments, the data of a processing
+    // instruction.
+    const QString &Value() const { return m_value; }
+    void SetValue(const QString &value) { m_value = value; }
+
+    // Attributes by exact name, in the order they were first set. A missing
+    // attribute reads as fallback.
+    QString Attribute(const QString &name, const QString &fallback = QString()) const;
+    bool HasAttribute(const QString &name) const;
+    void SetAttribute(const QString &name, const QString &value);
+    // Most elements of these documents carry one or two attributes: they are
+    // held in the node itself.
+    using AttributeList = QVarLengthArray<QPair<QString, QString>, 2>;
+    const AttributeList &Attributes() const { return m_attributes; }
+    // Replaces every attribute; the names must differ from each other.
+    void SetAttributes(const AttributeList &attributes) { m_attributes = attributes; }
+
+    bool HasChildNodes() const { return !m_children.empty(); }
+    const std::vector<std::unique_ptr<XmlNode>> &Children() const { return m_children; }
+    // The child elements, in document order.
+    std::vector<XmlNode *> ChildElements() const;
+    // The first child element, or null.
+    XmlNode *FirstChildElement() const;
+
+    // Appends a new element and returns it.
+    XmlNode &AppendElement(const QString &name);
+    // Appends character data; text following text joins it.
+    void AppendText(const QString &text);
+    XmlNode &AppendChild(std::unique_ptr<XmlNode> child);
+    // Moves child (one of this node's children) to the end of the list.
+    void MoveToEnd(const XmlNode *child);
+
+    // The text of every text and CDATA node below this one, in document
+    // order (QDomElement::text).
+    QString InnerText() const;
+
+    // Levels of elements from this one down to its deepest descendant (1
+    // for an element without child elements).
+    int Depth() const;
+
+private:
+    void CollectText(QString &out) const;
+
+    Kind m_kind;
+    QString m_name;
+    QString m_value;
+    AttributeList m_attributes;
+    std::vector<std::unique_ptr<XmlNode>> m_children;
+};
+
+// The same writing code builds a DOM element (for callers of the DOM
+// interface) and an XmlNode (for the library's own big files) through these.
+namespace XmlBuild {
+
+inline void SetAttribute(QDomElement &element, const QString &name, const QString &value)
+{
+    element.setAttribute(name, value);
+}
+
+inline void SetAttribute(XmlNode &element, const QString &name, const QString &value)
+{
+    element.SetAttribute(name, value);
+}
+
+inline QDomElement AppendElement(QDomElement &parent, const QString &name)
+{
+    QDomElement child = parent.ownerDocument().createElement(name);
+    parent.appendChild(child);
+    return child;
+}
+
+inline XmlNode &AppendElement(XmlNode &parent, const QString &name)
+{
+    return parent.AppendElement(name);
+}
+
+} // namespace XmlBuild
