@@ -1,5 +1,7 @@
 #include "catalogue/compilervariant.h"
 
+#include "common/xmlnode.h"
+
 #include <algorithm>
 
 _CompilerVariant::_CompilerVariant() = default;
@@ -36,24 +38,37 @@ bool _CompilerVariant::ReadFromXML(const QDomElement &element)
     return true;
 }
 
+namespace {
+
+template <class Element>
+void WriteVariant(const _CompilerVariant &variant, Element &element)
+{
+    using namespace XmlBuild;
+    SetAttribute(element, QStringLiteral("name"), variant.name);
+    SetAttribute(element, QStringLiteral("variant"), variant.variant);
+    SetAttribute(element, QStringLiteral("binpath"), variant.binPath);
+    SetAttribute(element, QStringLiteral("packagepath"), variant.packagePath);
+    SetAttribute(element, QStringLiteral("arch"), IKestoDevice::TargetToString(variant.arch));
+    SetAttribute(element, QStringLiteral("build"), variant.build);
+    if (variant.files.isEmpty())
+        return;
+    auto &&list = AppendElement(element, QStringLiteral("files"));
+    for (const QString &path : variant.files) {
+        auto &&file = AppendElement(list, QStringLiteral("File"));
+        SetAttribute(file, QStringLiteral("path"), path);
+    }
+}
+
+} // namespace
+
 void _CompilerVariant::WriteToXML(QDomElement &element)
 {
-    element.setAttribute(QStringLiteral("name"), name);
-    element.setAttribute(QStringLiteral("variant"), variant);
-    element.setAttribute(QStringLiteral("binpath"), binPath);
-    element.setAttribute(QStringLiteral("packagepath"), packagePath);
-    element.setAttribute(QStringLiteral("arch"), IKestoDevice::TargetToString(arch));
-    element.setAttribute(QStringLiteral("build"), build);
-    if (files.isEmpty())
-        return;
-    QDomDocument document = element.ownerDocument();
-    QDomElement list = document.createElement(QStringLiteral("files"));
-    for (const QString &path : std::as_const(files)) {
-        QDomElement file = document.createElement(QStringLiteral("File"));
-        file.setAttribute(QStringLiteral("path"), path);
-        list.appendChild(file);
-    }
-    element.appendChild(list);
+    WriteVariant(*this, element);
+}
+
+void _CompilerVariant::WriteToXML(XmlNode &element)
+{
+    WriteVariant(*this, element);
 }
 
 unsigned int ToList(const QMap<QString, QSharedPointer<_CompilerVariant>> &map,

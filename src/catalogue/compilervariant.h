@@ -10,6 +10,8 @@
 #include <QString>
 #include <QStringList>
 
+class XmlNode;
+
 // One build of one package for one handset architecture.
 class HARNESS_EXPORT _CompilerVariant
 {
@@ -26,6 +28,7 @@ public:
     // Writes every attribute (even empty ones) and, when there are files, a
     // "files" child holding one "File" element per path.
     void WriteToXML(QDomElement &element);
+    void WriteToXML(XmlNode &element);
 
     QString name;
     QString variant;

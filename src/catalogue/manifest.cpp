@@ -3,6 +3,7 @@
 #include "catalogue/framework.h"
 #include "catalogue/testmodule.h"
 #include "common/stringhash.h"
+#include "common/xmlnode.h"
 #include "common/xmlwriter.h"
 #include "environment/testdirectories.h"
 #include "log/log.h"
@@ -188,20 +189,18 @@ bool Manifest::WriteManifest(const QString &path)
     }
 
     // A catalogue of thousands of modules would make a DOM of hundreds of
-    // megabytes: each module is built in a small document of its own and
-    // written out before the next one.
+    // megabytes: each module is built as a light tree of its own and written
+    // out before the next one.
     QDomDocument document;
-    QDomElement root = document.createElement(QStringLiteral("testkit"));
-    root.setAttribute(QStringLiteral("path"), kitPath);
-    root.setAttribute(QStringLiteral("hash"), rootHash);
-    root.setAttribute(QStringLiteral("version"), QString::number(kManifestVersion));
+    XmlNode root(QStringLiteral("testkit"));
+    root.SetAttribute(QStringLiteral("path"), kitPath);
+    root.SetAttribute(QStringLiteral("hash"), rootHash);
+    root.SetAttribute(QStringLiteral("version"), QString::number(kManifestVersion));
     XmlWriter::DocumentStream out(1);
     out.Open(root);
-    out.Open(document.createElement(QStringLiteral("testmodules")));
+    out.Open(XmlNode(QStringLiteral("testmodules")));
     for (const QSharedPointer<_TestModule> &module : std::as_const(testModules)) {
-        QDomDocument piece;
-        QDomElement entry = piece.createElement(QStringLiteral("testmodule"));
-        piece.appendChild(entry);
+        XmlNode entry(QStringLiteral("testmodule"));
         module->WriteToManifest(entry);
         out.Write(entry);
     }

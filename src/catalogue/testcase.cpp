@@ -1,5 +1,7 @@
 #include "catalogue/testcase.h"
 
+#include "common/xmlnode.h"
+
 TestCase::TestCase() = default;
 TestCase::TestCase(const QString &name, const QString &type) : name(name), type(type) {}
 TestCase::TestCase(const TestCase &other) = default;
@@ -13,8 +15,23 @@ bool TestCase::ReadFromXML(const QDomElement &element)
     return true;
 }
 
+namespace {
+
+template <class Element>
+void WriteCase(const TestCase &testCase, Element &element)
+{
+    XmlBuild::SetAttribute(element, QStringLiteral("name"), testCase.name);
+    XmlBuild::SetAttribute(element, QStringLiteral("type"), testCase.type);
+}
+
+} // namespace
+
 void TestCase::WriteToXML(QDomElement &element)
 {
-    element.setAttribute(QStringLiteral("name"), name);
-    element.setAttribute(QStringLiteral("type"), type);
+    WriteCase(*this, element);
+}
+
+void TestCase::WriteToXML(XmlNode &element)
+{
+    WriteCase(*this, element);
 }

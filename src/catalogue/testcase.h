@@ -3,6 +3,8 @@
 #include "common/export.h"
 
 #include <QDomElement>
+
+class XmlNode;
 #include <QString>
 
 // One named case inside a test module.
@@ -18,6 +20,7 @@ public:
     // Reads "name" and "type" (missing ones read as empty); always true.
     virtual bool ReadFromXML(const QDomElement &element);
     virtual void WriteToXML(QDomElement &element);
+    void WriteToXML(XmlNode &element);
 
     QString name;
     QString type;

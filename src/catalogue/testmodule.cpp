@@ -2,9 +2,12 @@
 
 #include "catalogue/framework.h"
 #include "common/stringhash.h"
+#include "common/xmlnode.h"
 #include "log/log.h"
 
 #include <QFile>
+
+#include <algorithm>
 
 namespace {
 
@@ -23,10 +26,84 @@ unsigned int DecimalAttribute(const QDomElement &element, const QString &name,
 }
 
 // attribute upper, or attribute lower when upper is empty.
-QString EitherAttribute(const QDomElement &element, const char *upper, const char *lower)
+QString EitherAttribute(const XmlNode &element, const char *upper, const char *lower)
 {
-    const QString value = element.attribute(QLatin1String(upper));
-    return value.isEmpty() ? element.attribute(QLatin1String(lower)) : value;
+    const QString value = element.Attribute(QLatin1String(upper));
+    return value.isEmpty() ? element.Attribute(QLatin1String(lower)) : value;
+}
+
+// The manifest entry of module, into a DOM element or a light one.
+template <class Element>
+void WriteEntry(_TestModule &module, Element &element)
+{
+    using namespace XmlBuild;
+    module.idHash =
+        StringHashName(module.source + module.moduleName + module.family + module.subFamily);
+
+    SetAttribute(element, QStringLiteral("testtype"), module.TestType());
+    SetAttribute(element, QStringLiteral("idhash"), module.idHash);
+    SetAttribute(element, QStringLiteral("source"), module.source);
+    SetAttribute(element, QStringLiteral("moduleName"), module.moduleName);
+    SetAttribute(element, QStringLiteral("baseLineFile"), module.baseLineFile);
+    SetAttribute(element, QStringLiteral("sourcePath"), module.sourcePath);
+    SetAttribute(element, QStringLiteral("family"), module.family);
+    SetAttribute(element, QStringLiteral("subFamily"), module.subFamily);
+    SetAttribute(element, QStringLiteral("minKestoVersion"), module.minKestoVersion);
+
+    if (!module.targets.isEmpty()) {
+        auto &&list = AppendElement(element, QStringLiteral("targets"));
+        QList<QSharedPointer<_CompilerVariant>> sorted;
+        ToList(module.targets, sorted);
+        for (const auto &variant : std::as_const(sorted)) {
+            auto &&target = AppendElement(list, QStringLiteral("target"));
+            variant->WriteToXML(target);
+        }
+    }
+
+    if (!module.testCases.isEmpty()) {
+        auto &&list = AppendElement(element, QStringLiteral("testcases"));
+        for (TestCase &testCase : module.testCases) {
+            auto &&item = AppendElement(list, QStringLiteral("testcase"));
+            testCase.WriteToXML(item);
+        }
+    }
+
+    if (!module.applets.isEmpty()) {
+        auto &&list = AppendElement(element, QStringLiteral("applets"));
+        for (const Applet &applet : std::as_const(module.applets)) {
+            auto &&item = AppendElement(list, QStringLiteral("applet"));
+            SetAttribute(item, QStringLiteral("appletid"), QString::number(applet.appletid));
+            SetAttribute(item, QStringLiteral("appletidhex"), HexClassId(applet.appletid));
+            SetAttribute(item, QStringLiteral("hostid"), QString::number(applet.hostid));
+            SetAttribute(item, QStringLiteral("baseid"), QString::number(applet.baseid));
+            SetAttribute(item, QStringLiteral("apptype"), QString::number(applet.apptype));
+            SetAttribute(item, QStringLiteral("privset"), QString::number(applet.privset));
+            SetAttribute(item, QStringLiteral("flags"), QString::number(applet.flags));
+            SetAttribute(item, QStringLiteral("flagshex"),
+                         QStringLiteral("0x%1").arg(applet.flags, 4, 16, QLatin1Char('0')));
+        }
+    }
+
+    if (!module.classids.isEmpty()) {
+        auto &&list = AppendElement(element, QStringLiteral("classids"));
+        for (const unsigned int id : std::as_const(module.classids)) {
+            auto &&item = AppendElement(list, QStringLiteral("classid"));
+            SetAttribute(item, QStringLiteral("value"), QString::number(id));
+            SetAttribute(item, QStringLiteral("valuehex"), HexClassId(id));
+        }
+    }
+
+    const bool anySecondary = std::any_of(module.secondaryModules.cbegin(), module.secondaryModules.cend(),
+                                          [](const QString &name) { return !name.isEmpty(); });
+    if (anySecondary) {
+        auto &&secondaries = AppendElement(element, QStringLiteral("secondary_modules"));
+        for (const QString &name : std::as_const(module.secondaryModules)) {
+            if (name.isEmpty())
+                continue;
+            auto &&item = AppendElement(secondaries, QStringLiteral("secondary_module"));
+            SetAttribute(item, QStringLiteral("name"), name);
+        }
+    }
 }
 
 } // namespace
@@ -103,11 +180,11 @@ bool _TestModule::ProcessModuleXML(const QString &path)
     if (!file.exists() || !file.open(QIODevice::ReadOnly))
         return false;
 
-    QDomDocument document;
     QString message;
     int line = 0;
     int column = 0;
-    if (!document.setContent(&file, &message, &line, &column)) {
+    const std::unique_ptr<XmlNode> root = XmlNode::Parse(file.readAll(), &message, &line, &column);
+    if (!root) {
         errorText = QStringLiteral("Error processing oat xml file:") + path + QStringLiteral("\n\t")
             + message + QStringLiteral(": Line(%1) Column(%2)").arg(line).arg(column);
         return false;
@@ -116,37 +193,35 @@ bool _TestModule::ProcessModuleXML(const QString &path)
 
     LogMessage(QStringLiteral("Processing *ModuleXML:\n") + path + QStringLiteral("\n"), false);
 
-    const QDomElement suite = document.documentElement().firstChildElement();
-    const QString suiteTag = suite.tagName().toLower();
-    if (suite.isNull()
-        || (suiteTag != QLatin1String("suite") && suiteTag != QLatin1String("oatmodule"))) {
+    const XmlNode *suite = root->FirstChildElement();
+    const QString suiteTag = suite ? suite->Name().toLower() : QString();
+    if (suiteTag != QLatin1String("suite") && suiteTag != QLatin1String("oatmodule")) {
         errorText = QStringLiteral("Error processing module xml file:") + path + QStringLiteral("\n\t")
             + QStringLiteral("SUITE node not found.");
         return false;
     }
 
-    moduleName = EitherAttribute(suite, "NAME", "name");
-    family = EitherAttribute(suite, "FAMILY", "family");
-    subFamily = EitherAttribute(suite, "SUBFAMILY", "subfamily");
+    moduleName = EitherAttribute(*suite, "NAME", "name");
+    family = EitherAttribute(*suite, "FAMILY", "family");
+    subFamily = EitherAttribute(*suite, "SUBFAMILY", "subfamily");
 
-    for (QDomElement child = suite.firstChildElement(); !child.isNull();
-         child = child.nextSiblingElement()) {
-        const QString tag = child.tagName().toLower();
+    for (const XmlNode *child : suite->ChildElements()) {
+        const QString tag = child->Name().toLower();
         if (tag == QLatin1String("testcase")) {
-            const QString name = EitherAttribute(child, "NAME", "name");
-            QString type = child.attribute(QStringLiteral("TYPE"));
+            const QString name = EitherAttribute(*child, "NAME", "name");
+            QString type = child->Attribute(QStringLiteral("TYPE"));
             if (type.isEmpty())
-                type = child.attribute(QStringLiteral("type"), QStringLiteral("auto"));
+                type = child->Attribute(QStringLiteral("type"), QStringLiteral("auto"));
             if (!name.isEmpty())
                 testCases.append(TestCase(name, type));
         } else if (tag == QLatin1String("device_classids") || tag == QLatin1String("ddfusage")) {
             continue;
         } else if (tag == QLatin1String("minkestover")) {
-            minKestoVersion = child.text();
+            minKestoVersion = child->InnerText();
         } else if (tag == QLatin1String("secondary_modules")) {
-            secondaryModules.append(child.text());
+            secondaryModules.append(child->InnerText());
         } else {
-            LogMessage(QStringLiteral("   Unrecognized Node:") + child.tagName() + QStringLiteral("\n"),
+            LogMessage(QStringLiteral("   Unrecognized Node:") + child->Name() + QStringLiteral("\n"),
                        false);
         }
     }
@@ -207,80 +282,12 @@ bool _TestModule::ReadFromManifest(const QDomElement &element)
 
 void _TestModule::WriteToManifest(QDomElement &element)
 {
-    QDomDocument document = element.ownerDocument();
-    idHash = StringHashName(source + moduleName + family + subFamily);
+    WriteEntry(*this, element);
+}
 
-    element.setAttribute(QStringLiteral("testtype"), TestType());
-    element.setAttribute(QStringLiteral("idhash"), idHash);
-    element.setAttribute(QStringLiteral("source"), source);
-    element.setAttribute(QStringLiteral("moduleName"), moduleName);
-    element.setAttribute(QStringLiteral("baseLineFile"), baseLineFile);
-    element.setAttribute(QStringLiteral("sourcePath"), sourcePath);
-    element.setAttribute(QStringLiteral("family"), family);
-    element.setAttribute(QStringLiteral("subFamily"), subFamily);
-    element.setAttribute(QStringLiteral("minKestoVersion"), minKestoVersion);
-
-    if (!targets.isEmpty()) {
-        QDomElement list = document.createElement(QStringLiteral("targets"));
-        QList<QSharedPointer<_CompilerVariant>> sorted;
-        ToList(targets, sorted);
-        for (const auto &variant : std::as_const(sorted)) {
-            QDomElement target = document.createElement(QStringLiteral("target"));
-            variant->WriteToXML(target);
-            list.appendChild(target);
-        }
-        element.appendChild(list);
-    }
-
-    if (!testCases.isEmpty()) {
-        QDomElement list = document.createElement(QStringLiteral("testcases"));
-        for (TestCase &testCase : testCases) {
-            QDomElement item = document.createElement(QStringLiteral("testcase"));
-            testCase.WriteToXML(item);
-            list.appendChild(item);
-        }
-        element.appendChild(list);
-    }
-
-    if (!applets.isEmpty()) {
-        QDomElement list = document.createElement(QStringLiteral("applets"));
-        for (const Applet &applet : std::as_const(applets)) {
-            QDomElement item = document.createElement(QStringLiteral("applet"));
-            item.setAttribute(QStringLiteral("appletid"), QString::number(applet.appletid));
-            item.setAttribute(QStringLiteral("appletidhex"), HexClassId(applet.appletid));
-            item.setAttribute(QStringLiteral("hostid"), QString::number(applet.hostid));
-            item.setAttribute(QStringLiteral("baseid"), QString::number(applet.baseid));
-            item.setAttribute(QStringLiteral("apptype"), QString::number(applet.apptype));
-            item.setAttribute(QStringLiteral("privset"), QString::number(applet.privset));
-            item.setAttribute(QStringLiteral("flags"), QString::number(applet.flags));
-            item.setAttribute(QStringLiteral("flagshex"),
-                              QStringLiteral("0x%1").arg(applet.flags, 4, 16, QLatin1Char('0')));
-            list.appendChild(item);
-        }
-        element.appendChild(list);
-    }
-
-    if (!classids.isEmpty()) {
-        QDomElement list = document.createElement(QStringLiteral("classids"));
-        for (const unsigned int id : std::as_const(classids)) {
-            QDomElement item = document.createElement(QStringLiteral("classid"));
-            item.setAttribute(QStringLiteral("value"), QString::number(id));
-            item.setAttribute(QStringLiteral("valuehex"), HexClassId(id));
-            list.appendChild(item);
-        }
-        element.appendChild(list);
-    }
-
-    QDomElement secondaries = document.createElement(QStringLiteral("secondary_modules"));
-    for (const QString &name : std::as_const(secondaryModules)) {
-        if (name.isEmpty())
-            continue;
-        QDomElement item = document.createElement(QStringLiteral("secondary_module"));
-        item.setAttribute(QStringLiteral("name"), name);
-        secondaries.appendChild(item);
-    }
-    if (secondaries.hasChildNodes())
-        element.appendChild(secondaries);
+void _TestModule::WriteToManifest(XmlNode &element)
+{
+    WriteEntry(*this, element);
 }
 
 QString _TestModule::HexModuleName()

@@ -16,6 +16,7 @@
 #include <QVector>
 
 class Log;
+class XmlNode;
 
 // The base of every test module kind. It holds the catalogue data of a module
 // (read from its description XML or its manifest entry), the run-time state
@@ -81,7 +82,10 @@ public:
     // Reads the module's manifest entry; true when it names the module.
     virtual bool ReadFromManifest(const QDomElement &element);
     // Writes the module's manifest entry (recomputing the ID hash first).
+    // The catalogue cache is written through the light tree; both give the
+    // same entry.
     virtual void WriteToManifest(QDomElement &element);
+    virtual void WriteToManifest(XmlNode &element);
 
     bool selectable = true;
     Log *logger = nullptr;

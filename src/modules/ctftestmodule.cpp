@@ -245,3 +245,9 @@ void CtfTestModule::WriteToManifest(QDomElement &element)
     _TestModule::WriteToManifest(element);
     Programs::WriteToManifest(element, programs);
 }
+
+void CtfTestModule::WriteToManifest(XmlNode &element)
+{
+    _TestModule::WriteToManifest(element);
+    Programs::WriteToManifest(element, programs);
+}

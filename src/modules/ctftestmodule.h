@@ -47,6 +47,7 @@ public:
     // The base entry plus "programs"; true when at least one program was read.
     bool ReadFromManifest(const QDomElement &element) override;
     void WriteToManifest(QDomElement &element) override;
+    void WriteToManifest(XmlNode &element) override;
 
     QList<SysResource> programs;
     QStringList logPaths;

@@ -1,6 +1,7 @@
 #include "modules/oattestmodule.h"
 
 #include "common/clock.h"
+#include "common/xmlnode.h"
 #include "environment/testdirectories.h"
 #include "modules/moduleutil.h"
 #include "modules/oatframework.h"
@@ -367,9 +368,20 @@ bool OatTestModule::ReadFromManifest(const QDomElement &element)
     return Programs::ReadFromManifest(element, programs) > 0;
 }
 
-void OatTestModule::WriteToManifest(QDomElement &element)
+template <class Element>
+void OatTestModule::WriteEntry(Element &element)
 {
     _TestModule::WriteToManifest(element);
-    element.setAttribute(QStringLiteral("mifname"), mifname);
+    XmlBuild::SetAttribute(element, QStringLiteral("mifname"), mifname);
     Programs::WriteToManifest(element, programs);
+}
+
+void OatTestModule::WriteToManifest(QDomElement &element)
+{
+    WriteEntry(element);
+}
+
+void OatTestModule::WriteToManifest(XmlNode &element)
+{
+    WriteEntry(element);
 }

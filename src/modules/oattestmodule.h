@@ -50,6 +50,7 @@ public:
     // program was read.
     bool ReadFromManifest(const QDomElement &element) override;
     void WriteToManifest(QDomElement &element) override;
+    void WriteToManifest(XmlNode &element) override;
 
     // The module's handset directory name: the module name with an "oat"
     // prefix, lower-cased.
@@ -69,4 +70,6 @@ private:
     QString SetupConfigData(const QMap<QString, QString> &env);
     void ExecuteMifHack(IKestoDevice *device);
     void StampLog(const QString &hostPath, const QString &runId);
+    template <class Element>
+    void WriteEntry(Element &element);
 };

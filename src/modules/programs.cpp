@@ -1,6 +1,7 @@
 #include "modules/programs.h"
 
 #include "archive/tar.h"
+#include "common/xmlnode.h"
 #include "resources/kestoresources.h"
 
 #include <QFileInfo>
@@ -38,18 +39,30 @@ int ReadFromManifest(const QDomElement &element, QList<SysResource> &programs)
     return count;
 }
 
-void WriteToManifest(QDomElement &element, QList<SysResource> &programs)
+namespace {
+
+template <class Element>
+void WritePrograms(Element &element, QList<SysResource> &programs)
 {
     if (programs.isEmpty())
         return;
-    QDomDocument document = element.ownerDocument();
-    QDomElement list = document.createElement(QStringLiteral("programs"));
+    auto &&list = XmlBuild::AppendElement(element, QStringLiteral("programs"));
     for (SysResource &program : programs) {
-        QDomElement item = document.createElement(QStringLiteral("program"));
+        auto &&item = XmlBuild::AppendElement(list, QStringLiteral("program"));
         program.WriteToXML(item);
-        list.appendChild(item);
     }
-    element.appendChild(list);
+}
+
+} // namespace
+
+void WriteToManifest(QDomElement &element, QList<SysResource> &programs)
+{
+    WritePrograms(element, programs);
+}
+
+void WriteToManifest(XmlNode &element, QList<SysResource> &programs)
+{
+    WritePrograms(element, programs);
 }
 
 bool ReadFromPackage(const QString &directory, const QString &moduleName, const QString &prefix,

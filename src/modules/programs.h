@@ -22,6 +22,7 @@ HARNESS_EXPORT int ReadFromManifest(const QDomElement &element, QList<SysResourc
 
 // Appends a "programs" child holding one "program" per record, when there are any.
 HARNESS_EXPORT void WriteToManifest(QDomElement &element, QList<SysResource> &programs);
+HARNESS_EXPORT void WriteToManifest(XmlNode &element, QList<SysResource> &programs);
 
 // Reads the program records of type programType from the module information
 // file inside the module's package in directory. The package is looked for as

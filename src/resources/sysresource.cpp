@@ -1,5 +1,6 @@
 #include "resources/sysresource.h"
 
+#include "common/xmlnode.h"
 #include "resources/blockreader.h"
 
 #include <QDomDocument>
@@ -138,27 +139,36 @@ void SysResource::Decode()
     }
 }
 
-void SysResource::WriteToXML(QDomElement &element)
+template <class Element>
+void SysResource::WriteRecord(Element &element)
 {
-    element.setAttribute(QStringLiteral("type"), QString::number(type));
-    element.setAttribute(QStringLiteral("keysize"), QString::number(keysize));
-    QDomDocument document = element.ownerDocument();
+    using namespace XmlBuild;
+    SetAttribute(element, QStringLiteral("type"), QString::number(type));
+    SetAttribute(element, QStringLiteral("keysize"), QString::number(keysize));
     if (!data.isEmpty())
-        element.appendChild(document.createElement(QStringLiteral("data")));
+        AppendElement(element, QStringLiteral("data"));
     const QList<QByteArray> names = PropertyNames();
     if (names.isEmpty())
         return;
-    QDomElement list = document.createElement(QStringLiteral("properties"));
-    element.appendChild(list);
+    auto &&list = AppendElement(element, QStringLiteral("properties"));
     for (const QByteArray &name : names) {
         const QVariant value = Property(name.constData());
         if (!value.isValid() || value.toString().isEmpty())
             continue;
-        QDomElement property = document.createElement(QStringLiteral("property"));
-        property.setAttribute(QStringLiteral("name"), QString::fromLatin1(name));
-        property.setAttribute(QStringLiteral("value"), value.toString());
-        list.appendChild(property);
+        auto &&property = AppendElement(list, QStringLiteral("property"));
+        SetAttribute(property, QStringLiteral("name"), QString::fromLatin1(name));
+        SetAttribute(property, QStringLiteral("value"), value.toString());
     }
+}
+
+void SysResource::WriteToXML(QDomElement &element)
+{
+    WriteRecord(element);
+}
+
+void SysResource::WriteToXML(XmlNode &element)
+{
+    WriteRecord(element);
 }
 
 void SysResource::ReadFromXML(const QDomElement &element)

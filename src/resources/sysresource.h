@@ -10,6 +10,8 @@
 
 #include <memory>
 
+class XmlNode;
+
 // One system resource (resource type 0x6000): a key and the fields of its
 // type, decoded into named properties. The block is little-endian: keysize
 // (16 bits), type (32 bits), the key, then the fields of the type. Property
@@ -38,6 +40,7 @@ struct HARNESS_EXPORT SysResource
     // and a "properties" child when there is at least one property (holding
     // the properties whose text is not empty).
     virtual void WriteToXML(QDomElement &element);
+    void WriteToXML(XmlNode &element);
 
     // Type and keysize 0, no properties (data is kept).
     void Reset();
@@ -55,4 +58,8 @@ struct HARNESS_EXPORT SysResource
     quint32 type = 0;
     QByteArray data;
     std::unique_ptr<QObject> properties;
+
+private:
+    template <class Element>
+    void WriteRecord(Element &element);
 };

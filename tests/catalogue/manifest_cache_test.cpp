@@ -4,6 +4,8 @@
 
 #include "catalogue/framework.h"
 #include "common/stringhash.h"
+#include "common/xmlnode.h"
+#include "common/xmlwriter.h"
 #include "modules/ctftestmodule.h"
 #include "modules/oatframework.h"
 #include "modules/oattestmodule.h"
@@ -229,6 +231,34 @@ TEST_F(ManifestCacheTest, WrittenCatalogueReadsBackTheSame)
     ASSERT_TRUE(expected.contains("<data/>"));
     expected.replace("     <data/>\n", "");
     EXPECT_EQ(testutil::ReadFile(again), expected);
+}
+
+TEST_F(ManifestCacheTest, CacheEntriesAreTheEntriesTheDomInterfaceWrites)
+{
+    // The cache is written through the light tree; a caller of the DOM
+    // interface must get the very same entry, kind by kind.
+    BuildRichKit();
+    Manifest manifest(kit->Root(), false);
+    Scan(manifest);
+    const QByteArray cache = testutil::ReadFile(manifest.cacheFile);
+    ASSERT_EQ(manifest.testModules.size(), 6);
+    for (const auto &module : std::as_const(manifest.testModules)) {
+        QDomDocument document;
+        QDomElement element = document.createElement(QStringLiteral("testmodule"));
+        document.appendChild(element);
+        module->WriteToManifest(element);
+        XmlNode light(QStringLiteral("testmodule"));
+        module->WriteToManifest(light);
+        const QByteArray written = XmlWriter::Serialize(light);
+        EXPECT_EQ(written, XmlWriter::Serialize(element)) << module->moduleName.toStdString();
+        // As it stands in the cache, two levels down.
+        QByteArray indented;
+        for (const QByteArray &line : written.split('\n')) {
+            if (!line.isEmpty())
+                indented += "  " + line + '\n';
+        }
+        EXPECT_TRUE(cache.contains(indented)) << module->moduleName.toStdString();
+    }
 }
 
 TEST_F(ManifestCacheTest, WrittenCacheIsWellFormedXmlOfTheDocumentedLayout)
