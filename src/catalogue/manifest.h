@@ -89,6 +89,9 @@ public:
     // Keyed by framework name as written.
     QMap<QString, QSharedPointer<_Framework>> frameworks;
 
+    // An entry of a directory listed by a scan.
+    struct DirEntry;
+
 private:
     struct MifRecord;
     struct ScanState;
@@ -116,7 +119,7 @@ private:
     static QSharedPointer<_Framework> CreateFramework(const QString &name);
 
     // The listing of dir sorted by name, taken from the disk once per scan.
-    QList<QFileInfo> Listing(const QString &dir);
+    QList<DirEntry> Listing(const QString &dir);
     // Forgets the listing of dir and the packages read from it.
     void ForgetListing(const QString &dir);
     // The module-information members of a package, read once per scan.

@@ -15,9 +15,17 @@
 
 #include <QDir>
 #include <QDomDocument>
+#include <QFile>
 #include <QFileInfo>
 #include <QHash>
 #include <QSet>
+
+#include <dirent.h>
+#include <sys/stat.h>
+
+#include <algorithm>
+#include <utility>
+#include <vector>
 
 // One module-information member of a package, decoded.
 struct Manifest::MifRecord
@@ -28,13 +36,40 @@ struct Manifest::MifRecord
     QVector<unsigned int> classes;
 };
 
+// One entry of a listed directory: what the scan asks of it, read from the
+// directory itself (no stat per entry unless it is a link).
+struct Manifest::DirEntry
+{
+    QString name;
+    // The directory as given joined with name, and its absolute form.
+    QString path;
+    QString absolutePath;
+    bool isDir = false;
+
+    bool IsFile() const { return !isDir; }
+    // The name up to its first dot, after its last dot, after its first dot.
+    QString BaseName() const { return name.section(QLatin1Char('.'), 0, 0); }
+    QString Suffix() const
+    {
+        const qsizetype dot = name.lastIndexOf(QLatin1Char('.'));
+        return dot < 0 ? QString() : name.mid(dot + 1);
+    }
+    QString CompleteSuffix() const
+    {
+        const qsizetype dot = name.indexOf(QLatin1Char('.'));
+        return dot < 0 ? QString() : name.mid(dot + 1);
+    }
+};
+
 // What one scan remembers so that it lists each directory and reads each
 // package once, and never walks a directory twice (a symbolic link pointing
 // back up the tree would otherwise send it round for ever).
 struct Manifest::ScanState
 {
-    QSet<QString> visited;
-    QHash<QString, QList<QFileInfo>> listings;
+    // Directories walked, by device and inode: one stat per directory
+    // instead of resolving every component of its path.
+    QSet<QPair<quint64, quint64>> visited;
+    QHash<QString, QList<Manifest::DirEntry>> listings;
     QHash<QString, QList<MifRecord>> packages;
 };
 
@@ -100,30 +135,74 @@ QString DescriptionType(const QString &path)
     return QString();
 }
 
-QList<QFileInfo> ListEntries(const QString &dir)
+QString JoinPath(const QString &dir, const QString &name)
 {
-    return QDir(dir).entryInfoList(QDir::Dirs | QDir::Files | QDir::NoDotAndDotDot,
-                                   QDir::Name | QDir::IgnoreCase);
+    return dir.endsWith(QLatin1Char('/')) ? dir + name : dir + QLatin1Char('/') + name;
 }
 
-bool IsPackageFile(const QFileInfo &entry)
+// The directories and files of dir (following links; hidden entries, broken
+// links, devices, pipes and sockets left out) sorted by name regardless of
+// case.
+QList<Manifest::DirEntry> ListEntries(const QString &dir)
 {
-    return entry.isFile() && entry.completeSuffix().toLower() == kPackageSuffix;
+    QList<Manifest::DirEntry> entries;
+    const QByteArray encoded = QFile::encodeName(dir);
+    DIR *stream = ::opendir(encoded.constData());
+    if (!stream)
+        return entries;
+    const QString base = QDir::cleanPath(dir);
+    const QString absoluteBase = QDir::isAbsolutePath(base) ? base : QDir::cleanPath(QDir(dir).absolutePath());
+    std::vector<std::pair<QString, Manifest::DirEntry>> sorted;
+    while (const struct dirent *item = ::readdir(stream)) {
+        if (item->d_name[0] == '.')
+            continue;
+        bool isDir = item->d_type == DT_DIR;
+        if (item->d_type != DT_DIR && item->d_type != DT_REG) {
+            if (item->d_type != DT_LNK && item->d_type != DT_UNKNOWN)
+                continue;
+            struct stat status;
+            const QByteArray full = encoded + '/' + item->d_name;
+            if (::stat(full.constData(), &status) != 0)
+                continue;
+            if (!S_ISDIR(status.st_mode) && !S_ISREG(status.st_mode))
+                continue;
+            isDir = S_ISDIR(status.st_mode);
+        }
+        Manifest::DirEntry entry;
+        entry.name = QFile::decodeName(item->d_name);
+        entry.path = JoinPath(base, entry.name);
+        entry.absolutePath = absoluteBase == base ? entry.path : JoinPath(absoluteBase, entry.name);
+        entry.isDir = isDir;
+        sorted.emplace_back(entry.name.toLower(), std::move(entry));
+    }
+    ::closedir(stream);
+    std::sort(sorted.begin(), sorted.end(), [](const auto &a, const auto &b) {
+        return a.first != b.first ? a.first < b.first : a.second.name < b.second.name;
+    });
+    entries.reserve(qsizetype(sorted.size()));
+    for (auto &item : sorted)
+        entries.append(std::move(item.second));
+    return entries;
+}
+
+bool IsPackageFile(const Manifest::DirEntry &entry)
+{
+    return entry.IsFile() && entry.CompleteSuffix().toLower() == kPackageSuffix;
 }
 
 // A package file named <name>_<tool-chain>_<build>.kestix as a compiler
 // variant; null when the name does not split so. name receives the leading
 // part.
-QSharedPointer<_CompilerVariant> PackageVariant(const QFileInfo &package, QString &name)
+QSharedPointer<_CompilerVariant> PackageVariant(const Manifest::DirEntry &package, QString &name)
 {
     QString first, toolChain, build;
-    if (!BreakPackageName(package.baseName(), first, toolChain, build))
+    if (!BreakPackageName(package.BaseName(), first, toolChain, build))
         return {};
     QSharedPointer<_CompilerVariant> variant(new _CompilerVariant);
-    variant->name = package.baseName();
+    variant->name = package.BaseName();
     variant->variant = toolChain;
     variant->build = build;
-    variant->packagePath = QDir::cleanPath(package.absoluteFilePath());
+    variant->packagePath = QDir::cleanPath(package.absolutePath);
     variant->arch = ArchitectureOf(toolChain);
     name = first;
     return variant;
@@ -133,11 +212,12 @@ QSharedPointer<_CompilerVariant> PackageVariant(const QFileInfo &package, QStrin
 
 bool Manifest::GenerateManifest(bool force)
 {
-    // IsVersionOkay followed by ReadManifest, parsing the cache only once.
-    if (QFileInfo::exists(cacheFile)) {
-        testModules.clear();
+    // IsVersionOkay followed by ReadManifest, parsing the cache only once; a
+    // forced scan has no use for the cache.
+    testModules.clear();
+    if (!force && QFileInfo::exists(cacheFile)) {
         QDomDocument document;
-        if (ReadCacheDocument(cacheFile, document) && IsCurrent(document) && !force) {
+        if (ReadCacheDocument(cacheFile, document) && IsCurrent(document)) {
             ReadDocument(document);
             return true;
         }
@@ -151,14 +231,14 @@ bool Manifest::GenerateManifest(bool force)
     return WriteManifest(QString());
 }
 
-QList<QFileInfo> Manifest::Listing(const QString &dir)
+QList<Manifest::DirEntry> Manifest::Listing(const QString &dir)
 {
     if (!m_scan)
         return ListEntries(dir);
     auto found = m_scan->listings.constFind(dir);
     if (found != m_scan->listings.constEnd())
         return found.value();
-    const QList<QFileInfo> entries = ListEntries(dir);
+    const QList<DirEntry> entries = ListEntries(dir);
     m_scan->listings.insert(dir, entries);
     return entries;
 }
@@ -170,43 +250,43 @@ void Manifest::ForgetListing(const QString &dir)
     auto found = m_scan->listings.find(dir);
     if (found == m_scan->listings.end())
         return;
-    for (const QFileInfo &entry : std::as_const(found.value())) {
+    for (const DirEntry &entry : std::as_const(found.value())) {
         if (IsPackageFile(entry))
-            m_scan->packages.remove(entry.absoluteFilePath());
+            m_scan->packages.remove(entry.absolutePath);
     }
     m_scan->listings.erase(found);
 }
 
 void Manifest::ProcessTheSubDir(const QString &dir)
 {
-    const QFileInfo info(dir);
-    if (!info.isDir())
+    struct stat status;
+    if (::stat(QFile::encodeName(dir).constData(), &status) != 0 || !S_ISDIR(status.st_mode))
         return;
     if (m_scan) {
-        const QString canonical = info.canonicalFilePath();
-        if (m_scan->visited.contains(canonical))
+        const QPair<quint64, quint64> identity(quint64(status.st_dev), quint64(status.st_ino));
+        if (m_scan->visited.contains(identity))
             return;
-        m_scan->visited.insert(canonical);
+        m_scan->visited.insert(identity);
     }
 
-    const QList<QFileInfo> entries = Listing(dir);
+    const QList<DirEntry> entries = Listing(dir);
     QStringList packageDirs;
-    for (const QFileInfo &entry : entries) {
-        if (entry.isDir()) {
-            const QString base = entry.baseName().toLower();
+    for (const DirEntry &entry : entries) {
+        if (entry.isDir) {
+            const QString base = entry.BaseName().toLower();
             if (base == QLatin1String("testframeworks") && !isPlatform) {
-                ProcessFrameworkDirectory(QDir::cleanPath(entry.filePath()));
+                ProcessFrameworkDirectory(QDir::cleanPath(entry.path));
             } else if (base == QLatin1String("package")) {
                 QSharedPointer<_TestModule> module(new SecondaryModule);
-                const QString path = entry.absoluteFilePath();
+                const QString path = entry.absolutePath;
                 ProcessPackageDir(module, path);
                 secondaryModules.insert(module->moduleName, module);
                 packageDirs.append(path);
             } else {
-                ProcessTheSubDir(QDir::cleanPath(entry.filePath()));
+                ProcessTheSubDir(QDir::cleanPath(entry.path));
             }
-        } else if (entry.suffix().toLower() == QLatin1String("xml")) {
-            ProcessXMLDocument(QDir::cleanPath(entry.absoluteFilePath()));
+        } else if (entry.Suffix().toLower() == QLatin1String("xml")) {
+            ProcessXMLDocument(QDir::cleanPath(entry.absolutePath));
         }
     }
 
@@ -221,7 +301,7 @@ void Manifest::ProcessFrameworkDirectory(const QString &dir)
 {
     const QString runDir = dir + QDir::separator() + QStringLiteral("run");
     if (QFileInfo::exists(runDir)) {
-        for (const QFileInfo &entry : ListEntries(runDir)) {
+        for (const DirEntry &entry : ListEntries(runDir)) {
             if (!IsPackageFile(entry))
                 continue;
             QString name;
@@ -241,10 +321,10 @@ void Manifest::ProcessFrameworkDirectory(const QString &dir)
         return;
     }
 
-    for (const QFileInfo &entry : ListEntries(dir)) {
-        if (!entry.isDir())
+    for (const DirEntry &entry : ListEntries(dir)) {
+        if (!entry.isDir)
             continue;
-        const QString lower = entry.fileName().toLower();
+        const QString lower = entry.name.toLower();
         if (!ModuleKindWords().contains(lower))
             continue;
         QSharedPointer<_Framework> framework(new _Framework);
@@ -289,7 +369,7 @@ bool Manifest::ProcessXMLDocument(const QString &path)
 void Manifest::ProcessXMLDir(const QString &xmlPath, QSharedPointer<_TestModule> module)
 {
     const QString dir = QFileInfo(xmlPath).absolutePath();
-    const QList<QFileInfo> entries = Listing(dir);
+    const QList<DirEntry> entries = Listing(dir);
     if (entries.isEmpty())
         return;
 
@@ -300,8 +380,8 @@ void Manifest::ProcessXMLDir(const QString &xmlPath, QSharedPointer<_TestModule>
     // Only OAT modules come with a base-line file.
     bool baseLineDone = module->TestType() != OatTestModule::Type();
 
-    for (const QFileInfo &entry : entries) {
-        const QString name = entry.fileName().toLower();
+    for (const DirEntry &entry : entries) {
+        const QString name = entry.name.toLower();
         if (name.contains(QLatin1String(".mod")) || name.contains(QLatin1String(".dll"))) {
             kind = Kind::Prebuilt;
             kindFound = true;
@@ -311,10 +391,10 @@ void Manifest::ProcessXMLDir(const QString &xmlPath, QSharedPointer<_TestModule>
             kind = Kind::Source;
             kindFound = true;
         } else if (name.contains(QLatin1String(".baseline"))) {
-            module->baseLineFile = entry.absoluteFilePath();
+            module->baseLineFile = entry.absolutePath;
             baseLineDone = true;
         } else if (name.contains(QLatin1String("package"))) {
-            packageDone = module->ProcessPackage(entry.absoluteFilePath());
+            packageDone = module->ProcessPackage(entry.absolutePath);
         }
         if (kindFound && packageDone && baseLineDone)
             break;
@@ -340,10 +420,10 @@ void Manifest::ProcessTarget(QSharedPointer<_TestModule>, const QString &)
 
 void Manifest::ProcessPackageDir(QSharedPointer<_TestModule> module, const QString &dir)
 {
-    for (const QFileInfo &entry : Listing(dir)) {
+    for (const DirEntry &entry : Listing(dir)) {
         if (!IsPackageFile(entry))
             continue;
-        DecompileKestoPackage(module, entry.absoluteFilePath());
+        DecompileKestoPackage(module, entry.absolutePath);
         QString name;
         const QSharedPointer<_CompilerVariant> variant = PackageVariant(entry, name);
         if (!variant)
