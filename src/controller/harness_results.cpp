@@ -58,7 +58,7 @@ void Harness::UpdateProcessedModulesXML(QSharedPointer<_TestModule> module)
     QSharedPointer<ProcessedResults> results = m_results;
     if (!results)
         results.reset(new ProcessedResults);
-    if (results->Path() != path || results->Document().isNull())
+    if (results->Path() != path || !results->Root())
         results->Open(path, m_kitManifest.data(), m_platformManifest.data(), m_logger);
 
     TestResults parsed;

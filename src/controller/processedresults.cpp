@@ -2,6 +2,7 @@
 
 #include "catalogue/manifest.h"
 #include "catalogue/testmodule.h"
+#include "common/xmlnode.h"
 #include "common/xmlwriter.h"
 #include "log/log.h"
 
@@ -9,10 +10,13 @@
 #include <QDir>
 #include <QFile>
 #include <QFileInfo>
+#include <QVarLengthArray>
 
 namespace {
 
 const QString kRootElement = QStringLiteral("testmodules");
+// Levels of elements a results file may hold (it writes three).
+constexpr int kMaxDepth = 64;
 const QString kModuleElement = QStringLiteral("module");
 const QString kTestCaseElement = QStringLiteral("testcase");
 const QString kKvkHash = QStringLiteral("kvkHash");
@@ -32,9 +36,9 @@ const QString kUnexecuted = QStringLiteral("unexecuted");
 // Endings under which a log may report a test case stored without them.
 const QString kRenamedEndings[] = {QStringLiteral(".1"), QStringLiteral("_1")};
 
-bool IsElement(const QDomElement &element, const QString &name)
+bool IsElement(const XmlNode &element, const QString &name)
 {
-    return element.tagName().toLower() == name;
+    return element.Name().compare(name, Qt::CaseInsensitive) == 0;
 }
 
 QString RootHashOf(Manifest *catalogue)
@@ -51,29 +55,31 @@ struct ProcessedResults::Module
 {
     struct Case
     {
-        QDomElement element;
+        XmlNode *element = nullptr;
         quint64 order = 0;
     };
 
-    QDomElement element;
+    XmlNode *element = nullptr;
     bool casesIndexed = false;
     quint64 nextOrder = 0;
-    QHash<QString, QList<Case>> cases;
+    // A name is almost always held by one case: it is kept in place.
+    using Cases = QVarLengthArray<Case, 1>;
+    QHash<QString, Cases> cases;
 
-    void AddCase(const QDomElement &testCase)
+    void AddCase(XmlNode *testCase)
     {
-        cases[testCase.attribute(kName)].append(Case{testCase, nextOrder++});
+        cases[testCase->Attribute(kName)].append(Case{testCase, nextOrder++});
     }
 
-    void RemoveCase(const QString &name, const QDomElement &testCase)
+    void RemoveCase(const QString &name, const XmlNode *testCase)
     {
         auto found = cases.find(name);
         if (found == cases.end())
             return;
-        QList<Case> &list = found.value();
-        for (int i = 0; i < list.size(); ++i) {
+        Cases &list = found.value();
+        for (qsizetype i = 0; i < list.size(); ++i) {
             if (list.at(i).element == testCase) {
-                list.removeAt(i);
+                list.remove(i);
                 break;
             }
         }
@@ -108,9 +114,9 @@ void ProcessedResults::Open(const QString &path, Manifest *kit, Manifest *platfo
 {
     m_path = path;
     m_logger = logger;
-    m_document = QDomDocument();
-    m_root = QDomElement();
     m_index.clear();
+    m_last = nullptr;
+    m_root.reset();
     m_modified = false;
     m_damaged = false;
     savePending = false;
@@ -118,17 +124,20 @@ void ProcessedResults::Open(const QString &path, Manifest *kit, Manifest *platfo
     bool usable = false;
     QFile file(path);
     if (!path.isEmpty() && file.exists()) {
-        if (file.open(QIODevice::ReadOnly) && m_document.setContent(&file)) {
-            m_root = m_document.documentElement();
-            usable = !m_root.isNull() && IsElement(m_root, kRootElement);
+        if (file.open(QIODevice::ReadOnly)) {
+            m_root = XmlNode::Parse(file.readAll());
+            // A file nested far deeper than results ever are is not one of
+            // ours; written back with its indentation it would grow with
+            // the square of its depth.
+            usable = m_root && IsElement(*m_root, kRootElement) && m_root->Depth() <= kMaxDepth;
         }
         // Whatever stands there and is not a results file is kept aside
         // rather than overwritten.
         m_damaged = !usable;
     }
 
-    if (!usable || m_root.attribute(kKvkHash) != RootHashOf(kit)
-        || (platform && m_root.attribute(kPlatformHash) != platform->RootHash())) {
+    if (!usable || m_root->Attribute(kKvkHash) != RootHashOf(kit)
+        || (platform && m_root->Attribute(kPlatformHash) != platform->RootHash())) {
         Rebuild(kit, platform);
     }
     BuildIndex();
@@ -136,11 +145,9 @@ void ProcessedResults::Open(const QString &path, Manifest *kit, Manifest *platfo
 
 void ProcessedResults::Rebuild(Manifest *kit, Manifest *platform)
 {
-    m_document = QDomDocument();
-    m_root = m_document.createElement(kRootElement);
-    m_root.setAttribute(kKvkHash, RootHashOf(kit));
-    m_root.setAttribute(kPlatformHash, RootHashOf(platform));
-    m_document.appendChild(m_root);
+    m_root = std::make_unique<XmlNode>(kRootElement);
+    m_root->SetAttribute(kKvkHash, RootHashOf(kit));
+    m_root->SetAttribute(kPlatformHash, RootHashOf(platform));
     AddCatalogue(kit, QStringLiteral("KVK"));
     AddCatalogue(platform, QStringLiteral("PVS"));
     m_modified = true;
@@ -157,23 +164,21 @@ void ProcessedResults::AddCatalogue(Manifest *catalogue, const QString &source)
             || module->family.toLower() == QLatin1String("testframeworks")) {
             continue;
         }
-        QDomElement element = m_document.createElement(kModuleElement);
-        element.setAttribute(kIdHash, module->IDHash());
-        element.setAttribute(kName, module->moduleName);
-        element.setAttribute(kFamily, module->family);
-        element.setAttribute(kSubFamily, module->subFamily);
-        element.setAttribute(kSource, source);
+        XmlNode &element = m_root->AppendElement(kModuleElement);
+        element.SetAttribute(kIdHash, module->IDHash());
+        element.SetAttribute(kName, module->moduleName);
+        element.SetAttribute(kFamily, module->family);
+        element.SetAttribute(kSubFamily, module->subFamily);
+        element.SetAttribute(kSource, source);
         for (const TestCase &testCase : module->testCases) {
-            QDomElement child = m_document.createElement(kTestCaseElement);
-            child.setAttribute(kName, testCase.name);
-            child.setAttribute(kResult, kUnexecuted);
-            element.appendChild(child);
+            XmlNode &child = element.AppendElement(kTestCaseElement);
+            child.SetAttribute(kName, testCase.name);
+            child.SetAttribute(kResult, kUnexecuted);
         }
-        m_root.appendChild(element);
     }
 }
 
-QSharedPointer<ProcessedResults::Module> ProcessedResults::IndexModule(const QDomElement &element)
+QSharedPointer<ProcessedResults::Module> ProcessedResults::IndexModule(XmlNode *element)
 {
     QSharedPointer<Module> module(new Module);
     module->element = element;
@@ -183,14 +188,14 @@ QSharedPointer<ProcessedResults::Module> ProcessedResults::IndexModule(const QDo
 void ProcessedResults::BuildIndex()
 {
     m_index.clear();
-    for (QDomElement element = m_root.firstChildElement(); !element.isNull();
-         element = element.nextSiblingElement()) {
-        if (!IsElement(element, kModuleElement) || !element.hasAttribute(kName)
-            || !element.hasAttribute(kIdHash)) {
+    for (const auto &child : m_root->Children()) {
+        XmlNode *element = child.get();
+        if (!element->IsElement() || !IsElement(*element, kModuleElement)
+            || !element->HasAttribute(kName) || !element->HasAttribute(kIdHash)) {
             continue;
         }
-        const QString hash = element.attribute(kIdHash);
-        const QString key = (hash.isEmpty() ? element.attribute(kName) : hash).toLower();
+        const QString hash = element->Attribute(kIdHash);
+        const QString key = (hash.isEmpty() ? element->Attribute(kName) : hash).toLower();
         m_index.insert(key, IndexModule(element));
     }
 }
@@ -199,10 +204,10 @@ void ProcessedResults::IndexCases(Module &module)
 {
     if (module.casesIndexed)
         return;
-    for (QDomElement child = module.element.firstChildElement(); !child.isNull();
-         child = child.nextSiblingElement()) {
-        if (IsElement(child, kTestCaseElement))
-            module.AddCase(child);
+    module.cases.reserve(qsizetype(module.element->Children().size()));
+    for (const auto &child : module.element->Children()) {
+        if (child->IsElement() && IsElement(*child, kTestCaseElement))
+            module.AddCase(child.get());
     }
     module.casesIndexed = true;
 }
@@ -211,19 +216,27 @@ void ProcessedResults::Record(const QString &idHash, const QString &moduleName,
                               const QString &family, const QString &subFamily,
                               const QString &testCase, const QString &result)
 {
-    QSharedPointer<Module> module = m_index.value(idHash.toLower());
+    // The verdicts of one module come one after the other.
+    Module *module = nullptr;
+    if (m_last && idHash == m_lastIdHash && moduleName == m_lastName)
+        module = m_last;
     if (!module)
-        module = m_index.value(moduleName.toLower());
+        module = m_index.value(idHash.toLower()).data();
+    if (!module)
+        module = m_index.value(moduleName.toLower()).data();
     if (!module) {
-        QDomElement element = m_document.createElement(kModuleElement);
-        element.setAttribute(kName, moduleName);
-        element.setAttribute(kFamily, family);
-        element.setAttribute(kSubFamily, subFamily);
-        element.setAttribute(kIdHash, idHash);
-        m_root.appendChild(element);
-        module = IndexModule(element);
-        m_index.insert(idHash.toLower(), module);
+        XmlNode &element = m_root->AppendElement(kModuleElement);
+        element.SetAttribute(kName, moduleName);
+        element.SetAttribute(kFamily, family);
+        element.SetAttribute(kSubFamily, subFamily);
+        element.SetAttribute(kIdHash, idHash);
+        const QSharedPointer<Module> added = IndexModule(&element);
+        m_index.insert(idHash.toLower(), added);
+        module = added.data();
     }
+    m_last = module;
+    m_lastIdHash = idHash;
+    m_lastName = moduleName;
     IndexCases(*module);
 
     // The first child in document order whose name is the reported name, or
@@ -247,20 +260,19 @@ void ProcessedResults::Record(const QString &idHash, const QString &moduleName,
     }
 
     if (!match) {
-        QDomElement element = m_document.createElement(kTestCaseElement);
-        element.setAttribute(kName, testCase);
-        element.setAttribute(kResult, result);
-        module->element.appendChild(element);
-        module->AddCase(element);
+        XmlNode &element = module->element->AppendElement(kTestCaseElement);
+        element.SetAttribute(kName, testCase);
+        element.SetAttribute(kResult, result);
+        module->AddCase(&element);
     } else {
-        QDomElement element = match->element;
+        XmlNode *element = match->element;
         if (matchedName != testCase) {
-            element.setAttribute(kName, testCase);
-            module->element.appendChild(element);
+            element->SetAttribute(kName, testCase);
+            module->element->MoveToEnd(element);
             module->RemoveCase(matchedName, element);
             module->AddCase(element);
         }
-        element.setAttribute(kResult, Precedence(element.attribute(kResult), result));
+        element->SetAttribute(kResult, Precedence(element->Attribute(kResult), result));
     }
     m_modified = true;
 }
@@ -299,7 +311,7 @@ bool ProcessedResults::Save()
     const QString folder = QFileInfo(m_path).absolutePath();
     QString error;
     if (!QDir().mkpath(folder)
-        || !XmlWriter::WriteDocument(m_document, m_path, 1, true, &error)) {
+        || !XmlWriter::WriteDocument(*m_root, m_path, 1, true, &error)) {
         LogMessage(QStringLiteral("Processed results file %1 could not be written. %2\n")
                        .arg(m_path, error));
         return false;

@@ -2,15 +2,16 @@
 
 #include "common/export.h"
 
-#include <QDomDocument>
-#include <QDomElement>
 #include <QHash>
 #include <QList>
 #include <QSharedPointer>
 #include <QString>
 
+#include <memory>
+
 class Log;
 class Manifest;
+class XmlNode;
 
 // The processed-results file of one handset: every module of the kit and
 // platform catalogues with the verdict of each of its test cases, kept
@@ -60,7 +61,8 @@ public:
 
     QString Path() const { return m_path; }
     bool IsModified() const { return m_modified; }
-    const QDomDocument &Document() const { return m_document; }
+    // The root element of the document once Open has run, else null.
+    const XmlNode *Root() const { return m_root.get(); }
 
     // Set by a caller that defers saving to a later point.
     bool savePending = false;
@@ -71,16 +73,19 @@ private:
     void Rebuild(Manifest *kit, Manifest *platform);
     void AddCatalogue(Manifest *catalogue, const QString &source);
     void BuildIndex();
-    QSharedPointer<Module> IndexModule(const QDomElement &element);
+    QSharedPointer<Module> IndexModule(XmlNode *element);
     void IndexCases(Module &module);
     bool KeepDamagedFile();
     void LogMessage(const QString &message);
 
     QString m_path;
     Log *m_logger = nullptr;
-    QDomDocument m_document;
-    QDomElement m_root;
+    std::unique_ptr<XmlNode> m_root;
     QHash<QString, QSharedPointer<Module>> m_index;
+    // The module of the last verdict recorded, and what it was asked by.
+    Module *m_last = nullptr;
+    QString m_lastIdHash;
+    QString m_lastName;
     bool m_modified = false;
     // The file on disk could not be read as a results file.
     bool m_damaged = false;

@@ -398,3 +398,58 @@ TEST(ProcessedResultsDocument, WithoutAKitCatalogueVerdictsAccumulate)
 }
 
 } // namespace
+
+namespace {
+
+TEST(ProcessedResultsDocument, WhatTheFileHoldsBesideVerdictsIsKept)
+{
+    // Notes a user added by hand, in any form XML has, survive the rewrite.
+    QTemporaryDir dir;
+    const QString path = dir.filePath(QStringLiteral("r.xml"));
+    WriteFile(path, "<testmodules kvkHash=\"\" platformHash=\"\">\n"
+                    " <!-- checked by hand -->\n"
+                    " <module id_hash=\"#1\" name=\"M\" note=\"caf\xC3\xA9 &amp; more\">\n"
+                    "  <?review done?>\n"
+                    "  <testcase name=\"t\" result=\"fail\"><![CDATA[<see bug 12>]]></testcase>\n"
+                    " </module>\n"
+                    "</testmodules>\n");
+    ProcessedResults results;
+    results.Open(path, nullptr, nullptr, nullptr);
+    results.Record(QStringLiteral("#1"), QStringLiteral("M"), QString(), QString(),
+                   QStringLiteral("t"), QStringLiteral("pass"));
+    ASSERT_TRUE(results.Save());
+    EXPECT_EQ(ReadFile(path),
+              QByteArray("<testmodules kvkHash=\"\" platformHash=\"\">\n"
+                         " <!-- checked by hand -->\n"
+                         " <module id_hash=\"#1\" name=\"M\" note=\"caf\xC3\xA9 &amp; more\">\n"
+                         "  <?review done?>\n"
+                         "  <testcase name=\"t\" result=\"pass\"><![CDATA[<see bug 12>]]></testcase>\n"
+                         " </module>\n"
+                         "</testmodules>\n"));
+}
+
+TEST(ProcessedResultsDocument, FileNestedBeyondAnyResultsFileIsKeptAside)
+{
+    // Written back with its indentation, a file nested a hundred thousand
+    // levels deep would need tens of gigabytes.
+    QTemporaryDir dir;
+    const QString path = dir.filePath(QStringLiteral("r.xml"));
+    QByteArray deep = "<testmodules kvkHash=\"\" platformHash=\"\">";
+    for (int i = 0; i < 100000; ++i)
+        deep += "<m>";
+    for (int i = 0; i < 100000; ++i)
+        deep += "</m>";
+    deep += "</testmodules>";
+    WriteFile(path, deep);
+    ProcessedResults results;
+    results.Open(path, nullptr, nullptr, nullptr);
+    results.Record(QStringLiteral("#1"), QStringLiteral("M"), QString(), QString(),
+                   QStringLiteral("t"), QStringLiteral("pass"));
+    ASSERT_TRUE(results.Save());
+    const QStringList aside = QDir(dir.path()).entryList({QStringLiteral("r.xml.unreadable-*")}, QDir::Files);
+    ASSERT_EQ(aside.size(), 1);
+    EXPECT_EQ(ReadFile(dir.filePath(aside.first())), deep);
+    EXPECT_EQ(ReadResults(path).verdicts.value(QStringLiteral("M/t")), QStringLiteral("pass"));
+}
+
+} // namespace
