@@ -26,6 +26,8 @@ QString KitFor(benchmark::State &state)
     const QString kit = benchkits::Kit(int(state.range(0)), &error);
     if (kit.isEmpty())
         state.SkipWithError(error.toStdString().c_str());
+    else
+        benchutil::ReadTree(kit); // into the page cache, for the first iteration too
     return kit;
 }
 

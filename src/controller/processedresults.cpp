@@ -10,7 +10,9 @@
 #include <QDir>
 #include <QFile>
 #include <QFileInfo>
-#include <QVarLengthArray>
+
+#include <algorithm>
+#include <vector>
 
 namespace {
 
@@ -48,44 +50,102 @@ QString RootHashOf(Manifest *catalogue)
 
 } // namespace
 
-// One "module" element with the index of its test cases: for every name,
-// the "testcase" elements of that name in the order of the module's
-// children (a sequence number tells their order apart across names).
+// One "module" element with the index of its test cases: every
+// "testcase" element under its name, with a sequence number that follows
+// the module's children (an element moved to the end takes a new one).
+//
+// The index is a vector sorted by name, then sequence, so the first case of
+// a name is found by binary search and indexing a module of the file is one
+// allocation and one sort. Cases added afterwards wait in a short unsorted
+// tail that is merged in as it grows.
 struct ProcessedResults::Module
 {
     struct Case
     {
+        QString name;
         XmlNode *element = nullptr;
         quint64 order = 0;
+
+        bool operator<(const Case &other) const
+        {
+            const int byName = name.compare(other.name);
+            return byName != 0 ? byName < 0 : order < other.order;
+        }
     };
 
     XmlNode *element = nullptr;
     bool casesIndexed = false;
     quint64 nextOrder = 0;
-    // A name is almost always held by one case: it is kept in place.
-    using Cases = QVarLengthArray<Case, 1>;
-    QHash<QString, Cases> cases;
+    std::vector<Case> sorted;
+    std::vector<Case> tail;
+
+    void Build()
+    {
+        sorted.reserve(element->Children().size());
+        for (const auto &child : element->Children()) {
+            if (child->IsElement() && IsElement(*child, kTestCaseElement))
+                sorted.push_back(Case{child->Attribute(kName), child.get(), nextOrder++});
+        }
+        std::sort(sorted.begin(), sorted.end());
+        casesIndexed = true;
+    }
+
+    // The cases of the sorted part named name (removed ones included).
+    std::pair<std::vector<Case>::iterator, std::vector<Case>::iterator> Named(const QString &name)
+    {
+        const auto begin = std::lower_bound(sorted.begin(), sorted.end(), name,
+                                            [](const Case &c, const QString &n) { return c.name < n; });
+        auto end = begin;
+        while (end != sorted.end() && end->name == name)
+            ++end;
+        return {begin, end};
+    }
+
+    // The case named name that comes first in the module, or null.
+    const Case *First(const QString &name)
+    {
+        const Case *first = nullptr;
+        const auto [begin, end] = Named(name);
+        for (auto it = begin; it != end && !first; ++it) {
+            if (it->element)
+                first = &*it;
+        }
+        for (const Case &c : tail) {
+            if (c.name == name && (!first || c.order < first->order))
+                first = &c;
+        }
+        return first;
+    }
 
     void AddCase(XmlNode *testCase)
     {
-        cases[testCase->Attribute(kName)].append(Case{testCase, nextOrder++});
+        tail.push_back(Case{testCase->Attribute(kName), testCase, nextOrder++});
+        if (tail.size() < kTailSize)
+            return;
+        std::sort(tail.begin(), tail.end());
+        const size_t middle = sorted.size();
+        sorted.insert(sorted.end(), std::make_move_iterator(tail.begin()), std::make_move_iterator(tail.end()));
+        std::inplace_merge(sorted.begin(), sorted.begin() + qsizetype(middle), sorted.end());
+        tail.clear();
     }
 
+    // A case leaves the sorted part as a blank entry, so that no rename
+    // moves the rest of the index.
     void RemoveCase(const QString &name, const XmlNode *testCase)
     {
-        auto found = cases.find(name);
-        if (found == cases.end())
+        const auto same = [testCase](const Case &c) { return c.element == testCase; };
+        const auto inTail = std::find_if(tail.begin(), tail.end(), same);
+        if (inTail != tail.end()) {
+            tail.erase(inTail);
             return;
-        Cases &list = found.value();
-        for (qsizetype i = 0; i < list.size(); ++i) {
-            if (list.at(i).element == testCase) {
-                list.remove(i);
-                break;
-            }
         }
-        if (list.isEmpty())
-            cases.erase(found);
+        const auto [begin, end] = Named(name);
+        const auto inSorted = std::find_if(begin, end, same);
+        if (inSorted != end)
+            inSorted->element = nullptr;
     }
+
+    static constexpr size_t kTailSize = 32;
 };
 
 ProcessedResults::ProcessedResults() = default;
@@ -202,14 +262,8 @@ void ProcessedResults::BuildIndex()
 
 void ProcessedResults::IndexCases(Module &module)
 {
-    if (module.casesIndexed)
-        return;
-    module.cases.reserve(qsizetype(module.element->Children().size()));
-    for (const auto &child : module.element->Children()) {
-        if (child->IsElement() && IsElement(*child, kTestCaseElement))
-            module.AddCase(child.get());
-    }
-    module.casesIndexed = true;
+    if (!module.casesIndexed)
+        module.Build();
 }
 
 void ProcessedResults::Record(const QString &idHash, const QString &moduleName,
@@ -244,12 +298,9 @@ void ProcessedResults::Record(const QString &idHash, const QString &moduleName,
     const Module::Case *match = nullptr;
     QString matchedName;
     auto consider = [&](const QString &name) {
-        const auto found = module->cases.constFind(name);
-        if (found == module->cases.constEnd() || found->isEmpty())
-            return;
-        const Module::Case &first = found->first();
-        if (!match || first.order < match->order) {
-            match = &first;
+        const Module::Case *first = module->First(name);
+        if (first && (!match || first->order < match->order)) {
+            match = first;
             matchedName = name;
         }
     };

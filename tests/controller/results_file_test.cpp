@@ -2,6 +2,7 @@
 
 #include "controller/processedresults.h"
 
+#include <QRandomGenerator>
 #include <QDir>
 
 namespace {
@@ -450,6 +451,73 @@ TEST(ProcessedResultsDocument, FileNestedBeyondAnyResultsFileIsKeptAside)
     ASSERT_EQ(aside.size(), 1);
     EXPECT_EQ(ReadFile(dir.filePath(aside.first())), deep);
     EXPECT_EQ(ReadResults(path).verdicts.value(QStringLiteral("M/t")), QStringLiteral("pass"));
+}
+
+} // namespace
+
+namespace {
+
+TEST(ProcessedResultsDocument, LongRunsOfRenamesAndNewCasesMatchTheRules)
+{
+    // Verdicts at random against the rules applied to a plain list: the
+    // first case in the module named as reported, or as reported without a
+    // ".1" or "_1" ending, takes the verdict (renamed and moved last when
+    // the names differ); no match appends a case.
+    QTemporaryDir dir;
+    const QString path = dir.filePath(QStringLiteral("r.xml"));
+    QRandomGenerator random(7);
+    const QStringList verdicts{QStringLiteral("pass"), QStringLiteral("fail"), QStringLiteral("unsupported"),
+                               QStringLiteral("unexecuted")};
+    QList<QPair<QString, QString>> model;
+    QByteArray file = "<testmodules kvkHash=\"\" platformHash=\"\"><module id_hash=\"#1\" name=\"M\">";
+    for (int i = 0; i < 300; ++i) {
+        const QString name = QStringLiteral("c%1").arg(random.bounded(200));
+        model.append({name, QStringLiteral("unexecuted")});
+        file += "<testcase name=\"" + name.toUtf8() + "\" result=\"unexecuted\"/>";
+    }
+    file += "</module></testmodules>";
+    WriteFile(path, file);
+
+    ProcessedResults results;
+    results.Open(path, nullptr, nullptr, nullptr);
+    const QStringList endings{QString(), QStringLiteral(".1"), QStringLiteral("_1")};
+    for (int step = 0; step < 3000; ++step) {
+        const QString reported = QStringLiteral("c%1").arg(random.bounded(260))
+                                 + endings.at(random.bounded(int(endings.size())));
+        const QString verdict = verdicts.at(random.bounded(int(verdicts.size())));
+        results.Record(QStringLiteral("#1"), QStringLiteral("M"), QString(), QString(), reported, verdict);
+
+        qsizetype match = -1;
+        for (qsizetype i = 0; i < model.size() && match < 0; ++i) {
+            const QString &stored = model.at(i).first;
+            if (stored == reported
+                || ((reported.endsWith(QLatin1String(".1")) || reported.endsWith(QLatin1String("_1")))
+                    && stored == reported.chopped(2)))
+                match = i;
+        }
+        if (match < 0) {
+            model.append({reported, verdict});
+            continue;
+        }
+        QPair<QString, QString> found = model.at(match);
+        found.second = ProcessedResults::Precedence(found.second, verdict);
+        if (found.first != reported) {
+            found.first = reported;
+            model.removeAt(match);
+            model.append(found);
+        } else {
+            model[match] = found;
+        }
+    }
+    ASSERT_TRUE(results.Save());
+
+    QDomDocument document;
+    ASSERT_TRUE(document.setContent(ReadFile(path)));
+    QList<QPair<QString, QString>> written;
+    for (QDomElement c = document.documentElement().firstChildElement().firstChildElement(); !c.isNull();
+         c = c.nextSiblingElement())
+        written.append({c.attribute(QStringLiteral("name")), c.attribute(QStringLiteral("result"))});
+    EXPECT_EQ(written, model);
 }
 
 } // namespace
