@@ -4,6 +4,7 @@
 #include <QXmlStreamReader>
 
 #include <algorithm>
+#include <array>
 #include <string_view>
 
 namespace {
@@ -86,17 +87,19 @@ private:
     }
 
     // Names, and short values such as verdicts, repeat from element to
-    // element: the first few of each are made once and shared.
-    static QString Shared(QList<QString> &kept, QStringView text)
+    // element: each is made once and shared while it keeps recurring (a
+    // small table indexed by length and end characters; a new text takes
+    // over its slot).
+    using SharedTexts = std::array<QString, 64>;
+    static QString Shared(SharedTexts &kept, QStringView text)
     {
-        for (const QString &known : kept) {
-            if (known.size() == text.size() && known == text)
-                return known;
-        }
-        QString made = text.toString();
-        if (kept.size() < kSharedKept)
-            kept.append(made);
-        return made;
+        const size_t slot = text.isEmpty()
+            ? 0
+            : (size_t(text.size()) * 7 + text.front().unicode() * 3 + text.back().unicode()) % kept.size();
+        QString &known = kept[slot];
+        if (known.size() != text.size() || known != text)
+            known = text.toString();
+        return known;
     }
 
     // A quoted pseudo-attribute of the declaration: name, '=', its value.
@@ -455,13 +458,12 @@ private:
         return root;
     }
 
-    static constexpr qsizetype kSharedKept = 32;
     static constexpr qsizetype kSharedValueSize = 12;
 
     const char16_t *m_at;
     const char16_t *m_end;
-    QList<QString> m_names;
-    QList<QString> m_values;
+    SharedTexts m_names;
+    SharedTexts m_values;
     // The attributes of the start tag being read.
     XmlNode::AttributeList m_attributes;
 };
