@@ -371,7 +371,7 @@ private:
                 empty = *m_at == '/';
                 m_at += empty ? 2 : 1;
                 if (!m_attributes.isEmpty())
-                    element.SetAttributes(m_attributes);
+                    element.SetAttributes(std::move(m_attributes));
                 return true;
             }
             if (!spaced || !ReadName(name))
@@ -388,7 +388,7 @@ private:
                 if (attribute.first == name)
                     return false;
             }
-            m_attributes.append({name, value});
+            m_attributes.append({std::move(name), std::move(value)});
         }
     }
 
@@ -407,13 +407,21 @@ private:
         std::vector<XmlNode *> open{root.get()};
         QString text;
         while (!open.empty()) {
-            text.clear();
-            if (!ReadText(text) || m_at >= m_end)
+            // As the DOM reads it: a run of blanks is no content. Most runs
+            // between elements are blanks, and are passed over at once.
+            const char16_t *run = m_at;
+            SkipSpaces();
+            if (m_at >= m_end)
                 return nullptr;
             XmlNode &parent = *open.back();
-            // As the DOM reads it: a run of blanks is no content.
-            if (!text.trimmed().isEmpty())
-                parent.AppendText(text);
+            if (*m_at != '<') {
+                m_at = run;
+                text.clear();
+                if (!ReadText(text) || m_at >= m_end)
+                    return nullptr;
+                if (!text.trimmed().isEmpty())
+                    parent.AppendText(text);
+            }
             if (Starts(u"</")) {
                 m_at += 2;
                 if (!ReadName(name) || name != parent.Name())

@@ -69,6 +69,7 @@ public:
     const AttributeList &Attributes() const { return m_attributes; }
     // Replaces every attribute; the names must differ from each other.
     void SetAttributes(const AttributeList &attributes) { m_attributes = attributes; }
+    void SetAttributes(AttributeList &&attributes) { m_attributes = std::move(attributes); }
 
     bool HasChildNodes() const { return !m_children.empty(); }
     const std::vector<std::unique_ptr<XmlNode>> &Children() const { return m_children; }

@@ -309,17 +309,19 @@ private:
     void AppendAttributes(const XmlNode &element)
     {
         const XmlNode::AttributeList &attributes = element.Attributes();
+        const auto byName = [](const auto *a, const auto *b) { return a->first < b->first; };
         QVarLengthArray<const QPair<QString, QString> *, 16> sorted;
         for (const auto &attribute : attributes)
             sorted.append(&attribute);
-        std::sort(sorted.begin(), sorted.end(),
-                  [](const auto *a, const auto *b) { return a->first < b->first; });
+        // A tree read from a file this writer wrote is in order already.
+        if (!std::is_sorted(sorted.begin(), sorted.end(), byName))
+            std::sort(sorted.begin(), sorted.end(), byName);
         for (const auto *attribute : sorted) {
-            m_out += QLatin1Char(' ');
+            m_out += QChar(u' ');
             m_out += attribute->first;
-            m_out += QLatin1String("=\"");
+            m_out.append(reinterpret_cast<const QChar *>(u"=\""), 2);
             AppendEscaped(m_out, attribute->second, true, m_ascii);
-            m_out += QLatin1Char('"');
+            m_out += QChar(u'"');
         }
     }
 

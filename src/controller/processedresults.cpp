@@ -12,6 +12,7 @@
 #include <QFileInfo>
 
 #include <algorithm>
+#include <string>
 #include <vector>
 
 namespace {
@@ -68,10 +69,23 @@ struct ProcessedResults::Module
 
         bool operator<(const Case &other) const
         {
-            const int byName = name.compare(other.name);
-            return byName != 0 ? byName < 0 : order < other.order;
+            if (NameBefore(name, other.name))
+                return true;
+            return !NameBefore(other.name, name) && order < other.order;
         }
     };
+
+    // Any strict order groups equal names; length first, then the UTF-16
+    // units, is the cheapest.
+    static bool NameBefore(const QString &a, const QString &b)
+    {
+        if (a.size() != b.size())
+            return a.size() < b.size();
+        return std::char_traits<char16_t>::compare(reinterpret_cast<const char16_t *>(a.constData()),
+                                                   reinterpret_cast<const char16_t *>(b.constData()),
+                                                   size_t(a.size()))
+            < 0;
+    }
 
     XmlNode *element = nullptr;
     bool casesIndexed = false;
@@ -94,7 +108,7 @@ struct ProcessedResults::Module
     std::pair<std::vector<Case>::iterator, std::vector<Case>::iterator> Named(const QString &name)
     {
         const auto begin = std::lower_bound(sorted.begin(), sorted.end(), name,
-                                            [](const Case &c, const QString &n) { return c.name < n; });
+                                            [](const Case &c, const QString &n) { return NameBefore(c.name, n); });
         auto end = begin;
         while (end != sorted.end() && end->name == name)
             ++end;
@@ -274,7 +288,7 @@ void ProcessedResults::Record(const QString &idHash, const QString &moduleName,
     Module *module = nullptr;
     if (m_last && idHash == m_lastIdHash && moduleName == m_lastName)
         module = m_last;
-    if (!module)
+    else
         module = m_index.value(idHash.toLower()).data();
     if (!module)
         module = m_index.value(moduleName.toLower()).data();
@@ -288,9 +302,11 @@ void ProcessedResults::Record(const QString &idHash, const QString &moduleName,
         m_index.insert(idHash.toLower(), added);
         module = added.data();
     }
-    m_last = module;
-    m_lastIdHash = idHash;
-    m_lastName = moduleName;
+    if (module != m_last) {
+        m_last = module;
+        m_lastIdHash = idHash;
+        m_lastName = moduleName;
+    }
     IndexCases(*module);
 
     // The first child in document order whose name is the reported name, or
