@@ -3,11 +3,13 @@
 #include "resources/blockreader.h"
 
 #include <QFile>
-#include <QHash>
 #include <QSaveFile>
 #include <QtEndian>
 
 #include <cstring>
+#include <functional>
+#include <string_view>
+#include <vector>
 
 namespace {
 
@@ -177,18 +179,34 @@ bool ResourceStream::ProcessStructures()
     _offsetTable.reserve(pairs + 1);
 
     // The pairs in type, then ID order. The first equal block already
-    // collected is shared; the hash finds it without scanning every block.
-    QHash<QByteArray, int> firstIndex;
-    firstIndex.reserve(pairs);
+    // collected is shared; an open-addressed table of (hash, block index)
+    // finds it, eight bytes a slot, so that even 65,535 blocks keep the
+    // table in the processor's cache.
+    struct Slot
+    {
+        quint32 hash = 0;
+        int index = -1;
+    };
+    size_t capacity = 16;
+    while (capacity < size_t(pairs) * 2)
+        capacity *= 2;
+    std::vector<Slot> seen(capacity);
+    const size_t mask = capacity - 1;
     quint64 end = 0;
     for (auto type = m_table.constBegin(); type != m_table.constEnd(); ++type) {
         for (auto id = type->constBegin(); id != type->constEnd(); ++id) {
             const QByteArray &data = id.value();
-            int index = firstIndex.value(data, -1);
+            const size_t hash =
+                std::hash<std::string_view>()(std::string_view(data.constData(), size_t(data.size())));
+            size_t at = hash & mask;
+            while (seen[at].index >= 0
+                   && (seen[at].hash != quint32(hash) || _resources.at(seen[at].index) != data))
+                at = (at + 1) & mask;
+            int index = seen[at].index;
             if (index < 0) {
                 index = int(_resources.size());
+                seen[at] = Slot{quint32(hash), index};
                 _resources.append(data);
-                firstIndex.insert(data, index);
                 if (_offsetTable.isEmpty())
                     _offsetTable.append(0);
                 end += quint64(data.size());
