@@ -136,6 +136,15 @@ TEST_F(DemoRun, SetupFailuresAreUsageErrors)
     EXPECT_EQ(nothing.status, 2);
     EXPECT_TRUE(nothing.err.contains("no test module selected")) << nothing.err.constData();
 
+    // No handset attached at all: nothing to share the modules among.
+    const QProcessEnvironment demoEnv = env;
+    env.insert(QStringLiteral("KESTIX_HANDSETS"), dir.filePath(QStringLiteral("no-handsets")));
+    QDir().mkpath(dir.filePath(QStringLiteral("no-handsets")));
+    const ToolResult noneAttached = Tool({QStringLiteral("run"), QStringLiteral("--all-targets")});
+    EXPECT_EQ(noneAttached.status, 2);
+    EXPECT_TRUE(noneAttached.err.contains("no handset attached")) << noneAttached.err.constData();
+    env = demoEnv;
+
     EXPECT_EQ(Tool({QStringLiteral("run"), QStringLiteral("--copy-delay"), QStringLiteral("soon")}).status, 2);
     EXPECT_EQ(Tool({QStringLiteral("process")}).status, 2);
 
