@@ -18,6 +18,8 @@ constexpr int kMapEntrySize = 8;
 constexpr int kOffsetSize = 4;
 // Map entries, block indexes and IDs are 16-bit in the file.
 constexpr int kMaxEntries = 0xFFFF;
+// No block index reaches it: at most kMaxEntries blocks, numbered from 0.
+constexpr quint16 kFreeSlot = 0xFFFF;
 
 // "%1(0x%2)": decimal, then hexadecimal right-aligned in 8 characters.
 QString Line(const char *format, quint32 value)
@@ -179,13 +181,13 @@ bool ResourceStream::ProcessStructures()
     _offsetTable.reserve(pairs + 1);
 
     // The pairs in type, then ID order. The first equal block already
-    // collected is shared; an open-addressed table of (hash, block index)
-    // finds it, eight bytes a slot, so that even 65,535 blocks keep the
-    // table in the processor's cache.
+    // collected is shared; an open-addressed table finds it. A slot is four
+    // bytes (16 bits of the block's hash and its index, 0xFFFF when free),
+    // so that the table of 65,535 blocks stays in the processor's cache.
     struct Slot
     {
-        quint32 hash = 0;
-        int index = -1;
+        quint16 tag = 0;
+        quint16 index = kFreeSlot;
     };
     size_t capacity = 16;
     while (capacity < size_t(pairs) * 2)
@@ -198,14 +200,15 @@ bool ResourceStream::ProcessStructures()
             const QByteArray &data = id.value();
             const size_t hash =
                 std::hash<std::string_view>()(std::string_view(data.constData(), size_t(data.size())));
+            const quint16 tag = quint16(hash >> 48);
             size_t at = hash & mask;
-            while (seen[at].index >= 0
-                   && (seen[at].hash != quint32(hash) || _resources.at(seen[at].index) != data))
+            while (seen[at].index != kFreeSlot
+                   && (seen[at].tag != tag || _resources.at(seen[at].index) != data))
                 at = (at + 1) & mask;
             int index = seen[at].index;
-            if (index < 0) {
+            if (index == kFreeSlot) {
                 index = int(_resources.size());
-                seen[at] = Slot{quint32(hash), index};
+                seen[at] = Slot{tag, quint16(index)};
                 _resources.append(data);
                 if (_offsetTable.isEmpty())
                     _offsetTable.append(0);
