@@ -82,10 +82,7 @@ public:
     // Reads the module's manifest entry; true when it names the module.
     virtual bool ReadFromManifest(const QDomElement &element);
     // Writes the module's manifest entry (recomputing the ID hash first).
-    // The catalogue cache is written through the light tree; both give the
-    // same entry.
     virtual void WriteToManifest(QDomElement &element);
-    virtual void WriteToManifest(XmlNode &element);
 
     bool selectable = true;
     Log *logger = nullptr;
@@ -136,4 +133,10 @@ protected:
 
 private:
     virtual unsigned int KestoID() = 0;
+
+public:
+    // The same entry as a light tree, as the catalogue cache is written.
+    // Declared after every other virtual operation, so that theirs keep
+    // their places in the table.
+    virtual void WriteToManifest(XmlNode &element);
 };
