@@ -180,10 +180,30 @@ bool ResourceStream::ProcessStructures()
     _resources.reserve(pairs);
     _offsetTable.reserve(pairs + 1);
 
-    // The pairs in type, then ID order. The first equal block already
-    // collected is shared; an open-addressed table finds it. A slot is four
-    // bytes (16 bits of the block's hash and its index, 0xFFFF when free),
-    // so that the table of 65,535 blocks stays in the processor's cache.
+    // The pairs in type, then ID order, each with the hash of its block.
+    struct Pair
+    {
+        quint16 type;
+        quint16 id;
+        const QByteArray *data;
+        size_t hash;
+    };
+    std::vector<Pair> ordered;
+    ordered.reserve(size_t(pairs));
+    for (auto type = m_table.constBegin(); type != m_table.constEnd(); ++type) {
+        for (auto id = type->constBegin(); id != type->constEnd(); ++id) {
+            const QByteArray &data = id.value();
+            ordered.push_back(Pair{type.key(), id.key(), &data,
+                                   std::hash<std::string_view>()(
+                                       std::string_view(data.constData(), size_t(data.size())))});
+        }
+    }
+
+    // The first equal block already collected is shared; an open-addressed
+    // table finds it. A slot is four bytes (16 bits of the block's hash and
+    // its index, 0xFFFF when free), and each slot is fetched a few pairs
+    // ahead: the table is touched at random, and once the blocks no longer
+    // fit in the processor's cache every lookup would wait for memory.
     struct Slot
     {
         quint16 tag = 0;
@@ -194,36 +214,36 @@ bool ResourceStream::ProcessStructures()
         capacity *= 2;
     std::vector<Slot> seen(capacity);
     const size_t mask = capacity - 1;
+    constexpr size_t kAhead = 8;
     quint64 end = 0;
-    for (auto type = m_table.constBegin(); type != m_table.constEnd(); ++type) {
-        for (auto id = type->constBegin(); id != type->constEnd(); ++id) {
-            const QByteArray &data = id.value();
-            const size_t hash =
-                std::hash<std::string_view>()(std::string_view(data.constData(), size_t(data.size())));
-            const quint16 tag = quint16(hash >> 48);
-            size_t at = hash & mask;
-            while (seen[at].index != kFreeSlot
-                   && (seen[at].tag != tag || _resources.at(seen[at].index) != data))
-                at = (at + 1) & mask;
-            int index = seen[at].index;
-            if (index == kFreeSlot) {
-                index = int(_resources.size());
-                seen[at] = Slot{tag, quint16(index)};
-                _resources.append(data);
-                if (_offsetTable.isEmpty())
-                    _offsetTable.append(0);
-                end += quint64(data.size());
-                if (end > 0xFFFFFFFFu)
-                    return false;
-                _offsetTable.append(quint32(end));
-            }
-            FileMapEntry mapEntry;
-            mapEntry.type = type.key();
-            mapEntry.beginningResId = id.key();
-            mapEntry.additionalResId = 0;
-            mapEntry.offsetIndex = quint16(index);
-            _fileMap.append(mapEntry);
+    for (size_t i = 0; i < ordered.size(); ++i) {
+        if (i + kAhead < ordered.size())
+            __builtin_prefetch(&seen[ordered[i + kAhead].hash & mask]);
+        const Pair &pair = ordered[i];
+        const QByteArray &data = *pair.data;
+        const quint16 tag = quint16(pair.hash >> 48);
+        size_t at = pair.hash & mask;
+        while (seen[at].index != kFreeSlot
+               && (seen[at].tag != tag || _resources.at(seen[at].index) != data))
+            at = (at + 1) & mask;
+        int index = seen[at].index;
+        if (index == kFreeSlot) {
+            index = int(_resources.size());
+            seen[at] = Slot{tag, quint16(index)};
+            _resources.append(data);
+            if (_offsetTable.isEmpty())
+                _offsetTable.append(0);
+            end += quint64(data.size());
+            if (end > 0xFFFFFFFFu)
+                return false;
+            _offsetTable.append(quint32(end));
         }
+        FileMapEntry mapEntry;
+        mapEntry.type = pair.type;
+        mapEntry.beginningResId = pair.id;
+        mapEntry.additionalResId = 0;
+        mapEntry.offsetIndex = quint16(index);
+        _fileMap.append(mapEntry);
     }
 
     const quint32 count = quint32(pairs);
