@@ -18,6 +18,7 @@
 #include <QDomDocument>
 #include <QFile>
 #include <QFileInfo>
+#include <QSaveFile>
 
 namespace {
 
@@ -188,15 +189,31 @@ bool Manifest::WriteManifest(const QString &path)
         return false;
     }
 
+    QString destination = path;
+    if (destination.isEmpty()) {
+        destination = cacheFile;
+        // The folder may have gone since construction.
+        QDir().mkpath(cacheDirectory);
+    }
+    const auto fail = [this, &destination](const QString &error) {
+        LogMessage(QStringLiteral("Manifest::WriteManifest could not write %1: %2\n")
+                       .arg(destination, error),
+                   true);
+        return false;
+    };
+    // Written beside the destination and renamed over it once complete.
+    QSaveFile file(destination);
+    if (!file.open(QIODevice::WriteOnly))
+        return fail(file.errorString());
+
     // A catalogue of thousands of modules would make a DOM of hundreds of
-    // megabytes: each module is built as a light tree of its own and written
-    // out before the next one.
-    QDomDocument document;
+    // megabytes: each module is built as a light tree of its own and its
+    // text goes to the file before the next one is built.
     XmlNode root(QStringLiteral("testkit"));
     root.SetAttribute(QStringLiteral("path"), kitPath);
     root.SetAttribute(QStringLiteral("hash"), rootHash);
     root.SetAttribute(QStringLiteral("version"), QString::number(kManifestVersion));
-    XmlWriter::DocumentStream out(1);
+    XmlWriter::DocumentStream out(1, &file);
     out.Open(root);
     out.Open(XmlNode(QStringLiteral("testmodules")));
     for (const QSharedPointer<_TestModule> &module : std::as_const(testModules)) {
@@ -207,6 +224,7 @@ bool Manifest::WriteManifest(const QString &path)
     out.Close();
 
     if (!frameworks.isEmpty()) {
+        QDomDocument document;
         QDomElement list = document.createElement(QStringLiteral("frameworks"));
         for (const QSharedPointer<_Framework> &framework : std::as_const(frameworks)) {
             QDomElement entry = document.createElement(QStringLiteral("framework"));
@@ -216,19 +234,14 @@ bool Manifest::WriteManifest(const QString &path)
         out.Write(list);
     }
 
-    QString destination = path;
-    if (destination.isEmpty()) {
-        destination = cacheFile;
-        // The folder may have gone since construction.
-        QDir().mkpath(cacheDirectory);
+    out.Finish();
+    if (!out.Ok()) {
+        const QString error = file.errorString();
+        file.cancelWriting();
+        return fail(error);
     }
-    QString error;
-    if (!XmlWriter::WriteFile(destination, out.Finish(), true, &error)) {
-        LogMessage(QStringLiteral("Manifest::WriteManifest could not write %1: %2\n")
-                       .arg(destination, error),
-                   true);
-        return false;
-    }
+    if (!file.commit())
+        return fail(file.errorString());
     return true;
 }
 

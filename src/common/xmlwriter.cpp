@@ -4,6 +4,7 @@
 
 #include <QDomNamedNodeMap>
 #include <QFile>
+#include <QIODevice>
 #include <QSaveFile>
 #include <QVarLengthArray>
 
@@ -521,8 +522,10 @@ private:
 
 struct DocumentStream::Private
 {
-    Private(int indent) : writer(indent, false) {}
+    Private(int indent, QIODevice *output) : writer(indent, false), device(output) {}
     Writer writer;
+    QIODevice *device;
+    bool failed = false;
     // The elements opened and not yet closed, and whether each has received
     // a child (until then its start tag is left open for "/>").
     QList<QString> open;
@@ -537,9 +540,27 @@ struct DocumentStream::Private
             startTagOpen = false;
         }
     }
+
+    // Passes the text written so far on to the device once there is enough
+    // of it (all of it with force). The start tag left open for "/>" stays.
+    void Drain(bool force)
+    {
+        QString &out = writer.Out();
+        if (!device || (!force && out.size() < kDrainSize))
+            return;
+        const QByteArray bytes = out.toUtf8();
+        out.resize(0);
+        if (!failed && device->write(bytes) != bytes.size())
+            failed = true;
+    }
+
+    static constexpr qsizetype kDrainSize = 32 * 1024;
 };
 
-DocumentStream::DocumentStream(int indent) : d(new Private(indent < 0 ? 0 : indent)) {}
+DocumentStream::DocumentStream(int indent, QIODevice *device)
+    : d(new Private(indent < 0 ? 0 : indent, device))
+{
+}
 
 DocumentStream::~DocumentStream() = default;
 
@@ -563,12 +584,14 @@ void DocumentStream::Write(const QDomElement &element)
 {
     d->BeginContent();
     d->writer.Save(element, int(d->open.size()));
+    d->Drain(false);
 }
 
 void DocumentStream::Write(const XmlNode &element)
 {
     d->BeginContent();
     d->writer.Save(element, int(d->open.size()), nullptr, nullptr);
+    d->Drain(false);
 }
 
 void DocumentStream::Close()
@@ -592,9 +615,18 @@ QByteArray DocumentStream::Finish()
 {
     while (!d->open.isEmpty())
         Close();
+    if (d->device) {
+        d->Drain(true);
+        return QByteArray();
+    }
     const QByteArray bytes = d->writer.Out().toUtf8();
     d->writer.Out().clear();
     return bytes;
+}
+
+bool DocumentStream::Ok() const
+{
+    return !d->failed;
 }
 
 QString ToString(const QDomNode &node, int indent)

@@ -8,6 +8,7 @@
 
 #include <memory>
 
+class QIODevice;
 class XmlNode;
 
 // Serialises DOM documents the same way in every process. Qt keeps
@@ -57,10 +58,15 @@ HARNESS_EXPORT bool WriteDocument(const XmlNode &root, const QString &path, int 
 //   out.Write(module);           // a whole element, one level deeper
 //   out.Close();                 // "</testkit>", or "/>" when nothing was written inside
 //   XmlWriter::WriteFile(path, out.Finish());
+//
+// Given a device, the stream passes its text on to it as it goes (UTF-8, in
+// pieces of some tens of kilobytes), so the document is never held whole;
+// Finish then writes the rest and returns nothing, and Ok tells whether
+// every write succeeded.
 class HARNESS_EXPORT DocumentStream
 {
 public:
-    explicit DocumentStream(int indent = 1);
+    explicit DocumentStream(int indent = 1, QIODevice *device = nullptr);
     ~DocumentStream();
     DocumentStream(const DocumentStream &) = delete;
     DocumentStream &operator=(const DocumentStream &) = delete;
@@ -73,9 +79,11 @@ public:
     void Write(const XmlNode &element);
     // Ends the innermost open element.
     void Close();
-    // Ends every open element and returns the UTF-8 text; the stream is
-    // empty afterwards.
+    // Ends every open element and returns the UTF-8 text (what is left of
+    // it with a device); the stream is empty afterwards.
     QByteArray Finish();
+    // False once writing to the device failed.
+    bool Ok() const;
 
 private:
     struct Private;

@@ -1,7 +1,9 @@
+#include "common/xmlnode.h"
 #include "common/xmlwriter.h"
 
 #include "support/testutil.h"
 
+#include <QBuffer>
 #include <QDir>
 #include <QFile>
 #include <QProcess>
@@ -209,3 +211,44 @@ TEST(XmlWriterStream, PiecesGiveTheBytesOfTheWholeDocument)
     EXPECT_EQ(QString::fromUtf8(out.Finish()), XmlWriter::ToString(whole));
     EXPECT_TRUE(out.Finish().isEmpty());
 }
+
+namespace {
+
+TEST(XmlWriterStream, ADeviceReceivesTheSameBytesPieceByPiece)
+{
+    // Enough text to be passed on in several pieces, with characters whose
+    // UTF-8 takes more than one byte.
+    const auto write = [](XmlWriter::DocumentStream &out) {
+        XmlNode root(QStringLiteral("kit"));
+        root.SetAttribute(QStringLiteral("name"), QStringLiteral("caf\u00e9"));
+        out.Open(root);
+        for (int i = 0; i < 3000; ++i) {
+            XmlNode module(QStringLiteral("module"));
+            module.SetAttribute(QStringLiteral("n"), QString::number(i));
+            module.AppendElement(QStringLiteral("case")).SetAttribute(QStringLiteral("name"), QStringLiteral("\u65e5%1").arg(i));
+            out.Write(module);
+        }
+    };
+    XmlWriter::DocumentStream whole;
+    write(whole);
+    const QByteArray expected = whole.Finish();
+    ASSERT_GT(expected.size(), 150000);
+
+    QBuffer buffer;
+    ASSERT_TRUE(buffer.open(QIODevice::WriteOnly));
+    XmlWriter::DocumentStream streamed(1, &buffer);
+    write(streamed);
+    EXPECT_TRUE(streamed.Finish().isEmpty());
+    EXPECT_TRUE(streamed.Ok());
+    EXPECT_EQ(buffer.data(), expected);
+
+    // A device that takes nothing is reported.
+    QBuffer closed;
+    ASSERT_TRUE(closed.open(QIODevice::ReadOnly));
+    XmlWriter::DocumentStream refused(1, &closed);
+    write(refused);
+    refused.Finish();
+    EXPECT_FALSE(refused.Ok());
+}
+
+} // namespace
