@@ -200,20 +200,21 @@ public:
                 SaveLeaf(item, level, before, after);
                 return;
             }
-            Indent(before, level);
-            m_out += QLatin1Char('<');
-            m_out += item.Name();
-            AppendAttributes(item);
             const auto &children = item.Children();
-            if (children.empty()) {
-                m_out += QLatin1String("/>");
-                LineEnd(after);
-                return;
+            const bool empty = children.empty();
+            const int spaces = IsTextNode(before) ? 0 : level * m_indent;
+            const bool lineEnd = empty ? !IsTextNode(after) : !children.front()->IsTextLike();
+            if (!AppendPlainStartTag(item, spaces, empty, lineEnd)) {
+                AppendSpaces(spaces);
+                m_out += QLatin1Char('<');
+                m_out += item.Name();
+                AppendAttributes(item);
+                m_out += empty ? QLatin1String("/>") : QLatin1String(">");
+                if (lineEnd)
+                    m_out += QLatin1Char('\n');
             }
-            m_out += QLatin1Char('>');
-            if (!children.front()->IsTextLike())
-                m_out += QLatin1Char('\n');
-            open.push_back({&item, 0, level, after});
+            if (!empty)
+                open.push_back({&item, 0, level, after});
         };
         begin(node, depth, previous, next);
         while (!open.empty()) {
@@ -225,12 +226,19 @@ public:
                       i + 1 < children.size() ? children[i + 1].get() : nullptr);
                 continue;
             }
-            if (!children.back()->IsTextLike())
-                AppendSpaces(top.depth * m_indent);
-            m_out += QLatin1String("</");
-            m_out += top.element->Name();
-            m_out += QLatin1Char('>');
-            LineEnd(top.next);
+            // "</name>", indented and followed by a line end as its
+            // neighbours ask, written in one piece.
+            const int spaces = children.back()->IsTextLike() ? 0 : top.depth * m_indent;
+            const bool lineEnd = !IsTextNode(top.next);
+            const QString &name = top.element->Name();
+            QChar *at = Extend(spaces + 3 + name.size() + (lineEnd ? 1 : 0));
+            at = std::fill_n(at, spaces, QChar(u' '));
+            *at++ = QChar(u'<');
+            *at++ = QChar(u'/');
+            at = std::copy_n(name.constData(), name.size(), at);
+            *at++ = QChar(u'>');
+            if (lineEnd)
+                *at = QChar(u'\n');
             open.pop_back();
         }
     }
@@ -307,17 +315,66 @@ private:
             m_out += QLatin1Char('\n');
     }
 
-    void AppendAttributes(const XmlNode &element)
+    using SortedAttributes = QVarLengthArray<const QPair<QString, QString> *, 16>;
+
+    static SortedAttributes AttributesByName(const XmlNode &element)
     {
-        const XmlNode::AttributeList &attributes = element.Attributes();
         const auto byName = [](const auto *a, const auto *b) { return a->first < b->first; };
-        QVarLengthArray<const QPair<QString, QString> *, 16> sorted;
-        for (const auto &attribute : attributes)
+        SortedAttributes sorted;
+        for (const auto &attribute : element.Attributes())
             sorted.append(&attribute);
         // A tree read from a file this writer wrote is in order already.
         if (!std::is_sorted(sorted.begin(), sorted.end(), byName))
             std::sort(sorted.begin(), sorted.end(), byName);
+        return sorted;
+    }
+
+    // Grows the text by size characters and returns where they go.
+    QChar *Extend(qsizetype size)
+    {
+        const qsizetype at = m_out.size();
+        m_out.resize(at + size);
+        return m_out.data() + at;
+    }
+
+    // The start tag of element ("<name a=\"v\">" or "/>"), after spaces blanks
+    // and before an optional line end, in one piece: its length is worked
+    // out first. False, with nothing written, when an attribute value has a
+    // character to escape.
+    bool AppendPlainStartTag(const XmlNode &element, int spaces, bool empty, bool lineEnd)
+    {
+        const SortedAttributes sorted = AttributesByName(element);
+        qsizetype size = spaces + 1 + element.Name().size() + (empty ? 2 : 1) + (lineEnd ? 1 : 0);
         for (const auto *attribute : sorted) {
+            const QString &value = attribute->second;
+            const char16_t *chars = reinterpret_cast<const char16_t *>(value.constData());
+            if (!std::all_of(chars, chars + value.size(), [this](char16_t c) { return IsPlain(c, m_ascii); }))
+                return false;
+            size += attribute->first.size() + value.size() + 4;
+        }
+        QChar *at = Extend(size);
+        at = std::fill_n(at, spaces, QChar(u' '));
+        *at++ = QChar(u'<');
+        at = std::copy_n(element.Name().constData(), element.Name().size(), at);
+        for (const auto *attribute : sorted) {
+            *at++ = QChar(u' ');
+            at = std::copy_n(attribute->first.constData(), attribute->first.size(), at);
+            *at++ = QChar(u'=');
+            *at++ = QChar(u'"');
+            at = std::copy_n(attribute->second.constData(), attribute->second.size(), at);
+            *at++ = QChar(u'"');
+        }
+        if (empty)
+            *at++ = QChar(u'/');
+        *at++ = QChar(u'>');
+        if (lineEnd)
+            *at = QChar(u'\n');
+        return true;
+    }
+
+    void AppendAttributes(const XmlNode &element)
+    {
+        for (const auto *attribute : AttributesByName(element)) {
             m_out += QChar(u' ');
             m_out += attribute->first;
             m_out.append(reinterpret_cast<const QChar *>(u"=\""), 2);
