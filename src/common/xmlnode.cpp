@@ -55,11 +55,6 @@ private:
     {
         return c >= 0x20 ? c < 0xFFFE : (c == '\t' || c == '\n' || c == '\r');
     }
-    static bool IsXmlChar(char32_t c)
-    {
-        return c == 0x9 || c == 0xA || c == 0xD || (c >= 0x20 && c <= 0xD7FF)
-            || (c >= 0xE000 && c <= 0xFFFD) || (c >= 0x10000 && c <= 0x10FFFF);
-    }
 
     bool Starts(std::u16string_view text) const
     {
@@ -274,7 +269,7 @@ private:
                 return false;
             code = code * (hex ? 16 : 10) + char32_t(digit);
         }
-        if (!IsXmlChar(code))
+        if (!XmlNode::IsXmlChar(code))
             return false;
         out += QString::fromUcs4(&code, 1);
         return true;

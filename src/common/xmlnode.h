@@ -49,6 +49,13 @@ public:
     static std::unique_ptr<XmlNode> ParseFully(const QByteArray &bytes, QString *error = nullptr,
                                                int *line = nullptr, int *column = nullptr);
 
+    // Whether XML 1.0 can carry the character at all.
+    static bool IsXmlChar(char32_t c)
+    {
+        return c == 0x9 || c == 0xA || c == 0xD || (c >= 0x20 && c <= 0xD7FF)
+            || (c >= 0xE000 && c <= 0xFFFD) || (c >= 0x10000 && c <= 0x10FFFF);
+    }
+
     Kind NodeKind() const { return m_kind; }
     bool IsElement() const { return m_kind == Element; }
     bool IsTextLike() const { return m_kind == Text || m_kind == CData || m_kind == EntityReference; }

@@ -15,14 +15,6 @@
 namespace XmlWriter {
 namespace {
 
-// Characters XML 1.0 cannot carry at all (most C0 controls, lone surrogates)
-// become U+FFFD so that whatever a log held, the file stays well-formed.
-bool IsXmlChar(char32_t c)
-{
-    return c == 0x9 || c == 0xA || c == 0xD || (c >= 0x20 && c <= 0xD7FF)
-        || (c >= 0xE000 && c <= 0xFFFD) || (c >= 0x10000 && c <= 0x10FFFF);
-}
-
 void AppendCharacterReference(QString &out, char32_t c)
 {
     out += QLatin1String("&#x") + QString::number(static_cast<uint>(c), 16) + QLatin1Char(';');
@@ -90,7 +82,10 @@ void AppendEscaped(QString &out, const QString &text, bool attribute, bool ascii
         default:
             break;
         }
-        const QChar kept = IsXmlChar(c.unicode()) && !c.isSurrogate() ? c : QChar(0xFFFD);
+        // What XML cannot carry at all (most C0 controls, lone surrogates)
+        // becomes U+FFFD, so that whatever a log held, the file stays
+        // well-formed.
+        const QChar kept = XmlNode::IsXmlChar(c.unicode()) && !c.isSurrogate() ? c : QChar(0xFFFD);
         if (ascii && kept.unicode() > 0x7F)
             AppendCharacterReference(out, kept.unicode());
         else
