@@ -12,30 +12,40 @@ QString _CompilerVariant::VariantPath()
     return packagePath.isEmpty() ? binPath : packagePath;
 }
 
-bool _CompilerVariant::ReadFromXML(const QDomElement &element)
+template <class Element>
+bool _CompilerVariant::ReadVariant(const Element &element)
 {
+    using namespace XmlRead;
     files.clear();
-    name = element.attribute(QStringLiteral("name"));
-    variant = element.attribute(QStringLiteral("variant"));
-    binPath = element.attribute(QStringLiteral("binpath"));
-    packagePath = element.attribute(QStringLiteral("packagepath"));
-    arch = IKestoDevice::StringToTarget(element.attribute(QStringLiteral("arch")));
-    build = element.attribute(QStringLiteral("build"));
+    name = Attribute(element, QStringLiteral("name"));
+    variant = Attribute(element, QStringLiteral("variant"));
+    binPath = Attribute(element, QStringLiteral("binpath"));
+    packagePath = Attribute(element, QStringLiteral("packagepath"));
+    arch = IKestoDevice::StringToTarget(Attribute(element, QStringLiteral("arch")));
+    build = Attribute(element, QStringLiteral("build"));
     if (name.isEmpty())
         return false;
 
-    for (QDomElement child = element.firstChildElement(); !child.isNull();
-         child = child.nextSiblingElement()) {
-        if (child.tagName().toLower() != QLatin1String("files"))
-            continue;
-        for (QDomElement file = child.firstChildElement(); !file.isNull();
-             file = file.nextSiblingElement()) {
-            const QString path = file.attribute(QStringLiteral("path"));
+    ForEachChild(element, [this](const auto &child) {
+        if (TagName(child).toLower() != QLatin1String("files"))
+            return;
+        ForEachChild(child, [this](const auto &file) {
+            const QString path = Attribute(file, QStringLiteral("path"));
             if (!path.isEmpty())
                 files.append(path);
-        }
-    }
+        });
+    });
     return true;
+}
+
+bool _CompilerVariant::ReadFromXML(const QDomElement &element)
+{
+    return ReadVariant(element);
+}
+
+bool _CompilerVariant::ReadFromXML(const XmlNode &element)
+{
+    return ReadVariant(element);
 }
 
 namespace {

@@ -25,6 +25,7 @@ public:
     // Reads the attributes and the "files" list of element. Returns false when
     // the element has no "name" (the other fields then hold what was read).
     bool ReadFromXML(const QDomElement &element);
+    bool ReadFromXML(const XmlNode &element);
     // Writes every attribute (even empty ones) and, when there are files, a
     // "files" child holding one "File" element per path.
     void WriteToXML(QDomElement &element);
@@ -37,6 +38,10 @@ public:
     IKestoDevice::Platform arch = IKestoDevice::PLATFORM_UNKNOWN;
     QString build;
     QStringList files;
+
+private:
+    template <class Element>
+    bool ReadVariant(const Element &element);
 };
 
 // Replaces out by the variants of map sorted by name; returns their count.

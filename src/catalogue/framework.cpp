@@ -1,5 +1,6 @@
 #include "catalogue/framework.h"
 
+#include "common/xmlnode.h"
 #include "log/log.h"
 
 QString ClassDirectory(unsigned int classId)
@@ -35,25 +36,36 @@ QSharedPointer<_CompilerVariant> _Framework::GetVariant(IKestoDevice::Platform p
     return {};
 }
 
-bool _Framework::ReadFromManifest(const QDomElement &element)
+template <class Element>
+bool _Framework::ReadEntry(const Element &element)
 {
-    name = element.attribute(QStringLiteral("name"));
+    using namespace XmlRead;
+    name = Attribute(element, QStringLiteral("name"));
     if (name.isEmpty())
         return false;
-    for (QDomElement child = element.firstChildElement(); !child.isNull();
-         child = child.nextSiblingElement()) {
-        const QString tag = child.tagName().toLower();
+    ForEachChild(element, [this](const auto &child) {
+        const QString tag = TagName(child).toLower();
         if (tag == QLatin1String("variant")) {
             QSharedPointer<_CompilerVariant> variant(new _CompilerVariant);
             if (variant->ReadFromXML(child))
                 variants.insert(variant->name, variant);
         } else if (tag == QLatin1String("classid")) {
             bool ok = false;
-            const unsigned int value = child.attribute(QStringLiteral("value")).toUInt(&ok, 10);
+            const unsigned int value = Attribute(child, QStringLiteral("value")).toUInt(&ok, 10);
             classId = ok ? value : 0;
         }
-    }
+    });
     return true;
+}
+
+bool _Framework::ReadFromManifest(const QDomElement &element)
+{
+    return ReadEntry(element);
+}
+
+bool _Framework::ReadFromManifest(const XmlNode &element)
+{
+    return ReadEntry(element);
 }
 
 void _Framework::WriteToManifest(QDomElement &element)

@@ -30,6 +30,7 @@ public:
 
     // Reads "name", the "variant" children and "classid". False without a name.
     bool ReadFromManifest(const QDomElement &element);
+    bool ReadFromManifest(const XmlNode &element);
     void WriteToManifest(QDomElement &element);
 
     // True when the framework's module is installed on the handset (false
@@ -47,6 +48,10 @@ public:
     QString name;
     unsigned int classId = 0;
     QMap<QString, QSharedPointer<_CompilerVariant>> variants;
+
+private:
+    template <class Element>
+    bool ReadEntry(const Element &element);
 };
 
 // "fs:/~0x0000abcd": the handset directory of the module providing classId.

@@ -25,18 +25,6 @@ namespace {
 // Caches older than this format are stale and trigger a new scan.
 constexpr unsigned int kManifestVersion = 5;
 
-// The child elements of parent whose lower-cased name is name.
-QList<QDomElement> ChildrenNamed(const QDomElement &parent, QLatin1String name)
-{
-    QList<QDomElement> children;
-    for (QDomElement child = parent.firstChildElement(); !child.isNull();
-         child = child.nextSiblingElement()) {
-        if (child.tagName().toLower() == name)
-            children.append(child);
-    }
-    return children;
-}
-
 // name with every "*" removed, compared with moduleName as the pattern's
 // leading and trailing "*" ask: exactly, as prefix, as suffix or contained.
 bool MatchesPattern(const QString &pattern, const QString &moduleName)
@@ -94,27 +82,27 @@ QString Manifest::ManifestCachePath()
     return cacheFile;
 }
 
-bool Manifest::ReadCacheDocument(const QString &path, QDomDocument &document)
+std::unique_ptr<XmlNode> Manifest::ReadCacheDocument(const QString &path)
 {
     QFile file(path);
     if (!file.open(QIODevice::ReadOnly))
-        return false;
-    const bool parsed = document.setContent(&file, false);
-    file.close();
-    return parsed && !document.documentElement().isNull()
-        && document.documentElement().tagName().toLower() == QLatin1String("testkit");
+        return nullptr;
+    std::unique_ptr<XmlNode> root = XmlNode::Parse(file.readAll());
+    if (!root || root->Name().toLower() != QLatin1String("testkit"))
+        return nullptr;
+    return root;
 }
 
 bool Manifest::IsVersionOkay()
 {
     testModules.clear();
-    QDomDocument document;
-    return ReadCacheDocument(cacheFile, document) && IsCurrent(document);
+    const std::unique_ptr<XmlNode> root = ReadCacheDocument(cacheFile);
+    return root && IsCurrent(*root);
 }
 
-bool Manifest::IsCurrent(const QDomDocument &document)
+bool Manifest::IsCurrent(const XmlNode &root)
 {
-    QString version = document.documentElement().attribute(QStringLiteral("version"));
+    QString version = root.Attribute(QStringLiteral("version"));
     if (version.isEmpty())
         version = QStringLiteral("0");
     bool ok = false;
@@ -147,35 +135,37 @@ QSharedPointer<_Framework> Manifest::CreateFramework(const QString &name)
 bool Manifest::ReadManifest()
 {
     testModules.clear();
-    QDomDocument document;
-    if (!ReadCacheDocument(cacheFile, document))
+    const std::unique_ptr<XmlNode> root = ReadCacheDocument(cacheFile);
+    if (!root)
         return false;
-    ReadDocument(document);
+    ReadDocument(*root);
     return true;
 }
 
-void Manifest::ReadDocument(const QDomDocument &document)
+void Manifest::ReadDocument(const XmlNode &root)
 {
-    const QDomElement root = document.documentElement();
-    for (QDomElement section = root.firstChildElement(); !section.isNull();
-         section = section.nextSiblingElement()) {
-        const QString sectionName = section.tagName().toLower();
+    for (const XmlNode *section : root.ChildElements()) {
+        const QString sectionName = section->Name().toLower();
         if (sectionName == QLatin1String("testmodules")) {
-            for (const QDomElement &entry : ChildrenNamed(section, QLatin1String("testmodule"))) {
+            for (const XmlNode *entry : section->ChildElements()) {
+                if (entry->Name().toLower() != QLatin1String("testmodule"))
+                    continue;
                 QSharedPointer<_TestModule> module =
-                    CreateModule(entry.attribute(QStringLiteral("testtype")));
+                    CreateModule(entry->Attribute(QStringLiteral("testtype")));
                 if (!module)
                     continue;
                 // A module without a name is kept all the same, under the
                 // empty key.
-                module->ReadFromManifest(entry);
+                module->ReadFromManifest(*entry);
                 testModules.insert(module->moduleName.toLower(), module);
             }
         } else if (sectionName == QLatin1String("frameworks")) {
-            for (const QDomElement &entry : ChildrenNamed(section, QLatin1String("framework"))) {
+            for (const XmlNode *entry : section->ChildElements()) {
+                if (entry->Name().toLower() != QLatin1String("framework"))
+                    continue;
                 QSharedPointer<_Framework> framework =
-                    CreateFramework(entry.attribute(QStringLiteral("name")));
-                if (framework->ReadFromManifest(entry))
+                    CreateFramework(entry->Attribute(QStringLiteral("name")));
+                if (framework->ReadFromManifest(*entry))
                     frameworks.insert(framework->name, framework);
             }
         }

@@ -8,8 +8,10 @@
 #include <QString>
 #include <QStringList>
 
+#include <memory>
+
 class Log;
-class QDomDocument;
+class XmlNode;
 class QFileInfo;
 class _Framework;
 class _TestModule;
@@ -106,12 +108,12 @@ private:
     void DecompileKestoPackage(QSharedPointer<_TestModule> module, const QString &package);
     void ProcessSecondaryModules();
 
-    // Parses a cache file; false unless it is well-formed with a "testkit" root.
-    static bool ReadCacheDocument(const QString &path, QDomDocument &document);
+    // Parses a cache file; null unless it is well-formed with a "testkit" root.
+    static std::unique_ptr<XmlNode> ReadCacheDocument(const QString &path);
     // Whether a parsed cache carries a current format version.
-    static bool IsCurrent(const QDomDocument &document);
+    static bool IsCurrent(const XmlNode &root);
     // Fills the maps from a parsed cache.
-    void ReadDocument(const QDomDocument &document);
+    void ReadDocument(const XmlNode &root);
 
     // An empty module of the kind whose type word is type; null when none.
     static QSharedPointer<_TestModule> CreateModule(const QString &type);

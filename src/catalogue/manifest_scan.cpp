@@ -5,6 +5,7 @@
 #include "archive/tar.h"
 #include "catalogue/framework.h"
 #include "catalogue/testmodule.h"
+#include "common/xmlnode.h"
 #include "environment/platforms.h"
 #include "modules/ctfapplettestmodule.h"
 #include "modules/ctftestmodule.h"
@@ -14,7 +15,6 @@
 #include "resources/kestoresources.h"
 
 #include <QDir>
-#include <QDomDocument>
 #include <QFile>
 #include <QFileInfo>
 #include <QHash>
@@ -216,9 +216,9 @@ bool Manifest::GenerateManifest(bool force)
     // forced scan has no use for the cache.
     testModules.clear();
     if (!force && QFileInfo::exists(cacheFile)) {
-        QDomDocument document;
-        if (ReadCacheDocument(cacheFile, document) && IsCurrent(document)) {
-            ReadDocument(document);
+        const std::unique_ptr<XmlNode> root = ReadCacheDocument(cacheFile);
+        if (root && IsCurrent(*root)) {
+            ReadDocument(*root);
             return true;
         }
     }

@@ -8,10 +8,26 @@ TestCase::TestCase(const TestCase &other) = default;
 TestCase &TestCase::operator=(const TestCase &other) = default;
 TestCase::~TestCase() = default;
 
+namespace {
+
+template <class Element>
+void ReadCase(TestCase &testCase, const Element &element)
+{
+    testCase.name = XmlRead::Attribute(element, QStringLiteral("name"));
+    testCase.type = XmlRead::Attribute(element, QStringLiteral("type"));
+}
+
+} // namespace
+
 bool TestCase::ReadFromXML(const QDomElement &element)
 {
-    name = element.attribute(QStringLiteral("name"));
-    type = element.attribute(QStringLiteral("type"));
+    ReadCase(*this, element);
+    return true;
+}
+
+bool TestCase::ReadFromXML(const XmlNode &element)
+{
+    ReadCase(*this, element);
     return true;
 }
 

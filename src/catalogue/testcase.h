@@ -19,6 +19,7 @@ public:
 
     // Reads "name" and "type" (missing ones read as empty); always true.
     virtual bool ReadFromXML(const QDomElement &element);
+    bool ReadFromXML(const XmlNode &element);
     virtual void WriteToXML(QDomElement &element);
     void WriteToXML(XmlNode &element);
 

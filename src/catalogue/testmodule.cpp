@@ -11,25 +11,80 @@
 
 namespace {
 
-// A decimal attribute; ok tells whether it parsed.
-unsigned int DecimalAttribute(const QDomElement &element, const QString &name, bool *ok)
+// attribute upper, or attribute lower when upper is empty.
+QString EitherAttribute(const XmlNode &element, const char *upper, const char *lower)
 {
-    return element.attribute(name).toUInt(ok, 10);
+    const QString value = element.Attribute(QLatin1String(upper));
+    return value.isEmpty() ? element.Attribute(QLatin1String(lower)) : value;
 }
 
-unsigned int DecimalAttribute(const QDomElement &element, const QString &name,
-                              unsigned int fallback)
+// A decimal attribute; ok tells whether it parsed.
+template <class Element>
+unsigned int DecimalAttribute(const Element &element, const QString &name, bool *ok)
+{
+    return XmlRead::Attribute(element, name).toUInt(ok, 10);
+}
+
+template <class Element>
+unsigned int DecimalAttribute(const Element &element, const QString &name, unsigned int fallback)
 {
     bool ok = false;
     const unsigned int value = DecimalAttribute(element, name, &ok);
     return ok ? value : fallback;
 }
 
-// attribute upper, or attribute lower when upper is empty.
-QString EitherAttribute(const XmlNode &element, const char *upper, const char *lower)
+// The manifest entry of module, from a DOM element or a light one; true
+// when it names the module.
+template <class Element>
+bool ReadEntry(_TestModule &module, const Element &element)
 {
-    const QString value = element.Attribute(QLatin1String(upper));
-    return value.isEmpty() ? element.Attribute(QLatin1String(lower)) : value;
+    using namespace XmlRead;
+    module.moduleName = Attribute(element, QStringLiteral("moduleName"));
+    module.idHash = Attribute(element, QStringLiteral("idhash"));
+    module.source = Attribute(element, QStringLiteral("source"));
+    module.baseLineFile = Attribute(element, QStringLiteral("baseLineFile"));
+    module.sourcePath = Attribute(element, QStringLiteral("sourcePath"));
+    module.family = Attribute(element, QStringLiteral("family"));
+    module.subFamily = Attribute(element, QStringLiteral("subFamily"));
+    module.minKestoVersion = Attribute(element, QStringLiteral("minKestoVersion"));
+
+    ForEachChild(element, [&module](const auto &child) {
+        const QString tag = TagName(child).toLower();
+        ForEachChild(child, [&module, &tag](const auto &item) {
+            const QString itemTag = TagName(item).toLower();
+            if (tag == QLatin1String("targets") && itemTag == QLatin1String("target")) {
+                QSharedPointer<_CompilerVariant> variant(new _CompilerVariant);
+                if (variant->ReadFromXML(item))
+                    module.targets.insert(variant->name, variant);
+            } else if (tag == QLatin1String("applets") && itemTag == QLatin1String("applet")) {
+                bool ok = false;
+                Applet applet;
+                applet.appletid = DecimalAttribute(item, QStringLiteral("appletid"), &ok);
+                if (!ok)
+                    return;
+                applet.hostid = DecimalAttribute(item, QStringLiteral("hostid"), 0u);
+                applet.baseid = static_cast<quint16>(DecimalAttribute(item, QStringLiteral("baseid"), 1000u));
+                applet.apptype = static_cast<quint16>(DecimalAttribute(item, QStringLiteral("apptype"), 0u));
+                applet.privset = static_cast<quint16>(DecimalAttribute(item, QStringLiteral("privset"), 0u));
+                applet.flags = static_cast<quint16>(DecimalAttribute(item, QStringLiteral("flags"), 0u));
+                module.applets.append(applet);
+            } else if (tag == QLatin1String("classids") && itemTag == QLatin1String("classid")) {
+                const unsigned int value = DecimalAttribute(item, QStringLiteral("value"), 0u);
+                if (value != 0)
+                    module.classids.append(value);
+            } else if (tag == QLatin1String("testcases") && itemTag == QLatin1String("testcase")) {
+                TestCase testCase;
+                testCase.ReadFromXML(item);
+                module.testCases.append(testCase);
+            } else if (tag == QLatin1String("secondary_modules")
+                       && itemTag == QLatin1String("secondary_module")) {
+                const QString name = Attribute(item, QStringLiteral("name"));
+                if (!name.isEmpty())
+                    module.secondaryModules.append(name);
+            }
+        });
+    });
+    return !module.moduleName.isEmpty();
 }
 
 // The manifest entry of module, into a DOM element or a light one.
@@ -230,54 +285,12 @@ bool _TestModule::ProcessModuleXML(const QString &path)
 
 bool _TestModule::ReadFromManifest(const QDomElement &element)
 {
-    moduleName = element.attribute(QStringLiteral("moduleName"));
-    idHash = element.attribute(QStringLiteral("idhash"));
-    source = element.attribute(QStringLiteral("source"));
-    baseLineFile = element.attribute(QStringLiteral("baseLineFile"));
-    sourcePath = element.attribute(QStringLiteral("sourcePath"));
-    family = element.attribute(QStringLiteral("family"));
-    subFamily = element.attribute(QStringLiteral("subFamily"));
-    minKestoVersion = element.attribute(QStringLiteral("minKestoVersion"));
+    return ReadEntry(*this, element);
+}
 
-    for (QDomElement child = element.firstChildElement(); !child.isNull();
-         child = child.nextSiblingElement()) {
-        const QString tag = child.tagName().toLower();
-        for (QDomElement item = child.firstChildElement(); !item.isNull();
-             item = item.nextSiblingElement()) {
-            const QString itemTag = item.tagName().toLower();
-            if (tag == QLatin1String("targets") && itemTag == QLatin1String("target")) {
-                QSharedPointer<_CompilerVariant> variant(new _CompilerVariant);
-                if (variant->ReadFromXML(item))
-                    targets.insert(variant->name, variant);
-            } else if (tag == QLatin1String("applets") && itemTag == QLatin1String("applet")) {
-                bool ok = false;
-                Applet applet;
-                applet.appletid = DecimalAttribute(item, QStringLiteral("appletid"), &ok);
-                if (!ok)
-                    continue;
-                applet.hostid = DecimalAttribute(item, QStringLiteral("hostid"), 0u);
-                applet.baseid = static_cast<quint16>(DecimalAttribute(item, QStringLiteral("baseid"), 1000u));
-                applet.apptype = static_cast<quint16>(DecimalAttribute(item, QStringLiteral("apptype"), 0u));
-                applet.privset = static_cast<quint16>(DecimalAttribute(item, QStringLiteral("privset"), 0u));
-                applet.flags = static_cast<quint16>(DecimalAttribute(item, QStringLiteral("flags"), 0u));
-                applets.append(applet);
-            } else if (tag == QLatin1String("classids") && itemTag == QLatin1String("classid")) {
-                const unsigned int value = DecimalAttribute(item, QStringLiteral("value"), 0u);
-                if (value != 0)
-                    classids.append(value);
-            } else if (tag == QLatin1String("testcases") && itemTag == QLatin1String("testcase")) {
-                TestCase testCase;
-                testCase.ReadFromXML(item);
-                testCases.append(testCase);
-            } else if (tag == QLatin1String("secondary_modules")
-                       && itemTag == QLatin1String("secondary_module")) {
-                const QString name = item.attribute(QStringLiteral("name"));
-                if (!name.isEmpty())
-                    secondaryModules.append(name);
-            }
-        }
-    }
-    return !moduleName.isEmpty();
+bool _TestModule::ReadFromManifest(const XmlNode &element)
+{
+    return ReadEntry(*this, element);
 }
 
 void _TestModule::WriteToManifest(QDomElement &element)

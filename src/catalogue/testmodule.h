@@ -135,8 +135,9 @@ private:
     virtual unsigned int KestoID() = 0;
 
 public:
-    // The same entry as a light tree, as the catalogue cache is written.
-    // Declared after every other virtual operation, so that theirs keep
-    // their places in the table.
+    // The same entry as a light tree, as the catalogue cache is written and
+    // read. Declared after every other virtual operation, so that theirs
+    // keep their places in the table.
     virtual void WriteToManifest(XmlNode &element);
+    virtual bool ReadFromManifest(const XmlNode &element);
 };

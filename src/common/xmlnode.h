@@ -138,3 +138,47 @@ inline XmlNode &AppendElement(XmlNode &parent, const QString &name)
 }
 
 } // namespace XmlBuild
+
+// The same reading code takes a DOM element (from callers of the DOM
+// interface) and an XmlNode (from the library's own files) through these.
+namespace XmlRead {
+
+inline QString Attribute(const QDomElement &element, const QString &name)
+{
+    return element.attribute(name);
+}
+
+inline QString Attribute(const XmlNode &element, const QString &name)
+{
+    return element.Attribute(name);
+}
+
+inline QString TagName(const QDomElement &element)
+{
+    return element.tagName();
+}
+
+inline QString TagName(const XmlNode &element)
+{
+    return element.Name();
+}
+
+// Calls visit with every child element, in document order.
+template <class Visit>
+void ForEachChild(const QDomElement &element, Visit &&visit)
+{
+    for (QDomElement child = element.firstChildElement(); !child.isNull();
+         child = child.nextSiblingElement())
+        visit(child);
+}
+
+template <class Visit>
+void ForEachChild(const XmlNode &element, Visit &&visit)
+{
+    for (const auto &child : element.Children()) {
+        if (child->IsElement())
+            visit(*child);
+    }
+}
+
+} // namespace XmlRead

@@ -240,6 +240,12 @@ bool CtfTestModule::ReadFromManifest(const QDomElement &element)
     return Programs::ReadFromManifest(element, programs) > 0;
 }
 
+bool CtfTestModule::ReadFromManifest(const XmlNode &element)
+{
+    _TestModule::ReadFromManifest(element);
+    return Programs::ReadFromManifest(element, programs) > 0;
+}
+
 void CtfTestModule::WriteToManifest(QDomElement &element)
 {
     _TestModule::WriteToManifest(element);

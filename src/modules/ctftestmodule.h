@@ -46,6 +46,7 @@ public:
     bool ProcessModuleMIF(const QString &path) override;
     // The base entry plus "programs"; true when at least one program was read.
     bool ReadFromManifest(const QDomElement &element) override;
+    bool ReadFromManifest(const XmlNode &element) override;
     void WriteToManifest(QDomElement &element) override;
     void WriteToManifest(XmlNode &element) override;
 

@@ -361,11 +361,22 @@ bool OatTestModule::ProcessPackage(const QString &directory)
     return false;
 }
 
-bool OatTestModule::ReadFromManifest(const QDomElement &element)
+template <class Element>
+bool OatTestModule::ReadEntry(const Element &element)
 {
     _TestModule::ReadFromManifest(element);
-    mifname = element.attribute(QStringLiteral("mifname"));
+    mifname = XmlRead::Attribute(element, QStringLiteral("mifname"));
     return Programs::ReadFromManifest(element, programs) > 0;
+}
+
+bool OatTestModule::ReadFromManifest(const QDomElement &element)
+{
+    return ReadEntry(element);
+}
+
+bool OatTestModule::ReadFromManifest(const XmlNode &element)
+{
+    return ReadEntry(element);
 }
 
 template <class Element>

@@ -49,6 +49,7 @@ public:
     // The base entry plus "mifname" and "programs"; true when at least one
     // program was read.
     bool ReadFromManifest(const QDomElement &element) override;
+    bool ReadFromManifest(const XmlNode &element) override;
     void WriteToManifest(QDomElement &element) override;
     void WriteToManifest(XmlNode &element) override;
 
@@ -72,4 +73,6 @@ private:
     void StampLog(const QString &hostPath, const QString &runId);
     template <class Element>
     void WriteEntry(Element &element);
+    template <class Element>
+    bool ReadEntry(const Element &element);
 };

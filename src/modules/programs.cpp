@@ -19,24 +19,38 @@ QString PropertyText(const SysResource &program, const char *name)
     return program.Property(name).toString();
 }
 
-int ReadFromManifest(const QDomElement &element, QList<SysResource> &programs)
+namespace {
+
+template <class Element>
+int ReadPrograms(const Element &element, QList<SysResource> &programs)
 {
+    using namespace XmlRead;
     int count = 0;
-    for (QDomElement list = element.firstChildElement(); !list.isNull();
-         list = list.nextSiblingElement()) {
-        if (list.tagName().toLower() != QLatin1String("programs"))
-            continue;
-        for (QDomElement item = list.firstChildElement(); !item.isNull();
-             item = item.nextSiblingElement()) {
-            if (item.tagName().toLower() != QLatin1String("program"))
-                continue;
+    ForEachChild(element, [&](const auto &list) {
+        if (TagName(list).toLower() != QLatin1String("programs"))
+            return;
+        ForEachChild(list, [&](const auto &item) {
+            if (TagName(item).toLower() != QLatin1String("program"))
+                return;
             SysResource program;
             program.ReadFromXML(item);
             programs.append(program);
             ++count;
-        }
-    }
+        });
+    });
     return count;
+}
+
+} // namespace
+
+int ReadFromManifest(const QDomElement &element, QList<SysResource> &programs)
+{
+    return ReadPrograms(element, programs);
+}
+
+int ReadFromManifest(const XmlNode &element, QList<SysResource> &programs)
+{
+    return ReadPrograms(element, programs);
 }
 
 namespace {

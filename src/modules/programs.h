@@ -19,6 +19,7 @@ HARNESS_EXPORT QString PropertyText(const SysResource &program, const char *name
 // Appends every "program" of every "programs" child of element; returns how
 // many were read.
 HARNESS_EXPORT int ReadFromManifest(const QDomElement &element, QList<SysResource> &programs);
+HARNESS_EXPORT int ReadFromManifest(const XmlNode &element, QList<SysResource> &programs);
 
 // Appends a "programs" child holding one "program" per record, when there are any.
 HARNESS_EXPORT void WriteToManifest(QDomElement &element, QList<SysResource> &programs);

@@ -62,6 +62,12 @@ bool SecondaryModule::ReadFromManifest(const QDomElement &element)
     return false;
 }
 
+bool SecondaryModule::ReadFromManifest(const XmlNode &element)
+{
+    _TestModule::ReadFromManifest(element);
+    return false;
+}
+
 unsigned int SecondaryModule::KestoID()
 {
     return 0;

@@ -26,6 +26,7 @@ public:
     bool ProcessModuleMIF(const QString &path) override;
     // Reads the base entry; always false.
     bool ReadFromManifest(const QDomElement &element) override;
+    bool ReadFromManifest(const XmlNode &element) override;
 
 private:
     unsigned int KestoID() override;

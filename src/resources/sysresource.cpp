@@ -171,23 +171,35 @@ void SysResource::WriteToXML(XmlNode &element)
     WriteRecord(element);
 }
 
-void SysResource::ReadFromXML(const QDomElement &element)
+template <class Element>
+void SysResource::ReadRecord(const Element &element)
 {
+    using namespace XmlRead;
     Reset();
-    type = element.attribute(QStringLiteral("type")).toUInt();
-    keysize = quint16(element.attribute(QStringLiteral("keysize")).toUInt());
-    for (QDomElement child = element.firstChildElement(); !child.isNull(); child = child.nextSiblingElement()) {
-        const QString name = child.tagName().toLower();
+    type = Attribute(element, QStringLiteral("type")).toUInt();
+    keysize = quint16(Attribute(element, QStringLiteral("keysize")).toUInt());
+    ForEachChild(element, [this](const auto &child) {
+        const QString name = TagName(child).toLower();
         if (name == QLatin1String("data")) {
-            data = child.nodeValue().toLatin1();
+            // The manifest keeps only the mark that there were bytes.
+            data.clear();
         } else if (name == QLatin1String("properties")) {
-            for (QDomElement property = child.firstChildElement(); !property.isNull();
-                 property = property.nextSiblingElement()) {
-                const QString propertyName = property.attribute(QStringLiteral("name"));
+            ForEachChild(child, [this](const auto &property) {
+                const QString propertyName = Attribute(property, QStringLiteral("name"));
                 if (!propertyName.isEmpty())
                     SetProperty(propertyName.toLatin1().constData(),
-                                property.attribute(QStringLiteral("value")).toLatin1());
-            }
+                                Attribute(property, QStringLiteral("value")).toLatin1());
+            });
         }
-    }
+    });
+}
+
+void SysResource::ReadFromXML(const QDomElement &element)
+{
+    ReadRecord(element);
+}
+
+void SysResource::ReadFromXML(const XmlNode &element)
+{
+    ReadRecord(element);
 }

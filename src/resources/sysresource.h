@@ -36,6 +36,7 @@ struct HARNESS_EXPORT SysResource
     // "property" elements ("name", "value"). Property values come back as
     // byte arrays; data comes back empty.
     virtual void ReadFromXML(const QDomElement &element);
+    void ReadFromXML(const XmlNode &element);
     // Writes "type", "keysize", an empty "data" child when data is not empty
     // and a "properties" child when there is at least one property (holding
     // the properties whose text is not empty).
@@ -62,4 +63,6 @@ struct HARNESS_EXPORT SysResource
 private:
     template <class Element>
     void WriteRecord(Element &element);
+    template <class Element>
+    void ReadRecord(const Element &element);
 };
