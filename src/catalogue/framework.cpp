@@ -68,21 +68,30 @@ bool _Framework::ReadFromManifest(const XmlNode &element)
     return ReadEntry(element);
 }
 
-void _Framework::WriteToManifest(QDomElement &element)
+template <class Element>
+void _Framework::WriteEntry(Element &element)
 {
-    QDomDocument document = element.ownerDocument();
-    element.setAttribute(QStringLiteral("name"), name);
+    using namespace XmlBuild;
+    SetAttribute(element, QStringLiteral("name"), name);
     QList<QSharedPointer<_CompilerVariant>> sorted;
     ToList(variants, sorted);
     for (const auto &variant : std::as_const(sorted)) {
-        QDomElement child = document.createElement(QStringLiteral("variant"));
+        auto &&child = AppendElement(element, QStringLiteral("variant"));
         variant->WriteToXML(child);
-        element.appendChild(child);
     }
-    QDomElement id = document.createElement(QStringLiteral("classid"));
-    id.setAttribute(QStringLiteral("value"), QString::number(classId));
-    id.setAttribute(QStringLiteral("valuehex"), HexClassId(classId));
-    element.appendChild(id);
+    auto &&id = AppendElement(element, QStringLiteral("classid"));
+    SetAttribute(id, QStringLiteral("value"), QString::number(classId));
+    SetAttribute(id, QStringLiteral("valuehex"), HexClassId(classId));
+}
+
+void _Framework::WriteToManifest(QDomElement &element)
+{
+    WriteEntry(element);
+}
+
+void _Framework::WriteToManifest(XmlNode &element)
+{
+    WriteEntry(element);
 }
 
 bool _Framework::IsLoaded(IKestoDevice *device)

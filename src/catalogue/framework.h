@@ -32,6 +32,7 @@ public:
     bool ReadFromManifest(const QDomElement &element);
     bool ReadFromManifest(const XmlNode &element);
     void WriteToManifest(QDomElement &element);
+    void WriteToManifest(XmlNode &element);
 
     // True when the framework's module is installed on the handset (false
     // when the class ID is unknown).
@@ -52,6 +53,8 @@ public:
 private:
     template <class Element>
     bool ReadEntry(const Element &element);
+    template <class Element>
+    void WriteEntry(Element &element);
 };
 
 // "fs:/~0x0000abcd": the handset directory of the module providing classId.

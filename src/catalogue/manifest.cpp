@@ -15,7 +15,6 @@
 #include "modules/uttestmodule.h"
 
 #include <QDir>
-#include <QDomDocument>
 #include <QFile>
 #include <QFileInfo>
 #include <QSaveFile>
@@ -214,13 +213,9 @@ bool Manifest::WriteManifest(const QString &path)
     out.Close();
 
     if (!frameworks.isEmpty()) {
-        QDomDocument document;
-        QDomElement list = document.createElement(QStringLiteral("frameworks"));
-        for (const QSharedPointer<_Framework> &framework : std::as_const(frameworks)) {
-            QDomElement entry = document.createElement(QStringLiteral("framework"));
-            list.appendChild(entry);
-            framework->WriteToManifest(entry);
-        }
+        XmlNode list(QStringLiteral("frameworks"));
+        for (const QSharedPointer<_Framework> &framework : std::as_const(frameworks))
+            framework->WriteToManifest(list.AppendElement(QStringLiteral("framework")));
         out.Write(list);
     }
 

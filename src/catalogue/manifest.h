@@ -12,7 +12,6 @@
 
 class Log;
 class XmlNode;
-class QFileInfo;
 class _Framework;
 class _TestModule;
 

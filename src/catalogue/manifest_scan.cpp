@@ -41,7 +41,8 @@ struct Manifest::MifRecord
 struct Manifest::DirEntry
 {
     QString name;
-    // The directory as given joined with name, and its absolute form.
+    // The directory as given joined with name, and its absolute form, both
+    // cleaned.
     QString path;
     QString absolutePath;
     bool isDir = false;
@@ -202,7 +203,7 @@ QSharedPointer<_CompilerVariant> PackageVariant(const Manifest::DirEntry &packag
     variant->name = package.BaseName();
     variant->variant = toolChain;
     variant->build = build;
-    variant->packagePath = QDir::cleanPath(package.absolutePath);
+    variant->packagePath = package.absolutePath;
     variant->arch = ArchitectureOf(toolChain);
     name = first;
     return variant;
@@ -275,7 +276,7 @@ void Manifest::ProcessTheSubDir(const QString &dir)
         if (entry.isDir) {
             const QString base = entry.BaseName().toLower();
             if (base == QLatin1String("testframeworks") && !isPlatform) {
-                ProcessFrameworkDirectory(QDir::cleanPath(entry.path));
+                ProcessFrameworkDirectory(entry.path);
             } else if (base == QLatin1String("package")) {
                 QSharedPointer<_TestModule> module(new SecondaryModule);
                 const QString path = entry.absolutePath;
@@ -283,10 +284,10 @@ void Manifest::ProcessTheSubDir(const QString &dir)
                 secondaryModules.insert(module->moduleName, module);
                 packageDirs.append(path);
             } else {
-                ProcessTheSubDir(QDir::cleanPath(entry.path));
+                ProcessTheSubDir(entry.path);
             }
         } else if (entry.Suffix().toLower() == QLatin1String("xml")) {
-            ProcessXMLDocument(QDir::cleanPath(entry.absolutePath));
+            ProcessXMLDocument(entry.absolutePath);
         }
     }
 
