@@ -1,4 +1,4 @@
-#include "common/clock.h"
+#include "support/testutil.h"
 
 #include <QCoreApplication>
 #include <QTemporaryDir>
@@ -16,13 +16,7 @@ int main(int argc, char **argv)
     QTemporaryDir root;
     if (!root.isValid())
         return 2;
-    qputenv("KESTIX_DATA_ROOT", root.path().toLocal8Bit());
-    qputenv("KESTIX_HANDSETS", (root.path() + QStringLiteral("/handsets")).toLocal8Bit());
-    qputenv("KESTIX_TIME_SCALE", "0");
-    for (const char *name : {"KESTIX_TOOLSET", "KESTIX_PLATFORMS_ALL", "KESTIX_PLATFORM",
-                             "KESTIX_TESTSETS_ALL", "KESTIX_TESTSET"})
-        qunsetenv(name);
-    Clock::SetScale(0.0);
+    testutil::IsolateEnvironment(root);
 
     return RUN_ALL_TESTS();
 }

@@ -1,5 +1,7 @@
 #include "testutil.h"
 
+#include "common/clock.h"
+
 #include <QDir>
 #include <QFile>
 #include <QFileInfo>
@@ -96,6 +98,17 @@ bool HaveProgram(const QString &program)
 QString DataPath(const QString &relative)
 {
     return QStringLiteral(HARNESS_TEST_DATA_DIR) + QLatin1Char('/') + relative;
+}
+
+void IsolateEnvironment(const QTemporaryDir &root)
+{
+    qputenv("KESTIX_DATA_ROOT", root.path().toLocal8Bit());
+    qputenv("KESTIX_HANDSETS", (root.path() + QStringLiteral("/handsets")).toLocal8Bit());
+    qputenv("KESTIX_TIME_SCALE", "0");
+    for (const char *name : {"KESTIX_TOOLSET", "KESTIX_PLATFORMS_ALL", "KESTIX_PLATFORM",
+                             "KESTIX_TESTSETS_ALL", "KESTIX_TESTSET"})
+        qunsetenv(name);
+    Clock::SetScale(0.0);
 }
 
 } // namespace testutil

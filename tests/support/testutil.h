@@ -56,6 +56,11 @@ bool HaveProgram(const QString &program);
 // The folder of data files committed under tests/data.
 QString DataPath(const QString &relative);
 
+// Points the library's data root and handset folder into root, makes every
+// wait instant and forgets the platforms, kits and tool set the user has, so
+// that a test or benchmark program touches none of the user's folders.
+void IsolateEnvironment(const QTemporaryDir &root);
+
 } // namespace testutil
 
 #include <ostream>
