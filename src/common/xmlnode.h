@@ -78,7 +78,6 @@ public:
     void SetAttributes(const AttributeList &attributes) { m_attributes = attributes; }
     void SetAttributes(AttributeList &&attributes) { m_attributes = std::move(attributes); }
 
-    bool HasChildNodes() const { return !m_children.empty(); }
     const std::vector<std::unique_ptr<XmlNode>> &Children() const { return m_children; }
     // The child elements, in document order.
     std::vector<XmlNode *> ChildElements() const;
