@@ -143,15 +143,7 @@ void BM_ScanPeakMemory(benchmark::State &state)
     state.counters["limit_MiB"] = kPeakLimitMiB;
 }
 
-void KitSizes(benchmark::internal::Benchmark *benchmark)
-{
-    benchmark->ArgName("modules")->Unit(benchmark::kMillisecond);
-    // The big kits take seconds per scan: a few iterations say enough.
-    benchmark->Arg(500);
-    benchmark->Arg(2000);
-    benchmark->Arg(8000);
-    benchutil::SetMinTime(benchmark, 0.5);
-}
+using benchkits::KitSizes;
 
 BENCHMARK(BM_ReadKitFiles)->Apply(KitSizes);
 BENCHMARK(BM_Scan)->Apply(KitSizes);

@@ -230,14 +230,7 @@ void BM_ParseOneLog(benchmark::State &state)
     RecordModule(state, Recording::ParseOnly);
 }
 
-void KitSizes(benchmark::internal::Benchmark *benchmark)
-{
-    benchmark->ArgName("modules")->Unit(benchmark::kMillisecond);
-    benchmark->Arg(500);
-    benchmark->Arg(2000);
-    benchmark->Arg(8000);
-    benchutil::SetMinTime(benchmark, 0.5);
-}
+using benchkits::KitSizes;
 
 BENCHMARK(BM_ParseLogsOnly)->Apply(KitSizes);
 BENCHMARK(BM_Process)->Apply(KitSizes);

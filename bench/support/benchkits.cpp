@@ -179,6 +179,15 @@ QString Logs(int modules, QString *error)
     return root;
 }
 
+void KitSizes(benchmark::internal::Benchmark *benchmark)
+{
+    benchmark->ArgName("modules")->Unit(benchmark::kMillisecond);
+    benchmark->Arg(500);
+    benchmark->Arg(2000);
+    benchmark->Arg(8000);
+    benchutil::SetMinTime(benchmark, 0.5);
+}
+
 QStringList LogFiles(const QString &folder)
 {
     QStringList files;

@@ -8,6 +8,8 @@
 #include <QString>
 #include <QStringList>
 
+#include <benchmark/benchmark.h>
+
 namespace benchkits {
 
 // Module number index of every kit: kinds in turn (CTF, CTF applet, OAT, UT,
@@ -38,5 +40,9 @@ QString Logs(int modules, QString *error);
 // The files of a log tree that reprocessing reads ("*.log", "*.oat", "*.txt"
 // outside "oatRawLogs" and "ProcessedResults"), in name order.
 QStringList LogFiles(const QString &folder);
+
+// The kit sizes every benchmark of big kits runs at (500, 2,000 and 8,000
+// modules, in milliseconds): a few iterations of a big kit say enough.
+void KitSizes(benchmark::internal::Benchmark *benchmark);
 
 } // namespace benchkits
