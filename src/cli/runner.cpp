@@ -13,6 +13,7 @@
 #include <QFileInfo>
 #include <QSet>
 
+#include <algorithm>
 #include <functional>
 #include <iostream>
 #include <memory>
@@ -240,6 +241,16 @@ QStringList ResolveTargets(const ShardedOptions &options)
 
 // Runs the selection on several handsets at once and prints one summary
 // naming the handset of every module.
+// The exit status of a finished run: a test case that failed, or a module
+// that never ran, fails it.
+int RunStatus(const RunReport &report, bool allRan)
+{
+    const bool notExecuted = !allRan
+        || std::any_of(report.modules.cbegin(), report.modules.cend(),
+                       [](const ModuleReport &row) { return !row.Executed(); });
+    return notExecuted || report.Total(QStringLiteral("fail")) > 0 ? ExitTestFailed : ExitSuccess;
+}
+
 int RunSharded(const QCommandLineParser &parser, const ShardedOptions &options,
                const std::function<void(Harness &, Log &, const QString &, const QString &)> &configure)
 {
@@ -333,10 +344,7 @@ int RunSharded(const QCommandLineParser &parser, const ShardedOptions &options,
     Out(text);
     if (status != ExitSuccess)
         return status;
-    bool notExecuted = !allRan;
-    for (const ModuleReport &row : std::as_const(report.modules))
-        notExecuted = notExecuted || !row.Executed();
-    return notExecuted || report.Total(QStringLiteral("fail")) > 0 ? ExitTestFailed : ExitSuccess;
+    return RunStatus(report, allRan);
 }
 
 int RunCommand(const QStringList &arguments)
@@ -441,10 +449,7 @@ int RunCommand(const QStringList &arguments)
     harness.DisconnectTarget();
     if (status != ExitSuccess)
         return status;
-    bool notRun = !ran;
-    for (const ModuleReport &row : report.modules)
-        notRun = notRun || !row.Executed();
-    return notRun || report.Total(QStringLiteral("fail")) > 0 ? ExitTestFailed : ExitSuccess;
+    return RunStatus(report, ran);
 }
 
 int ProcessCommand(const QStringList &arguments)
