@@ -3,6 +3,8 @@
 // ParseLog. The packages are built here; their behaviour scripts write logs
 // in the kind's format, as a real test would on a handset.
 
+#include "moduletest.h"
+
 #include "log/log.h"
 #include "modules/ctfapplettestmodule.h"
 #include "modules/ctftestmodule.h"
@@ -22,32 +24,10 @@
 
 namespace {
 
-using Pairs = QList<QPair<QString, QString>>;
-
-Pairs PairsOf(const TestResults &results)
-{
-    Pairs pairs;
-    for (const TestCaseResult &entry : results.caseResults)
-        pairs.append({entry.testCase, entry.result});
-    return pairs;
-}
-
-QSharedPointer<_CompilerVariant> Target(const QString &package)
-{
-    QSharedPointer<_CompilerVariant> variant(new _CompilerVariant);
-    variant->name = QFileInfo(package).completeBaseName();
-    variant->arch = IKestoDevice::PLATFORM_WIN32;
-    variant->build = QStringLiteral("Release");
-    variant->packagePath = package;
-    return variant;
-}
-
-Applet AppletWithId(unsigned int id)
-{
-    Applet applet;
-    applet.appletid = id;
-    return applet;
-}
+using moduletest::AppletWithId;
+using moduletest::Pairs;
+using moduletest::PairsOf;
+using moduletest::Target;
 
 // The lines of a host file, without line ends.
 QStringList Lines(const QString &path)

@@ -1,5 +1,7 @@
 // Parsing of copied handset logs in every module kind's format.
 
+#include "moduletest.h"
+
 #include "modules/ctfapplettestmodule.h"
 #include "modules/ctftestmodule.h"
 #include "modules/oattestmodule.h"
@@ -15,15 +17,8 @@
 
 namespace {
 
-using Pairs = QList<QPair<QString, QString>>;
-
-Pairs PairsOf(const TestResults &results)
-{
-    Pairs pairs;
-    for (const TestCaseResult &entry : results.caseResults)
-        pairs.append({entry.testCase, entry.result});
-    return pairs;
-}
+using moduletest::Pairs;
+using moduletest::PairsOf;
 
 class LogFiles : public ::testing::Test
 {

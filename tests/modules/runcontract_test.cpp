@@ -2,6 +2,8 @@
 // real handset cannot provoke (failing copies, modules that never stop, logs
 // that never complete), driven through a mock handset.
 
+#include "moduletest.h"
+
 #include "log/log.h"
 #include "modules/ctfapplettestmodule.h"
 #include "modules/ctftestmodule.h"
@@ -42,22 +44,8 @@ auto CopiesContent(const QByteArray &content)
     };
 }
 
-QSharedPointer<_CompilerVariant> Target(IKestoDevice::Platform arch, const QString &package)
-{
-    QSharedPointer<_CompilerVariant> variant(new _CompilerVariant);
-    variant->name = QStringLiteral("t");
-    variant->arch = arch;
-    variant->build = QStringLiteral("Release");
-    variant->packagePath = package;
-    return variant;
-}
-
-Applet AppletWithId(unsigned int id)
-{
-    Applet applet;
-    applet.appletid = id;
-    return applet;
-}
+using moduletest::AppletWithId;
+using moduletest::Target;
 
 class RunContract : public ::testing::Test
 {
@@ -161,11 +149,11 @@ TEST_F(RunContract, InstallTestNeedsATargetForThePlatform)
 {
     SecondaryModule module;
     device.platform = IKestoDevice::PLATFORM_ARM;
-    module.targets.insert(QStringLiteral("t"), Target(IKestoDevice::PLATFORM_WIN32, QStringLiteral("/p.kestix")));
+    module.targets.insert(QStringLiteral("t"), Target(QStringLiteral("/p.kestix"), IKestoDevice::PLATFORM_WIN32));
     EXPECT_CALL(device, InstallPackage(_)).Times(0);
     EXPECT_FALSE(module.InstallTest(&device));
 
-    module.targets.insert(QStringLiteral("t"), Target(IKestoDevice::PLATFORM_ARM, QStringLiteral("/p.kestix")));
+    module.targets.insert(QStringLiteral("t"), Target(QStringLiteral("/p.kestix"), IKestoDevice::PLATFORM_ARM));
     ::testing::Mock::VerifyAndClearExpectations(&device);
     EXPECT_CALL(device, InstallPackage(QStringLiteral("/p.kestix"))).WillOnce(Return(0u));
     EXPECT_CALL(device, FindModule(0u, _)).WillOnce(DoAll(SetArgReferee<1>(QStringLiteral("fs:/usermods/h/")), Return(0u)));
@@ -312,7 +300,7 @@ TEST_F(RunContract, AppletsThatNeverStopTimeOut)
     applet.SetLogger(&log);
     EXPECT_FALSE(applet.Run(&device, env)); // no applets: nothing installed
     applet.applets << AppletWithId(0xff);
-    applet.targets.insert(QStringLiteral("t"), Target(IKestoDevice::PLATFORM_UNKNOWN, QStringLiteral("/a.kestix")));
+    applet.targets.insert(QStringLiteral("t"), Target(QStringLiteral("/a.kestix"), IKestoDevice::PLATFORM_UNKNOWN));
     EXPECT_CALL(device, InstallPackage(_)).WillRepeatedly(Return(0u));
     EXPECT_CALL(device, StartApplet(0xffu, QString())).WillOnce(Return(0u)).WillOnce(Return(3u));
     int polls = 0;
@@ -341,7 +329,7 @@ TEST_F(RunContract, CtfRunResetsTheLogAndStartsThePreferredProgram)
         ctf.programs << program;
     }
     EXPECT_EQ(ctf.ModuleName(), QStringLiteral("Foo_k_main"));
-    ctf.targets.insert(QStringLiteral("t"), Target(IKestoDevice::PLATFORM_UNKNOWN, QStringLiteral("/c.kestix")));
+    ctf.targets.insert(QStringLiteral("t"), Target(QStringLiteral("/c.kestix"), IKestoDevice::PLATFORM_UNKNOWN));
     env.insert(QStringLiteral("DataCachePath"), dir.path());
 
     EXPECT_CALL(device, CopyFileToDevice(QDir::cleanPath(dir.path()) + QStringLiteral("/CTF.log"),

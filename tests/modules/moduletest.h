@@ -1,0 +1,47 @@
+#pragma once
+
+// Helpers shared by the module kind tests.
+
+#include "catalogue/compilervariant.h"
+#include "modules/testresults.h"
+#include "resources/mif.h"
+
+#include <QFileInfo>
+#include <QList>
+#include <QPair>
+#include <QSharedPointer>
+#include <QString>
+
+namespace moduletest {
+
+using Pairs = QList<QPair<QString, QString>>;
+
+// The verdicts of results as (test case, result) pairs, in order.
+inline Pairs PairsOf(const TestResults &results)
+{
+    Pairs pairs;
+    for (const TestCaseResult &entry : results.caseResults)
+        pairs.append({entry.testCase, entry.result});
+    return pairs;
+}
+
+// A release build of package for arch, named after the package file.
+inline QSharedPointer<_CompilerVariant> Target(const QString &package,
+                                               IKestoDevice::Platform arch = IKestoDevice::PLATFORM_WIN32)
+{
+    QSharedPointer<_CompilerVariant> variant(new _CompilerVariant);
+    variant->name = QFileInfo(package).completeBaseName();
+    variant->arch = arch;
+    variant->build = QStringLiteral("Release");
+    variant->packagePath = package;
+    return variant;
+}
+
+inline Applet AppletWithId(unsigned int id)
+{
+    Applet applet;
+    applet.appletid = id;
+    return applet;
+}
+
+} // namespace moduletest
