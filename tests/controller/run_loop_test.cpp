@@ -122,6 +122,17 @@ protected:
 
     void TearDown() override { m_harness.DisconnectTarget(); }
 
+    // The handset goes offline while module's log is polled.
+    void LoseHandsetWhilePolling(RecordingModule &module)
+    {
+        module.pollsNeeded = 5;
+        module.onPoll = [this](IKestoDevice *device) {
+            testutil::WriteFile(m_handsets.HandsetFolder(QStringLiteral("phone")) + QStringLiteral("/offline"),
+                                QByteArray());
+            device->FileExists(QStringLiteral("fs:/anything"));
+        };
+    }
+
     // A module queued for the run and known to the kit catalogue.
     QSharedPointer<RecordingModule> Queue(const QString &name, const QString &type)
     {
@@ -290,12 +301,7 @@ TEST(RunLoopSimulator, SimulatorHandsetsArePolledEveryQuarterSecond)
 TEST_F(RunLoopTest, LostHandsetEndsTheRunWithoutUnloading)
 {
     QSharedPointer<RecordingModule> first = Queue(QStringLiteral("A"), QStringLiteral("ctf"));
-    first->pollsNeeded = 5;
-    first->onPoll = [this](IKestoDevice *device) {
-        testutil::WriteFile(m_handsets.HandsetFolder(QStringLiteral("phone")) + QStringLiteral("/offline"),
-                            QByteArray());
-        device->FileExists(QStringLiteral("fs:/anything"));
-    };
+    LoseHandsetWhilePolling(*first);
     Queue(QStringLiteral("B"), QStringLiteral("ctf"));
 
     EXPECT_FALSE(m_harness.Run());
@@ -457,12 +463,7 @@ TEST_F(RunLoopTest, SourceRunKeepsFrameworksUntilTheEndWhenAsked)
 TEST_F(RunLoopTest, SourceIsToldWhichModuleTheLostHandsetInterrupted)
 {
     QSharedPointer<RecordingModule> first = Queue(QStringLiteral("A"), QStringLiteral("ctf"));
-    first->pollsNeeded = 5;
-    first->onPoll = [this](IKestoDevice *device) {
-        testutil::WriteFile(m_handsets.HandsetFolder(QStringLiteral("phone")) + QStringLiteral("/offline"),
-                            QByteArray());
-        device->FileExists(QStringLiteral("fs:/anything"));
-    };
+    LoseHandsetWhilePolling(*first);
     RecordingSource source({first, Queue(QStringLiteral("B"), QStringLiteral("ctf"))}, true);
     EXPECT_FALSE(m_harness.Run(source));
     EXPECT_EQ(source.outcomes, QStringList{QStringLiteral("A %1").arg(ModuleSource::Interrupted)});
