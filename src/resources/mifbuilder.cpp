@@ -1,6 +1,7 @@
 #include "resources/mifbuilder.h"
 
 #include "resources/kestoresources.h"
+#include "resources/sysresource.h"
 
 #include <QDataStream>
 #include <QIODevice>
@@ -11,10 +12,9 @@ constexpr quint16 kHeaderId = 0;
 constexpr quint16 kClassesId = 1;
 constexpr quint16 kAppletsId = 2;
 constexpr int kHeaderSize = 40;
-constexpr quint32 kSuiteProgramType = 0x01010100;
-// A key of exactly four bytes reads back as a number, so text keys are
-// padded to a multiple of four and never to four.
-constexpr int kNumericKeySize = 4;
+// A key of exactly SysResource::kNumericKeySize bytes reads back as a
+// number, so text keys are padded to a multiple of four and never to four.
+constexpr int kNumericKeySize = SysResource::kNumericKeySize;
 
 QByteArray PaddedKey(const QString &key)
 {
@@ -68,7 +68,7 @@ void MifBuilder::AddSuiteProgram(const QString &key)
     const QByteArray bytes = PaddedKey(key);
     QByteArray block;
     QDataStream out(&block, QIODevice::WriteOnly);
-    LittleEndian(out) << quint16(bytes.size()) << kSuiteProgramType;
+    LittleEndian(out) << quint16(bytes.size()) << SysResource::kTypeKeyedProgram;
     out.writeRawData(bytes.constData(), int(bytes.size()));
     m_programs.append(block);
 }

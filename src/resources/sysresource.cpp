@@ -12,9 +12,7 @@ constexpr quint32 kTypeProgramName = 0x0103C6D9;
 constexpr quint32 kTypeService = 0x01089D3C;
 constexpr quint32 kTypeServer = 0x0108AC1E;
 constexpr quint32 kTypePrivilege = 0x0108BFD2;
-constexpr quint32 kTypeKeyedProgram = 0x01010100;
 constexpr quint32 kTypeIgnoredFour = 0x010C02E5;
-constexpr int kNumericKeySize = 4;
 
 QByteArray UpToNul(const QByteArray &bytes)
 {

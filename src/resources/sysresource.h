@@ -25,6 +25,10 @@ struct HARNESS_EXPORT SysResource
     // Program records.
     static constexpr quint32 kTypeProgram = 0x0102C305;
     static constexpr quint32 kTypeProgramAlt = 0x0102FAF7;
+    // Records whose key names a program ("a:b:<program name>").
+    static constexpr quint32 kTypeKeyedProgram = 0x01010100;
+    // A key of exactly this many bytes is a number, any other is text.
+    static constexpr int kNumericKeySize = 4;
 
     SysResource();
     virtual ~SysResource();
