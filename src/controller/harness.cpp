@@ -42,6 +42,11 @@ void Harness::LogMessage(const QString &message, bool echo)
         m_logger->LogMessage(message, echo);
 }
 
+void Harness::SetRunObserver(RunObserver *observer)
+{
+    m_observer = observer;
+}
+
 void Harness::SetNoDelete(bool noDelete)
 {
     m_noDelete = noDelete;

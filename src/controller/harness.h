@@ -13,6 +13,8 @@
 class Log;
 class Manifest;
 class ModuleSource;
+class RunObserver;
+struct TestResults;
 class ProcessedResults;
 class _Framework;
 class _TestModule;
@@ -51,6 +53,10 @@ public:
 
     // When set, modules stay installed on the handset after the run.
     void SetNoDelete(bool noDelete);
+    // Told about every module the run loop takes (Run() and Run(source)),
+    // with the verdicts recorded for it in this run; not owned, null for
+    // none.
+    void SetRunObserver(RunObserver *observer);
     void SetRunOption(const QString &option);
     // Milliseconds paused before copying a module's logs; text that is not an
     // unsigned 32-bit decimal number stores 0.
@@ -211,6 +217,9 @@ private:
     // Parses the module's logs and records the verdicts in the
     // processed-results file.
     void UpdateProcessedModulesXML(QSharedPointer<_TestModule> module);
+    // The same; parsed receives the verdicts recorded. False when no log
+    // was recognised.
+    bool RecordVerdicts(QSharedPointer<_TestModule> module, TestResults &parsed);
     // Sets "ProcessedResultsPath" below "LogPath" + "/" + folder when absent.
     void EnsureProcessedResultsPath(const QString &folder);
     // The run loop over the modules of source, once set up and connected.
@@ -260,4 +269,5 @@ private:
     // Process writes the held document once at the end; Run after every
     // module.
     bool m_deferResultsSave = false;
+    RunObserver *m_observer = nullptr;
 };

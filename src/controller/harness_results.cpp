@@ -48,8 +48,14 @@ void Harness::EnsureProcessedResultsPath(const QString &folder)
 
 void Harness::UpdateProcessedModulesXML(QSharedPointer<_TestModule> module)
 {
+    TestResults parsed;
+    RecordVerdicts(module, parsed);
+}
+
+bool Harness::RecordVerdicts(QSharedPointer<_TestModule> module, TestResults &parsed)
+{
     if (!module)
-        return;
+        return false;
     EnsureProcessedResultsPath(QStringLiteral("processedResults"));
     const QString path = m_environment.value(EnvironmentKey::ProcessedResultsPath);
 
@@ -61,9 +67,8 @@ void Harness::UpdateProcessedModulesXML(QSharedPointer<_TestModule> module)
     if (results->Path() != path || !results->Root())
         results->Open(path, m_kitManifest.data(), m_platformManifest.data(), m_logger);
 
-    TestResults parsed;
     if (!module->ParseLog(parsed))
-        return;
+        return false;
 
     QSharedPointer<_TestModule> known;
     if (m_kitManifest)
@@ -96,4 +101,5 @@ void Harness::UpdateProcessedModulesXML(QSharedPointer<_TestModule> module)
         results->savePending = true;
     else
         results->Save();
+    return true;
 }

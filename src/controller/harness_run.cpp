@@ -78,6 +78,25 @@ struct RunFramework
 
 ModuleSource::~ModuleSource() = default;
 
+RunObserver::~RunObserver() = default;
+
+QString ModuleRecord::Reason() const
+{
+    switch (outcome) {
+    case ModuleSource::Recorded:
+        return parsed ? QString() : QStringLiteral("no log was recognised");
+    case ModuleSource::NoLogs:
+        return QStringLiteral("no log was found");
+    case ModuleSource::StartFailed:
+        return QStringLiteral("install or start failed");
+    case ModuleSource::NoFramework:
+        return QStringLiteral("no framework for test type %1").arg(testType);
+    case ModuleSource::Interrupted:
+        break;
+    }
+    return QStringLiteral("handset lost");
+}
+
 void ModuleSource::Finished(const QSharedPointer<_TestModule> &, Outcome)
 {
 }
@@ -135,7 +154,25 @@ bool Harness::RunModules(ModuleSource &source)
         entry.framework->Unload(m_device, m_environment);
     };
 
+    ModuleRecord record;
+    Clock::Timer timer;
+    // Tells the source and the observer how the module in hand ended.
+    const auto finish = [&](const QSharedPointer<_TestModule> &module, ModuleSource::Outcome outcome) {
+        record.outcome = outcome;
+        record.durationMs = timer.Elapsed();
+        if (m_observer)
+            m_observer->ModuleEnded(record);
+        source.Finished(module, outcome);
+    };
+
     while (const QSharedPointer<_TestModule> module = source.Next()) {
+        timer.Restart();
+        record = ModuleRecord();
+        record.name = module->moduleName;
+        record.source = module->Source();
+        record.testType = module->TestType();
+        record.handset = m_device->GetConnectTarget().name;
+        record.start = QDateTime::currentDateTimeUtc();
         module->SetLogger(m_logger);
         const QString name = module->moduleName;
         const QString testType = module->TestType();
@@ -157,7 +194,7 @@ bool Harness::RunModules(ModuleSource &source)
             if (!entry.framework) {
                 LogMessage(QStringLiteral("Framework %1 not found.\n").arg(testType), true);
                 result = true;
-                source.Finished(module, ModuleSource::NoFramework);
+                finish(module, ModuleSource::NoFramework);
                 continue;
             }
             entry.framework->SetLogger(m_logger);
@@ -189,17 +226,17 @@ bool Harness::RunModules(ModuleSource &source)
             LogMessage(QStringLiteral("Test %1 Failed\n").arg(name), true);
             // A handset that went away fails every module after this one.
             if (m_device->connectionLost) {
-                source.Finished(module, ModuleSource::Interrupted);
+                finish(module, ModuleSource::Interrupted);
                 ConnectionDied();
                 return false;
             }
-            source.Finished(module, ModuleSource::StartFailed);
+            finish(module, ModuleSource::StartFailed);
             continue;
         }
 
         LogMessage(QStringLiteral("   Test %1 Run\n").arg(name), true);
         if (!WaitForLog(module)) {
-            source.Finished(module, ModuleSource::Interrupted);
+            finish(module, ModuleSource::Interrupted);
             return false;
         }
 
@@ -211,8 +248,8 @@ bool Harness::RunModules(ModuleSource &source)
             LogMessage(QStringLiteral("   No logs found for %1\n").arg(name), true);
             // Logs that could not be fetched from a handset that went away
             // are not the module's fault: it has to run again elsewhere.
-            source.Finished(module, m_device->connectionLost ? ModuleSource::Interrupted
-                                                             : ModuleSource::NoLogs);
+            finish(module, m_device->connectionLost ? ModuleSource::Interrupted
+                                                    : ModuleSource::NoLogs);
             if (ConnectionDied())
                 return false;
             continue;
@@ -222,10 +259,11 @@ bool Harness::RunModules(ModuleSource &source)
             LogMessage(QStringLiteral("   Removing test %1\n").arg(name), true);
         }
         module->PostProcess(m_environment);
+        record.logs = module->desktopLogFiles;
         // The copied logs are recorded even when the handset went away while
         // the module was being removed.
-        UpdateProcessedModulesXML(module);
-        source.Finished(module, ModuleSource::Recorded);
+        record.parsed = RecordVerdicts(module, record.results);
+        finish(module, ModuleSource::Recorded);
         if (ConnectionDied())
             return false;
     }

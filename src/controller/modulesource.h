@@ -1,8 +1,12 @@
 #pragma once
 
 #include "common/export.h"
+#include "modules/testresults.h"
 
+#include <QDateTime>
 #include <QSharedPointer>
+#include <QString>
+#include <QStringList>
 
 class _TestModule;
 
@@ -16,7 +20,7 @@ public:
     enum Outcome {
         Recorded,      // its logs were copied, post-processed and recorded
         NoLogs,        // it ran but no logs were found
-        StartFailed,   // it could not be started
+        StartFailed,   // it could not be installed or started
         NoFramework,   // the kit has no framework for its test type
         Interrupted,   // the handset was lost before its logs were copied
     };
@@ -33,4 +37,35 @@ public:
     // test type. True: every framework the run loaded stays on the handset
     // until the run ends, for sources whose test types come in any order.
     virtual bool KeepFrameworks() const;
+};
+
+// What one run loop saw of one module it took: where and when it ran, how it
+// ended, and the verdicts its logs gave in this run.
+struct HARNESS_EXPORT ModuleRecord
+{
+    QString name;
+    QString source;        // "KVK" or "PVS"
+    QString testType;
+    QString handset;       // the connected handset's name
+    QDateTime start;       // UTC, when the loop took the module
+    qint64 durationMs = 0; // until the outcome was known
+    ModuleSource::Outcome outcome = ModuleSource::Interrupted;
+    // The verdicts the module's logs gave when they were recorded; empty
+    // unless outcome is Recorded and a log was recognised.
+    bool parsed = false;
+    TestResults results;
+    QStringList logs;      // host paths of the logs copied in this run
+
+    // Why the module did not run or finish, in a few words; empty when it
+    // was recorded with verdicts.
+    QString Reason() const;
+};
+
+// Told about every module a run loop takes, as soon as its outcome is known
+// (Harness::SetRunObserver). Called on the run loop's thread.
+class HARNESS_EXPORT RunObserver
+{
+public:
+    virtual ~RunObserver();
+    virtual void ModuleEnded(const ModuleRecord &record) = 0;
 };

@@ -21,7 +21,7 @@
 class ShardedRun::Queue
 {
 public:
-    explicit Queue(QList<ModuleResult> &results) : m_results(results)
+    Queue(QList<ModuleResult> &results, const std::atomic<bool> &stop) : m_results(results), m_stop(stop)
     {
         for (qsizetype i = 0; i < results.size(); ++i)
             m_pending.push_back(i);
@@ -34,6 +34,8 @@ public:
     {
         std::unique_lock<std::mutex> lock(m_mutex);
         for (;;) {
+            if (m_stop)
+                return -1;
             if (!m_pending.empty()) {
                 const qsizetype index = m_pending.front();
                 m_pending.pop_front();
@@ -49,11 +51,14 @@ public:
 
     // A module that was taken has ended on handset; an interrupted one goes
     // back to the front of the queue.
-    void Done(qsizetype index, const QString &handset, ModuleSource::Outcome outcome)
+    void Done(qsizetype index, const QString &handset, ModuleSource::Outcome outcome,
+              const ModuleRecord &record)
     {
         {
             const std::lock_guard<std::mutex> lock(m_mutex);
             --m_inHand;
+            if (!record.name.isEmpty())
+                m_results[index].record = record;
             if (outcome == ModuleSource::Interrupted) {
                 m_pending.push_front(index);
             } else {
@@ -78,11 +83,12 @@ private:
     std::deque<qsizetype> m_pending;
     int m_inHand = 0;
     QList<ModuleResult> &m_results;
+    const std::atomic<bool> &m_stop;
 };
 
 // One handset: its Harness runs the modules that it takes from the queue, in
 // a thread of its own.
-class ShardedRun::Worker : public ModuleSource
+class ShardedRun::Worker : public ModuleSource, public RunObserver
 {
 public:
     Worker(ShardedRun &run, Queue &queue, Harness &harness, HandsetResult &result)
@@ -128,7 +134,12 @@ public:
             if (!module) {
                 m_run.LogMessage(QStringLiteral("Module %1 is not in the catalogues of handset %2.\n")
                                      .arg(m_names.at(index), Name()));
-                m_queue.Done(index, Name(), ModuleSource::StartFailed);
+                ModuleRecord record;
+                record.name = m_names.at(index);
+                record.handset = Name();
+                record.start = QDateTime::currentDateTimeUtc();
+                record.outcome = ModuleSource::StartFailed;
+                m_queue.Done(index, Name(), ModuleSource::StartFailed, record);
                 continue;
             }
             m_current = index;
@@ -142,11 +153,14 @@ public:
     {
         if (m_current < 0)
             return;
-        m_queue.Done(m_current, Name(), outcome);
+        m_queue.Done(m_current, Name(), outcome, m_record);
         if (outcome != Interrupted)
             ++m_result.modulesRun;
         m_current = -1;
+        m_record = ModuleRecord();
     }
+
+    void ModuleEnded(const ModuleRecord &record) override { m_record = record; }
 
     bool KeepFrameworks() const override { return true; }
 
@@ -160,7 +174,21 @@ private:
     void Work()
     {
         const Clock::Timer timer;
-        m_harness.Run(*this);
+        // A target that names a listed handset exactly means that handset
+        // and no other whose name merely contains it.
+        QList<ConnectTarget> listed;
+        Harness::ListTargets(listed);
+        bool exact = false;
+        for (const ConnectTarget &target : std::as_const(listed)) {
+            if (target.name == m_harness.GetTarget()) {
+                exact = true;
+                m_harness.ConnectToTarget(target);
+            }
+        }
+        m_harness.SetRunObserver(this);
+        if (!exact || !m_harness.ConnectedTarget().isEmpty())
+            m_harness.Run(*this);
+        m_harness.SetRunObserver(nullptr);
         m_result.handset = Name();
         m_result.connected = !m_harness.ConnectedTarget().isEmpty();
         // The thread that opened the connection closes it: no handset object
@@ -192,6 +220,7 @@ private:
     qsizetype m_testCasesFor = -1;
     QStringList m_testCases;
     bool m_exhausted = false;
+    ModuleRecord m_record;
     std::thread m_thread;
 };
 
@@ -255,7 +284,7 @@ bool ShardedRun::Run(const QList<QSharedPointer<_TestModule>> &selection)
         handset.handset = handset.target;
         m_handsets.append(handset);
     }
-    Queue queue(m_modules);
+    Queue queue(m_modules, m_stop);
     std::vector<std::unique_ptr<Worker>> workers;
     for (qsizetype i = 0; i < m_harnesses.size(); ++i) {
         workers.push_back(std::make_unique<Worker>(*this, queue, *m_harnesses.at(i), m_handsets[i]));
@@ -273,6 +302,16 @@ bool ShardedRun::Run(const QList<QSharedPointer<_TestModule>> &selection)
                        .arg(notRun.join(QStringLiteral(", "))));
     }
     return notRun.isEmpty();
+}
+
+void ShardedRun::Stop()
+{
+    m_stop = true;
+}
+
+bool ShardedRun::Stopped() const
+{
+    return m_stop;
 }
 
 QList<ShardedRun::ModuleResult> ShardedRun::Modules() const

@@ -9,6 +9,8 @@
 #include <QString>
 #include <QStringList>
 
+#include <atomic>
+
 class Harness;
 class Log;
 class _TestModule;
@@ -17,7 +19,8 @@ class _TestModule;
 // modules form one queue in run order; one worker thread per handset, each
 // with its own Harness (its own connection, catalogues, frameworks, log
 // folder and processed-results file), takes the next module whenever it is
-// free. A module runs on exactly one handset. A handset that is lost stops
+// free. A module runs on exactly one handset. A Harness whose target is
+// exactly the name of a listed handset connects to that handset only. A handset that is lost stops
 // taking work: the module it had in hand goes back to the front of the queue
 // for the others. When every handset is gone, the modules left are reported
 // as not run.
@@ -44,6 +47,10 @@ public:
         bool ran = false;  // a handset took it and it ended (any outcome)
         ModuleSource::Outcome outcome = ModuleSource::Interrupted;
         int attempts = 0;  // how many handsets took it
+        // What the last handset that took it saw: start, duration, copied
+        // logs and the verdicts recorded in this run. Empty when no handset
+        // took it.
+        ModuleRecord record;
     };
 
     // One handset of the run.
@@ -79,6 +86,13 @@ public:
     // every handset was gone (NotRun()).
     bool Run(const QList<QSharedPointer<_TestModule>> &selection);
 
+    // Makes the run stop taking modules: each handset finishes the module
+    // in hand (removed from the handset, its logs recorded), unloads its
+    // frameworks and ends; the modules not taken are left not run. Only
+    // sets a flag, so it may be called from any thread or a signal handler.
+    void Stop();
+    bool Stopped() const;
+
     // Per module, in run order.
     QList<ModuleResult> Modules() const;
     // Per handset, in the order they were added.
@@ -91,6 +105,8 @@ private:
     class Worker;
 
     void LogMessage(const QString &message) const;
+
+    std::atomic<bool> m_stop{false};
 
     Log *m_logger = nullptr;
     QList<Harness *> m_harnesses;
