@@ -10,6 +10,7 @@ enum ExitStatus {
     ExitSuccess = 0,
     ExitTestFailed = 1,  // a test case failed or a module could not run
     ExitUsage = 2,       // bad usage or a set-up failure (no kit, no handset, ...)
+    ExitInterrupted = 130,  // a run stopped by SIGINT or SIGTERM
 };
 
 // One sub-command: its name, a one-line summary and its entry point, which
@@ -24,8 +25,11 @@ struct Command
 
 // The commands each part of the tool contributes.
 QList<Command> InspectionCommands();
+QList<Command> ListingCommands();
+QList<Command> ModuleCommands();
 QList<Command> RunCommands();
-QList<Command> RunnerCommands();
+QList<Command> ProcessCommands();
+QList<Command> ReportCommands();
 QList<Command> DemoCommands();
 
 // Writes to standard output / standard error as UTF-8.

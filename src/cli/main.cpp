@@ -25,8 +25,11 @@ namespace {
 QList<Command> AllCommands()
 {
     QList<Command> commands;
-    commands += RunnerCommands();
+    commands += ListingCommands();
+    commands += ModuleCommands();
     commands += RunCommands();
+    commands += ProcessCommands();
+    commands += ReportCommands();
     commands += InspectionCommands();
     commands += DemoCommands();
     return commands;
@@ -57,6 +60,13 @@ int main(int argc, char **argv)
         return ExitUsage;
     }
     const QString name = arguments.at(1);
+    // "help COMMAND" is "COMMAND --help".
+    if (name == QLatin1String("help") && arguments.size() > 2) {
+        for (const Command &command : commands) {
+            if (arguments.at(2) == QLatin1String(command.name))
+                return command.run({QStringLiteral("harness ") + arguments.at(2), QStringLiteral("--help")});
+        }
+    }
     if (name == QLatin1String("--help") || name == QLatin1String("-h") || name == QLatin1String("help")) {
         Out(Usage(commands));
         return ExitSuccess;

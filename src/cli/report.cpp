@@ -1,14 +1,19 @@
+// The reports of the tool (summary, JUnit XML, JSON) and the report command.
+
 #include "cli/report.h"
 
 #include "cli/commands.h"
+#include "cli/options.h"
 
 #include "common/xmlwriter.h"
 
 #include <algorithm>
 #include <utility>
 
+#include <QDir>
 #include <QDomDocument>
 #include <QFile>
+#include <QFileInfo>
 #include <QJsonArray>
 #include <QJsonDocument>
 #include <QJsonObject>
@@ -25,23 +30,66 @@ QString Cell(const QString &text, int width)
     return text.leftJustified(width, QLatin1Char(' '), false);
 }
 
+QString Plural(int count, const char *noun)
+{
+    return QStringLiteral("%1 %2%3").arg(count).arg(QLatin1String(noun)).arg(count == 1 ? "" : "s");
+}
+
+QString Seconds(qint64 ms)
+{
+    return QString::number(double(qMax<qint64>(ms, 0)) / 1000.0, 'f', 3);
+}
+
+// JUnit time stamps are ISO 8601 without a zone; ours are UTC.
+QString JUnitTime(const QDateTime &utc)
+{
+    return utc.toUTC().toString(QStringLiteral("yyyy-MM-ddTHH:mm:ss"));
+}
+
+QString IsoTime(const QDateTime &utc)
+{
+    return utc.isValid() ? utc.toUTC().toString(Qt::ISODateWithMs) : QString();
+}
+
+QString LogText(const ModuleReport &module)
+{
+    return module.logs.isEmpty() ? QString()
+                                 : QStringLiteral(" (log: %1)").arg(module.logs.join(QStringLiteral(", ")));
+}
+
 } // namespace
+
+QString VerdictLines(const QString &logPath, const QString &testCase, const QString &verdict)
+{
+    // How far below the line naming the test case its verdict may stand.
+    constexpr int kVerdictReach = 4;
+    QFile file(logPath);
+    if (testCase.isEmpty() || !file.open(QIODevice::ReadOnly | QIODevice::Text) || file.size() > (16 << 20))
+        return {};
+    const QStringList lines = QString::fromUtf8(file.readAll()).split(QLatin1Char('\n'));
+    for (qsizetype i = 0; i < lines.size(); ++i) {
+        if (!lines.at(i).contains(testCase))
+            continue;
+        for (qsizetype j = i; j < qMin(lines.size(), i + kVerdictReach + 1); ++j) {
+            if (j > i && lines.at(j).contains(testCase))
+                break;
+            if (lines.at(j).contains(verdict, Qt::CaseInsensitive))
+                return j == i ? lines.at(i).trimmed() : lines.at(i).trimmed() + QStringLiteral(" / ") + lines.at(j).trimmed();
+        }
+    }
+    return {};
+}
 
 int ModuleReport::Count(const QString &result) const
 {
-    int count = 0;
-    for (const auto &testCase : testCases)
-        count += testCase.second == result ? 1 : 0;
-    return count;
+    return int(std::count_if(testCases.cbegin(), testCases.cend(),
+                             [&](const TestCaseReport &testCase) { return testCase.result == result; }));
 }
 
 bool ModuleReport::Executed() const
 {
-    for (const auto &testCase : testCases) {
-        if (testCase.second != kUnexecuted)
-            return true;
-    }
-    return false;
+    return std::any_of(testCases.cbegin(), testCases.cend(),
+                       [](const TestCaseReport &testCase) { return testCase.result != kUnexecuted; });
 }
 
 bool RunReport::Read(const QString &path, QString *error)
@@ -80,7 +128,7 @@ bool RunReport::Read(const QString &path, QString *error)
         for (QDomElement tc = module.firstChildElement(); !tc.isNull(); tc = tc.nextSiblingElement()) {
             if (tc.tagName().toLower() == QLatin1String("testcase"))
                 report.testCases.append({tc.attribute(QStringLiteral("name")),
-                                         tc.attribute(QStringLiteral("result"))});
+                                         tc.attribute(QStringLiteral("result")), QString()});
         }
         modules.append(report);
     }
@@ -95,9 +143,25 @@ int RunReport::Total(const QString &result) const
     return total;
 }
 
+int RunReport::Errors() const
+{
+    int errors = 0;
+    for (const ModuleReport &module : modules) {
+        if (!module.Finished())
+            errors += qMax(1, int(module.testCases.size()));
+    }
+    return errors;
+}
+
+int RunReport::NotFinished() const
+{
+    return int(std::count_if(modules.cbegin(), modules.cend(),
+                             [](const ModuleReport &module) { return !module.Finished(); }));
+}
+
 QString RunReport::Summary(bool withHandset) const
 {
-    const QString totalLabel = QStringLiteral("Total (%1 modules)").arg(modules.size());
+    const QString totalLabel = QStringLiteral("Total (%1)").arg(Plural(int(modules.size()), "module"));
     int nameWidth = int(totalLabel.size());
     int handsetWidth = 7;
     for (const ModuleReport &module : modules) {
@@ -122,10 +186,15 @@ QString RunReport::Summary(bool withHandset) const
     text += row(totalLabel, QString(),
                 QString::number(Total(kPass)), QString::number(Total(kFail)),
                 QString::number(Total(kUnsupported)), QString::number(Total(kUnexecuted)));
+    for (const ModuleReport &m : modules) {
+        if (!m.Finished())
+            text += QStringLiteral("Not finished: %1%2: %3\n")
+                        .arg(m.name, m.handset.isEmpty() ? QString() : QStringLiteral(" on ") + m.handset, m.reason);
+    }
     return text;
 }
 
-bool RunReport::WriteJUnit(const QString &path, QString *error) const
+QByteArray RunReport::JUnit() const
 {
     QDomDocument document;
     document.appendChild(document.createProcessingInstruction(
@@ -134,67 +203,124 @@ bool RunReport::WriteJUnit(const QString &path, QString *error) const
     suites.setAttribute(QStringLiteral("name"), QStringLiteral("harness"));
     document.appendChild(suites);
     int tests = 0;
+    int totalFailures = 0;
+    int id = 0;
     for (const ModuleReport &module : modules) {
         QDomElement suite = document.createElement(QStringLiteral("testsuite"));
-        suite.setAttribute(QStringLiteral("name"), module.name);
-        suite.setAttribute(QStringLiteral("tests"), module.testCases.size());
-        suite.setAttribute(QStringLiteral("failures"), module.Count(kFail));
-        suite.setAttribute(QStringLiteral("errors"), 0);
-        suite.setAttribute(QStringLiteral("skipped"), module.testCases.size() - module.Count(kPass) - module.Count(kFail));
-        if (!module.handset.isEmpty())
-            suite.setAttribute(QStringLiteral("hostname"), module.handset);
-        tests += int(module.testCases.size());
-        for (const auto &testCase : module.testCases) {
+        const QString className = module.family.isEmpty() ? module.name : module.family + QLatin1Char('.') + module.name;
+        // A module that did not finish has no verdicts to trust: each of its
+        // test cases (or the module itself, without any) is an error.
+        QList<TestCaseReport> cases = module.testCases;
+        if (!module.Finished() && cases.isEmpty())
+            cases.append({module.name, kUnexecuted, QString()});
+        int failures = 0;
+        int errors = 0;
+        int skipped = 0;
+        for (const TestCaseReport &testCase : std::as_const(cases)) {
             QDomElement element = document.createElement(QStringLiteral("testcase"));
-            element.setAttribute(QStringLiteral("name"), testCase.first);
-            element.setAttribute(QStringLiteral("classname"),
-                                 module.family.isEmpty() ? module.name : module.family + QLatin1Char('.') + module.name);
-            if (testCase.second == kFail) {
+            element.setAttribute(QStringLiteral("name"), testCase.name);
+            element.setAttribute(QStringLiteral("classname"), className);
+            if (!module.Finished()) {
+                QDomElement error = document.createElement(QStringLiteral("error"));
+                error.setAttribute(QStringLiteral("message"), module.reason);
+                error.setAttribute(QStringLiteral("type"), QStringLiteral("not finished"));
+                error.appendChild(document.createTextNode(
+                    QStringLiteral("%1 did not finish: %2%3").arg(module.name, module.reason, LogText(module))));
+                element.appendChild(error);
+                ++errors;
+            } else if (testCase.result == kFail) {
                 QDomElement failure = document.createElement(QStringLiteral("failure"));
-                failure.setAttribute(QStringLiteral("message"), kFail);
+                failure.setAttribute(QStringLiteral("message"),
+                                     QStringLiteral("%1%2").arg(testCase.detail.isEmpty() ? QStringLiteral("test case %1 failed").arg(testCase.name)
+                                                                                          : testCase.detail,
+                                                                LogText(module)));
+                failure.setAttribute(QStringLiteral("type"), kFail);
                 element.appendChild(failure);
-            } else if (testCase.second != kPass) {
-                QDomElement skipped = document.createElement(QStringLiteral("skipped"));
-                skipped.setAttribute(QStringLiteral("message"), testCase.second);
-                element.appendChild(skipped);
+                ++failures;
+            } else if (testCase.result != kPass) {
+                QDomElement skip = document.createElement(QStringLiteral("skipped"));
+                skip.setAttribute(QStringLiteral("message"), testCase.result);
+                element.appendChild(skip);
+                ++skipped;
             }
             suite.appendChild(element);
         }
+        suite.setAttribute(QStringLiteral("name"), module.name);
+        suite.setAttribute(QStringLiteral("id"), id++);
+        suite.setAttribute(QStringLiteral("package"), module.family);
+        suite.setAttribute(QStringLiteral("tests"), cases.size());
+        suite.setAttribute(QStringLiteral("failures"), failures);
+        suite.setAttribute(QStringLiteral("errors"), errors);
+        suite.setAttribute(QStringLiteral("skipped"), skipped);
+        suite.setAttribute(QStringLiteral("time"), Seconds(module.durationMs));
+        if (module.start.isValid())
+            suite.setAttribute(QStringLiteral("timestamp"), JUnitTime(module.start));
+        if (!module.handset.isEmpty())
+            suite.setAttribute(QStringLiteral("hostname"), module.handset);
+        tests += int(cases.size());
+        totalFailures += failures;
         suites.appendChild(suite);
     }
     suites.setAttribute(QStringLiteral("tests"), tests);
-    suites.setAttribute(QStringLiteral("failures"), Total(kFail));
-    return XmlWriter::WriteDocument(document, path, 1, true, error);
+    suites.setAttribute(QStringLiteral("failures"), totalFailures);
+    suites.setAttribute(QStringLiteral("errors"), Errors());
+    if (durationMs >= 0)
+        suites.setAttribute(QStringLiteral("time"), Seconds(durationMs));
+    return XmlWriter::Serialize(document, 1);
 }
 
-bool RunReport::WriteJson(const QString &path, QString *error) const
+QByteArray RunReport::Json() const
 {
     QJsonArray list;
     for (const ModuleReport &module : modules) {
         QJsonArray cases;
-        for (const auto &testCase : module.testCases)
-            cases.append(QJsonObject{{QStringLiteral("name"), testCase.first},
-                                     {QStringLiteral("result"), testCase.second}});
+        for (const TestCaseReport &testCase : module.testCases)
+        {
+            QJsonObject object{{QStringLiteral("name"), testCase.name}, {QStringLiteral("result"), testCase.result}};
+            if (!testCase.detail.isEmpty())
+                object.insert(QStringLiteral("detail"), testCase.detail);
+            cases.append(object);
+        }
         QJsonObject object{{QStringLiteral("name"), module.name},
                            {QStringLiteral("family"), module.family},
                            {QStringLiteral("subfamily"), module.subFamily},
                            {QStringLiteral("source"), module.source},
+                           {QStringLiteral("finished"), module.Finished()},
                            {QStringLiteral("passed"), module.Count(kPass)},
                            {QStringLiteral("failed"), module.Count(kFail)},
                            {QStringLiteral("unsupported"), module.Count(kUnsupported)},
                            {QStringLiteral("unexecuted"), module.Count(kUnexecuted)},
                            {QStringLiteral("testcases"), cases}};
+        if (!module.reason.isEmpty())
+            object.insert(QStringLiteral("reason"), module.reason);
         if (!module.handset.isEmpty())
             object.insert(QStringLiteral("handset"), module.handset);
+        if (!module.host.isEmpty())
+            object.insert(QStringLiteral("host"), module.host);
+        if (module.start.isValid())
+            object.insert(QStringLiteral("start"), IsoTime(module.start));
+        if (module.durationMs >= 0)
+            object.insert(QStringLiteral("durationMs"), module.durationMs);
+        if (!module.logs.isEmpty())
+            object.insert(QStringLiteral("logs"), QJsonArray::fromStringList(module.logs));
         list.append(object);
     }
     const QJsonObject totals{{QStringLiteral("modules"), int(modules.size())},
+                             {QStringLiteral("notFinished"), NotFinished()},
                              {QStringLiteral("passed"), Total(kPass)},
                              {QStringLiteral("failed"), Total(kFail)},
                              {QStringLiteral("unsupported"), Total(kUnsupported)},
-                             {QStringLiteral("unexecuted"), Total(kUnexecuted)}};
-    const QJsonObject root{{QStringLiteral("modules"), list}, {QStringLiteral("totals"), totals}};
-    return XmlWriter::WriteFile(path, QJsonDocument(root).toJson(QJsonDocument::Indented), true, error);
+                             {QStringLiteral("unexecuted"), Total(kUnexecuted)},
+                             {QStringLiteral("errors"), Errors()}};
+    QJsonObject root{{QStringLiteral("modules"), list}, {QStringLiteral("totals"), totals}};
+    if (start.isValid()) {
+        root.insert(QStringLiteral("start"), IsoTime(start));
+        root.insert(QStringLiteral("durationMs"), durationMs);
+        root.insert(QStringLiteral("handsets"), QJsonArray::fromStringList(handsets));
+        root.insert(QStringLiteral("host"), host);
+        root.insert(QStringLiteral("interrupted"), interrupted);
+    }
+    return QJsonDocument(root).toJson(QJsonDocument::Indented);
 }
 
 void RunReport::DropNotExecuted()
@@ -206,32 +332,124 @@ void RunReport::DropNotExecuted()
 
 const QCommandLineOption &JUnitOption()
 {
-    static const QCommandLineOption option(QStringLiteral("junit"), QStringLiteral("Write a JUnit XML report to FILE."),
+    static const QCommandLineOption option(QStringLiteral("junit"),
+                                           QStringLiteral("Write a JUnit XML report to FILE ('-': standard output)."),
                                            QStringLiteral("FILE"));
     return option;
 }
 
 const QCommandLineOption &JsonOption()
 {
-    static const QCommandLineOption option(QStringLiteral("json"), QStringLiteral("Write a JSON summary to FILE."),
+    static const QCommandLineOption option(QStringLiteral("json"),
+                                           QStringLiteral("Write a JSON summary to FILE ('-': standard output)."),
                                            QStringLiteral("FILE"));
     return option;
 }
 
+bool CheckOutputPath(const QString &path, QString *error)
+{
+    if (path == QLatin1String("-"))
+        return true;
+    const QFileInfo info(path);
+    if (info.isDir()) {
+        *error = QStringLiteral("%1 is a folder").arg(path);
+        return false;
+    }
+    if (info.exists()) {
+        if (info.isWritable())
+            return true;
+        *error = QStringLiteral("%1 is not writable").arg(path);
+        return false;
+    }
+    const QFileInfo folder(info.absolutePath());
+    if (!folder.isDir()) {
+        *error = QStringLiteral("the folder %1 does not exist").arg(folder.filePath());
+        return false;
+    }
+    if (!folder.isWritable()) {
+        *error = QStringLiteral("the folder %1 is not writable").arg(folder.filePath());
+        return false;
+    }
+    return true;
+}
+
+bool CheckReportOutputs(const QCommandLineParser &parser, const QString &command)
+{
+    for (const QCommandLineOption *option : {&JUnitOption(), &JsonOption()}) {
+        QString error;
+        if (parser.isSet(*option) && !CheckOutputPath(parser.value(*option), &error)) {
+            Err(QStringLiteral("%1: cannot write --%2 %3: %4\n")
+                    .arg(command, option->names().constFirst(), parser.value(*option), error));
+            return false;
+        }
+    }
+    return true;
+}
+
 int PublishReport(const RunReport &report, const QCommandLineParser &parser, bool withHandset)
 {
-    Out(QStringLiteral("\n") + report.Summary(withHandset));
-    QString error;
+    const bool exportToOutput = (parser.isSet(JUnitOption()) && parser.value(JUnitOption()) == QLatin1String("-"))
+                                || (parser.isSet(JsonOption()) && parser.value(JsonOption()) == QLatin1String("-"));
+    const auto say = exportToOutput ? Err : Out;
+    say(QStringLiteral("\n") + report.Summary(withHandset));
     for (const auto &[option, json] : {std::pair{&JUnitOption(), false}, std::pair{&JsonOption(), true}}) {
         if (!parser.isSet(*option))
             continue;
         const QString path = parser.value(*option);
-        const bool ok = json ? report.WriteJson(path, &error) : report.WriteJUnit(path, &error);
-        if (!ok) {
-            Err(QStringLiteral("harness: cannot write %1: %2\n").arg(path, error));
+        const QByteArray bytes = json ? report.Json() : report.JUnit();
+        if (path == QLatin1String("-")) {
+            Out(QString::fromUtf8(bytes));
+            continue;
+        }
+        QString error;
+        if (!XmlWriter::WriteFile(path, bytes, true, &error)) {
+            Err(QStringLiteral("harness: cannot write %1: %2\n")
+                    .arg(path, error.isEmpty() ? QStringLiteral("unknown error") : error));
             return ExitUsage;
         }
-        Out(QStringLiteral("%1: %2\n").arg(json ? QStringLiteral("JSON summary") : QStringLiteral("JUnit report"), path));
+        say(QStringLiteral("%1: %2\n").arg(json ? QStringLiteral("JSON summary") : QStringLiteral("JUnit report"), path));
     }
     return ExitSuccess;
+}
+
+namespace {
+
+int ReportCommand(const QStringList &arguments)
+{
+    QCommandLineParser parser;
+    parser.setApplicationDescription(QStringLiteral(
+        "Prints the summary of a processed-results file, the verdicts gathered there over every run, "
+        "and exports it as JUnit XML or JSON.\n"
+        "Modules without any executed test case are left out unless --all is given.\n"
+        "Exit status 1 when a test case failed."));
+    parser.addPositionalArgument(QStringLiteral("RESULTS.xml"), QStringLiteral("The processed-results file."));
+    const QCommandLineOption all(QStringLiteral("all"), QStringLiteral("Include modules that never ran."));
+    parser.addOptions({JUnitOption(), JsonOption(), all});
+    int status = ExitSuccess;
+    if (!ParseArguments(parser, arguments, status, 1, 1))
+        return status;
+    if (!CheckReportOutputs(parser, arguments.at(0)))
+        return ExitUsage;
+
+    RunReport report;
+    QString error;
+    if (!report.Read(parser.positionalArguments().at(0), &error)) {
+        Err(QStringLiteral("%1: %2\n").arg(arguments.at(0), error));
+        return ExitUsage;
+    }
+    if (!parser.isSet(all))
+        report.DropNotExecuted();
+    const int published = PublishReport(report, parser, false);
+    if (published != ExitSuccess)
+        return published;
+    return report.Total(kFail) > 0 ? ExitTestFailed : ExitSuccess;
+}
+
+} // namespace
+
+QList<Command> ReportCommands()
+{
+    return {
+        {"report", "Summarise a processed-results file; export JUnit XML or JSON", ReportCommand},
+    };
 }

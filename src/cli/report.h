@@ -2,25 +2,52 @@
 
 #include <QCommandLineOption>
 #include <QCommandLineParser>
+#include <QDateTime>
 #include <QList>
 #include <QString>
+#include <QStringList>
 
-// Verdicts of one module as a processed-results file records them.
+// One test case of a module report.
+struct TestCaseReport
+{
+    QString name;
+    QString result;  // "pass", "fail", "unsupported", "unexecuted" or the log's own word
+    QString detail;  // for a failure: the log's lines that give the verdict, when found
+};
+
+// One module of a report: where and when it ran, how it ended and its
+// verdicts. Read from a processed-results file (the history view) only the
+// catalogue fields, the handset and the verdicts are known.
 struct ModuleReport
 {
     QString name;
     QString family;
     QString subFamily;
     QString source;
-    QString handset;  // the handset that ran it, when known
-    QList<QPair<QString, QString>> testCases;  // (name, result word)
+    QString host;       // the computer that drove the run
+    QString handset;    // the handset that ran it, when known
+    QDateTime start;    // UTC; invalid when unknown
+    qint64 durationMs = -1;  // -1 when unknown
+    // Why the module did not run or did not finish ("handset lost",
+    // "interrupted before it ran", ...); empty when it ran to its verdicts.
+    QString reason;
+    QStringList logs;   // host paths of the logs copied for it
+    QList<TestCaseReport> testCases;
 
     int Count(const QString &result) const;
     bool Executed() const;  // any test case with a verdict other than "unexecuted"
+    bool Finished() const { return reason.isEmpty(); }
 };
 
+// A report: one run as it happened (run), or the verdicts a processed-results
+// file has gathered over time (report).
 struct RunReport
 {
+    QString host;       // the computer that drove the run
+    QDateTime start;    // UTC; invalid for the history view
+    qint64 durationMs = -1;
+    QStringList handsets;
+    bool interrupted = false;  // stopped by a signal
     QList<ModuleReport> modules;
 
     // Reads a processed-results file ("testmodules" / "module" / "testcase").
@@ -28,28 +55,42 @@ struct RunReport
     bool Read(const QString &path, QString *error);
 
     // The summary table: one row per module (passed, failed, unsupported,
-    // unexecuted), then the totals.
+    // unexecuted), then the totals; below it, why modules did not finish.
     QString Summary(bool withHandset) const;
 
-    // JUnit XML: one testsuite per module, one testcase per test case; "fail"
-    // becomes a failure, "unsupported" and "unexecuted" are skipped with the
-    // word as message.
-    bool WriteJUnit(const QString &path, QString *error) const;
-
-    // A JSON summary of the same data.
-    bool WriteJson(const QString &path, QString *error) const;
+    // JUnit XML: one testsuite per module, one testcase per test case. "fail"
+    // is a failure; every test case of a module that did not run or finish
+    // is an error with the reason; other words are skipped.
+    QByteArray JUnit() const;
+    QByteArray Json() const;
 
     int Total(const QString &result) const;
+    int Errors() const;  // test cases of modules that did not finish
+    int NotFinished() const;
 
     // Drops the modules without any executed test case.
     void DropNotExecuted();
 };
 
+// The lines of a copied log that give a test case's verdict word: the first
+// line naming the test case and the line with the word (the same line, or one
+// of the few after it), joined by " / ". Empty when the log does not show it.
+QString VerdictLines(const QString &logPath, const QString &testCase, const QString &verdict);
+
 // The --junit FILE and --json FILE options of the commands that report.
 const QCommandLineOption &JUnitOption();
 const QCommandLineOption &JsonOption();
 
-// Prints the summary and writes the exports the parser's options ask for.
-// ExitUsage (with the reason on standard error) when an export cannot be
-// written, else ExitSuccess.
+// True when path ("-" is standard output) can be written: an existing file
+// that is writable, or a new file in an existing writable folder. Else false
+// with the reason.
+bool CheckOutputPath(const QString &path, QString *error);
+// Checks the export paths the parser names; false after one line on
+// standard error.
+bool CheckReportOutputs(const QCommandLineParser &parser, const QString &command);
+
+// Prints the summary (on standard error when an export goes to standard
+// output) and writes the exports the parser's options ask for. ExitUsage
+// (with the reason on standard error) when an export cannot be written, else
+// ExitSuccess.
 int PublishReport(const RunReport &report, const QCommandLineParser &parser, bool withHandset);

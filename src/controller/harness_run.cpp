@@ -155,18 +155,16 @@ bool Harness::RunModules(ModuleSource &source)
     };
 
     ModuleRecord record;
-    Clock::Timer timer;
     // Tells the source and the observer how the module in hand ended.
     const auto finish = [&](const QSharedPointer<_TestModule> &module, ModuleSource::Outcome outcome) {
         record.outcome = outcome;
-        record.durationMs = timer.Elapsed();
+        record.durationMs = record.start.msecsTo(QDateTime::currentDateTimeUtc());
         if (m_observer)
             m_observer->ModuleEnded(record);
         source.Finished(module, outcome);
     };
 
     while (const QSharedPointer<_TestModule> module = source.Next()) {
-        timer.Restart();
         record = ModuleRecord();
         record.name = module->moduleName;
         record.source = module->Source();
