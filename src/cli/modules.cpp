@@ -36,7 +36,7 @@ int ModulesCommand(const QStringList &arguments)
     setup.Apply(parser, harness, log);
     QList<QSharedPointer<_TestModule>> modules;
     {
-        const EchoToStandardError echo;
+        const EchoToStandardError quiet(true);
         if (!selection.Select(harness, parser, arguments.at(0), modules))
             return ExitUsage;
     }

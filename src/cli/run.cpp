@@ -174,13 +174,13 @@ QStringList DamagedCopies(const QString &resultsPath)
     return copies;
 }
 
-// The modules a processed-results file shows with any test case not passed
-// (failed or never executed), by lower-cased name.
-QSet<QString> NotPassedModules(const RunReport &history)
+// The modules a processed-results file shows with every test case passed,
+// by lower-cased name.
+QSet<QString> PassedModules(const RunReport &history)
 {
     QSet<QString> names;
     for (const ModuleReport &module : history.modules) {
-        if (module.Count(QStringLiteral("pass")) != module.testCases.size() || module.testCases.isEmpty())
+        if (!module.testCases.isEmpty() && module.Count(QStringLiteral("pass")) == module.testCases.size())
             names.insert(module.name.toLower());
     }
     return names;
@@ -252,7 +252,7 @@ int RunCommand(const QStringList &arguments)
     const QCommandLineOption noDelete(QStringLiteral("no-delete"), QStringLiteral("Leave the modules installed on the handset."));
     const QCommandLineOption copyDelay(QStringLiteral("copy-delay"), QStringLiteral("Pause before copying each log."), QStringLiteral("MS"));
     const QCommandLineOption logDir(QStringLiteral("log-dir"), QStringLiteral("Folder for the copied logs (default: the handset's log folder; with several handsets one sub-folder each)."), QStringLiteral("DIR"));
-    const QCommandLineOption retry(QStringLiteral("retry"), QStringLiteral("Run only the modules that the handsets' processed results show with a test case not passed (with several handsets: not passed on any of them)."));
+    const QCommandLineOption retry(QStringLiteral("retry"), QStringLiteral("Run only the selected modules that no handset's processed results show with every test case passed."));
     const QCommandLineOption allTargets(QStringLiteral("all-targets"), QStringLiteral("Share the modules among every handset 'harness targets' lists."));
     const QCommandLineOption wait(QStringLiteral("wait"), QStringLiteral("Wait for a handset another run is using instead of failing."));
     parser.addOptions({target, testData, dpk, testCases, runOption, noDelete, copyDelay, logDir,
@@ -324,8 +324,11 @@ int RunCommand(const QStringList &arguments)
     }
 
     QList<QSharedPointer<_TestModule>> modules;
-    if (!selection.Select(*harnesses.front(), parser, command, modules))
-        return ExitUsage;
+    {
+        const EchoToStandardError quiet(true);
+        if (!selection.Select(*harnesses.front(), parser, command, modules))
+            return ExitUsage;
+    }
     if (modules.isEmpty())
         return Refuse(command, QStringLiteral("no test module selected (see 'harness modules')"));
 
@@ -333,8 +336,7 @@ int RunCommand(const QStringList &arguments)
     // said out loud.
     QMap<QString, QString> resultsPaths;
     QStringList damagedBefore;
-    QSet<QString> notPassed;
-    bool anyHistory = false;
+    QSet<QString> passed;
     for (const QString &name : std::as_const(names)) {
         const QString path = TestDirectories::GetProcessResultsPath(name);
         resultsPaths.insert(name, path);
@@ -350,13 +352,13 @@ int RunCommand(const QStringList &arguments)
                                          "this run starts a new file and keeps the damaged one aside\n").arg(name, error));
             continue;
         }
-        const QSet<QString> here = NotPassedModules(history);
-        notPassed = anyHistory ? notPassed.intersect(here) : here;
-        anyHistory = true;
+        passed.unite(PassedModules(history));
     }
-    if (parser.isSet(retry) && anyHistory) {
+    if (parser.isSet(retry)) {
+        // What no handset's history shows passed runs again, modules that
+        // never ran included.
         modules.erase(std::remove_if(modules.begin(), modules.end(),
-                                     [&](const QSharedPointer<_TestModule> &m) { return !notPassed.contains(m->moduleName.toLower()); }),
+                                     [&](const QSharedPointer<_TestModule> &m) { return passed.contains(m->moduleName.toLower()); }),
                       modules.end());
         if (modules.isEmpty()) {
             Out(QStringLiteral("Every selected module has passed on %1: nothing to retry.\n")
@@ -389,10 +391,10 @@ int RunCommand(const QStringList &arguments)
     report.start = QDateTime::currentDateTimeUtc();
     QElapsedTimer elapsed;
     elapsed.start();
-    {
-        const StopOnSignal stop(run);
-        run.Run(modules);
-    }
+    // Held until the command returns: a signal while the reports are
+    // written only asks for what is being done anyway.
+    const StopOnSignal stop(run);
+    run.Run(modules);
     report.durationMs = elapsed.elapsed();
     report.interrupted = run.Stopped();
     for (const ShardedRun::ModuleResult &result : run.Modules()) {

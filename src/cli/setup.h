@@ -51,12 +51,21 @@ struct SelectionOptions
 
 // While alive, the library's console echo goes to standard error, so that
 // what a command prints on standard output stays machine-readable and the
-// library's errors land where errors belong.
+// library's errors land where errors belong; or nowhere (the log file still
+// has every message), while a command checks its set-up and reports a
+// failure in one line of its own.
 class EchoToStandardError
 {
 public:
-    EchoToStandardError() : m_saved(std::cout.rdbuf(std::cerr.rdbuf())) {}
-    ~EchoToStandardError() { std::cout.rdbuf(m_saved); }
+    explicit EchoToStandardError(bool silent = false)
+        : m_saved(std::cout.rdbuf(silent ? nullptr : std::cerr.rdbuf()))
+    {
+    }
+    ~EchoToStandardError()
+    {
+        std::cout.rdbuf(m_saved);
+        std::cout.clear();
+    }
     EchoToStandardError(const EchoToStandardError &) = delete;
     EchoToStandardError &operator=(const EchoToStandardError &) = delete;
 

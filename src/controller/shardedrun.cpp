@@ -296,7 +296,9 @@ bool ShardedRun::Run(const QList<QSharedPointer<_TestModule>> &selection)
         worker->Join();
 
     const QStringList notRun = NotRun();
-    if (!notRun.isEmpty()) {
+    if (!notRun.isEmpty() && m_stop) {
+        LogMessage(QStringLiteral("The run was stopped; modules not run: %1\n").arg(notRun.join(QStringLiteral(", "))));
+    } else if (!notRun.isEmpty()) {
         LogMessage(QStringLiteral("Every handset has dropped out; %1 modules never ran: %2\n")
                        .arg(notRun.size())
                        .arg(notRun.join(QStringLiteral(", "))));

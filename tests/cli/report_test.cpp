@@ -47,7 +47,7 @@ TEST_F(ReportTool, SummarisesExecutedModulesAndFailsWhenATestCaseFailed)
     EXPECT_TRUE(out.contains(QRegularExpression(QStringLiteral("audio\\s+1\\s+1\\s+1\\s+1\\n"))))
         << r.out.constData();
     EXPECT_FALSE(out.contains(QLatin1String("socket")));
-    EXPECT_TRUE(out.contains(QRegularExpression(QStringLiteral("Total \\(1 modules\\)\\s+1\\s+1\\s+1\\s+1"))));
+    EXPECT_TRUE(out.contains(QRegularExpression(QStringLiteral("Total \\(1 module\\)\\s+1\\s+1\\s+1\\s+1"))));
 
     const ToolResult all = RunTool({QStringLiteral("report"), QStringLiteral("--all"), results});
     EXPECT_TRUE(all.out.contains("socket"));
