@@ -74,6 +74,11 @@ void UTTestModule::SetupConfigData(IKestoDevice *device)
             return;
         copyPath = reserve.fileName();
     }
+    // The copy is only the way to the handset: it never stays behind.
+    const struct RemoveCopy {
+        QString path;
+        ~RemoveCopy() { QFile::remove(path); }
+    } removeCopy{copyPath};
     if (!QFile::copy(sourcePath + QStringLiteral("/utconfig.dat"), copyPath))
         return;
     QFile copy(copyPath);

@@ -275,7 +275,10 @@ TEST_F(EndToEnd, UtModuleReadsItsConfigurationAndWritesBothLogs)
     module.applets << AppletWithId(0x20002000);
     module.targets.insert(QStringLiteral("t"), Target(package));
     module.SetTestCases({QStringLiteral("t1"), QStringLiteral("t2")});
+    const auto scratch = [] { return QDir::temp().entryList({QStringLiteral("test_*.dat")}, QDir::Files); };
+    const QStringList before = scratch();
     RunModule(module);
+    EXPECT_EQ(scratch(), before);  // the configuration's way to the handset leaves nothing behind
 
     EXPECT_EQ(testutil::ReadFile(fixture.HostPath(QStringLiteral("phone"), QStringLiteral("fs:/mod/ututtimer/utconfig.dat"))),
               QByteArray("[Defaults]\nLevel=2\n[TestFramework]\nSkipIfNoGolden=1\nLogSkippedGoldens=0\nSkipKnown=1\nAllow=t1,t2\n"));
