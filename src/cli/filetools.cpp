@@ -104,7 +104,13 @@ int ResCommand(const QStringList &arguments)
             return ExitUsage;
         }
         QString error;
-        if (!CompileResourceSource(args.at(1), args.at(2), &error)) {
+        QStringList lost;
+        if (!CompileResourceSource(args.at(1), args.at(2), &error, &lost)) {
+            if (!lost.isEmpty()) {
+                for (const QString &character : std::as_const(lost))
+                    Err(QStringLiteral("%1: %2 cannot be held by its string's format\n").arg(command, character));
+                return ExitTestFailed;
+            }
             Err(QStringLiteral("%1: %2\n").arg(command, error));
             return ExitUsage;
         }
@@ -261,7 +267,8 @@ int EncodeCommand(const QStringList &arguments)
     for (KestoEncodingFormat f : formats)
         names << QStringLiteral("%1 %2").arg(int(f)).arg(QEncoding::Format2Name(f));
     parser.setApplicationDescription(
-        QStringLiteral("Encodes a text as a resource string block: the format's mark, then the text.\n"
+        QStringLiteral("Encodes a text as a resource string block: the format's mark, then the text. A character "
+                       "the format cannot hold is named on standard error, with exit status 1.\n"
                        "Formats (number or name): ")
         + names.join(QStringLiteral(", ")));
     parser.addPositionalArgument(QStringLiteral("FORMAT"), QStringLiteral("Encoding number or name."));
@@ -274,8 +281,14 @@ int EncodeCommand(const QStringList &arguments)
         Err(arguments.at(0) + QStringLiteral(": unknown format '%1'\n").arg(parser.positionalArguments().at(0)));
         return ExitUsage;
     }
+    const QString text = parser.positionalArguments().at(1);
+    const QList<LostCharacter> lost = LostCharacters(text, format);
+    for (const LostCharacter &character : lost)
+        Err(arguments.at(0) + QStringLiteral(": %1 cannot be held by %2\n").arg(character.Describe(), QEncoding::Format2Name(format)));
+    if (!lost.isEmpty())
+        return ExitTestFailed;
     KestoResources resources;
-    resources.AddString(KestoResources::kTypeStrings, 1, quint16(format), parser.positionalArguments().at(1));
+    resources.AddString(KestoResources::kTypeStrings, 1, quint16(format), text);
     Out(HexBytes(resources.Stream()->GetResource(KestoResources::kTypeStrings, 1)) + QLatin1Char('\n'));
     return ExitSuccess;
 }

@@ -201,3 +201,35 @@ void FreeEncoder(QEncoding *encoder)
 {
     delete encoder;
 }
+
+QString LostCharacter::Describe() const
+{
+    return QStringLiteral("character %1 U+%2 '%3'")
+        .arg(QString::number(position),
+             QString::number(uint(codePoint), 16).toUpper().rightJustified(4, QLatin1Char('0')),
+             QString::fromUcs4(&codePoint, 1));
+}
+
+QList<LostCharacter> LostCharacters(const QString &text, KestoEncodingFormat format)
+{
+    QList<LostCharacter> lost;
+    QEncoding *encoder = nullptr;
+    if (format == ENCODING_UNICODE || !CreateEncoder(format, &encoder))
+        return lost;
+    // ISO Latin-1 skips its own mark; the others decode what follows it.
+    const QByteArray mark = format == ENCODING_ISOLATIN1 ? QEncoding::GetBOM(format) : QByteArray();
+    qsizetype position = 0;
+    for (qsizetype i = 0; i < text.size(); ++position) {
+        const qsizetype length = text.at(i).isHighSurrogate() && i + 1 < text.size() && text.at(i + 1).isLowSurrogate() ? 2 : 1;
+        const QString character = text.mid(i, length);
+        QByteArray bytes;
+        encoder->FromUnicode(character, bytes);
+        QString back;
+        encoder->ToUnicode(mark + bytes, back);
+        if (back != character)
+            lost.append({position + 1, character.toUcs4().value(0)});
+        i += length;
+    }
+    FreeEncoder(encoder);
+    return lost;
+}

@@ -87,3 +87,19 @@ HARNESS_EXPORT bool CreateEncoder(KestoEncodingFormat format, QEncoding **encode
 
 // Destroys a converter from CreateEncoder; null is ignored.
 HARNESS_EXPORT void FreeEncoder(QEncoding *encoder);
+
+// One character of a text that an encoding cannot hold.
+struct HARNESS_EXPORT LostCharacter
+{
+    qsizetype position = 0;  // 1-based, counted in characters (code points)
+    char32_t codePoint = 0;
+
+    // "character 7 U+30C6 'テ'"
+    QString Describe() const;
+};
+
+// The characters of text that the converter for format does not give back:
+// encoding a character and decoding the result yields something else (ISO
+// Latin-1 keeping the low byte of U+30C6, a "?" for an unmapped character).
+// Empty for Unicode (format 0) and when every character survives.
+HARNESS_EXPORT QList<LostCharacter> LostCharacters(const QString &text, KestoEncodingFormat format);

@@ -1,5 +1,6 @@
 #include "resources/resourcesource.h"
 
+#include "common/xmlwriter.h"
 #include "encoding/qencoding.h"
 #include "resources/kestoresources.h"
 
@@ -7,6 +8,7 @@
 #include <QDomDocument>
 #include <QFile>
 #include <QFileInfo>
+#include <QSet>
 
 namespace {
 
@@ -54,7 +56,21 @@ bool ReadFormat(const QDomElement &element, quint16 &format, QString *error)
     return false;
 }
 
-bool CompileElement(KestoResources &resources, const QDomElement &element, const QDir &base, QString *error)
+// Each type and ID names one resource; a second one would silently replace
+// the first.
+bool Claim(QSet<quint32> &seen, quint16 type, quint16 id, const QDomElement &element, QString *error)
+{
+    if (!seen.contains(quint32(type) << 16 | id)) {
+        seen.insert(quint32(type) << 16 | id);
+        return true;
+    }
+    *error = QStringLiteral("line %1: duplicate resource ID %2 of type 0x%3")
+                 .arg(QString::number(element.lineNumber()), QString::number(id), QString::number(type, 16));
+    return false;
+}
+
+bool CompileElement(KestoResources &resources, const QDomElement &element, const QDir &base, QString *error,
+                    QStringList *lost, QSet<quint32> &seen)
 {
     const QString kind = element.tagName().toLower();
     quint16 id = 0;
@@ -62,13 +78,19 @@ bool CompileElement(KestoResources &resources, const QDomElement &element, const
     if (kind == QLatin1String("string")) {
         quint16 format = 0;
         if (!ReadNumber(element, "type", KestoResources::kTypeStrings, false, type, error)
-            || !ReadNumber(element, "id", 0, true, id, error) || !ReadFormat(element, format, error))
+            || !ReadNumber(element, "id", 0, true, id, error) || !ReadFormat(element, format, error)
+            || !Claim(seen, type, id, element, error))
             return false;
+        if (lost) {
+            for (const LostCharacter &character : LostCharacters(element.text(), KestoEncodingFormat(format)))
+                lost->append(QStringLiteral("line %1, string %2: %3")
+                                 .arg(QString::number(element.lineNumber()), QString::number(id), character.Describe()));
+        }
         return resources.AddString(type, id, format, element.text());
     }
     if (kind == QLatin1String("object")) {
         if (!ReadNumber(element, "type", KestoResources::kTypeObjects, false, type, error)
-            || !ReadNumber(element, "id", 0, true, id, error))
+            || !ReadNumber(element, "id", 0, true, id, error) || !Claim(seen, type, id, element, error))
             return false;
         if (!resources.AddMimeObject(type, id, element.attribute(QStringLiteral("mime")), element.text().toUtf8())) {
             *error = QStringLiteral("line %1: MIME type too long").arg(element.lineNumber());
@@ -77,7 +99,8 @@ bool CompileElement(KestoResources &resources, const QDomElement &element, const
         return true;
     }
     if (kind == QLatin1String("binary")) {
-        if (!ReadNumber(element, "type", 0, true, type, error) || !ReadNumber(element, "id", 0, true, id, error))
+        if (!ReadNumber(element, "type", 0, true, type, error) || !ReadNumber(element, "id", 0, true, id, error)
+            || !Claim(seen, type, id, element, error))
             return false;
         QByteArray data;
         if (element.hasAttribute(QStringLiteral("file"))) {
@@ -105,6 +128,11 @@ bool CompileElement(KestoResources &resources, const QDomElement &element, const
 
 bool CompileResourceSource(const QString &source, const QString &output, QString *error)
 {
+    return CompileResourceSource(source, output, error, nullptr);
+}
+
+bool CompileResourceSource(const QString &source, const QString &output, QString *error, QStringList *lost)
+{
     QFile file(source);
     if (!file.open(QIODevice::ReadOnly)) {
         *error = QStringLiteral("cannot read %1").arg(source);
@@ -122,9 +150,10 @@ bool CompileResourceSource(const QString &source, const QString &output, QString
     const QDomElement root = document.documentElement();
     if (root.tagName().toLower() == QLatin1String("resources")) {
         const QDir base = QFileInfo(source).absoluteDir();
+        QSet<quint32> seen;
         for (QDomElement element = root.firstChildElement(); !element.isNull();
              element = element.nextSiblingElement()) {
-            if (!CompileElement(resources, element, base, error)) {
+            if (!CompileElement(resources, element, base, error, lost, seen)) {
                 *error = source + QStringLiteral(": ") + *error;
                 return false;
             }
@@ -132,8 +161,14 @@ bool CompileResourceSource(const QString &source, const QString &output, QString
     } else {
         resources.AddBinary(kWholeDocumentType, 1, bytes);
     }
-    if (!resources.Write(output)) {
-        *error = QStringLiteral("cannot write %1 (%2)").arg(output, resources.LastError());
+    if (lost && !lost->isEmpty()) {
+        *error = QStringLiteral("%1: text the string formats cannot hold").arg(source);
+        return false;
+    }
+    QByteArray compiled;
+    QString reason;
+    if (!resources.SaveTo(compiled) || !XmlWriter::WriteFile(output, compiled, true, &reason)) {
+        *error = QStringLiteral("cannot write %1 (%2)").arg(output, reason.isEmpty() ? QStringLiteral("the resources could not be serialised") : reason);
         return false;
     }
     return true;

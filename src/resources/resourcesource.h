@@ -3,6 +3,7 @@
 #include "common/export.h"
 
 #include <QString>
+#include <QStringList>
 
 // Compiles a small XML resource source into a compiled resource file. This is
 // the format of the stand-in resource compilers that the demo environment
@@ -19,5 +20,11 @@
 // other XML document (a device pack, for example) is stored whole as one
 // binary resource of type 0x7000, ID 1. Returns false with a reason in error
 // when the source cannot be read, is not XML, holds a bad value or the
-// output cannot be written.
+// output cannot be written, and when two resources share a type and ID.
 HARNESS_EXPORT bool CompileResourceSource(const QString &source, const QString &output, QString *error);
+// The same, but with lost given, a string that its format cannot hold is
+// not stored with a character changed: every such character is added to
+// lost ("line 3, string 1: character 7 U+30C6 'テ'"), nothing is written and
+// the result is false.
+HARNESS_EXPORT bool CompileResourceSource(const QString &source, const QString &output, QString *error,
+                                          QStringList *lost);

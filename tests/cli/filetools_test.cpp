@@ -54,11 +54,24 @@ TEST_F(InspectTool, CompiledSourceListsDecodedStringsObjectsAndClassIds)
 TEST_F(InspectTool, BadSourcesAndForeignFilesAreUsageErrors)
 {
     WriteFile(Path(QStringLiteral("bad.xml")), "<resources><string id=\"70000\">x</string></resources>");
+    WriteFile(Path(QStringLiteral("src.xml")), "<resources><string id=\"1\">x</string></resources>");
     WriteFile(Path(QStringLiteral("junk.kar")), "not a resource file at all");
     const ToolResult bad = RunTool({QStringLiteral("res"), QStringLiteral("compile"), Path(QStringLiteral("bad.xml")),
                                     Path(QStringLiteral("o.kar"))});
     EXPECT_EQ(bad.status, 2);
     EXPECT_TRUE(bad.err.contains("bad id")) << bad.err.constData();
+    EXPECT_FALSE(QFile::exists(Path(QStringLiteral("o.kar"))));
+    // The second of two resources with one type and ID would silently replace the first.
+    WriteFile(Path(QStringLiteral("twice.xml")), "<resources><string id=\"3\">a</string><object id=\"4\">b</object>\n"
+                                                 "<string id=\"3\">c</string></resources>");
+    const ToolResult twice = RunTool({QStringLiteral("res"), QStringLiteral("compile"), Path(QStringLiteral("twice.xml")),
+                                      Path(QStringLiteral("o.kar"))});
+    EXPECT_EQ(twice.status, 2);
+    EXPECT_TRUE(twice.err.contains("line 2: duplicate resource ID 3 of type 0x1")) << twice.err.constData();
+    const ToolResult nowhere = RunTool({QStringLiteral("res"), QStringLiteral("compile"), Path(QStringLiteral("src.xml")),
+                                        Path(QStringLiteral("missing/o.kar"))});
+    EXPECT_EQ(nowhere.status, 2);
+    EXPECT_FALSE(nowhere.err.contains("()")) << nowhere.err.constData();
     EXPECT_FALSE(QFile::exists(Path(QStringLiteral("o.kar"))));
     EXPECT_EQ(RunTool({QStringLiteral("res"), QStringLiteral("list"), Path(QStringLiteral("junk.kar"))}).status, 2);
     EXPECT_EQ(RunTool({QStringLiteral("mif"), Path(QStringLiteral("missing.mif"))}).status, 2);
@@ -132,6 +145,36 @@ TEST_F(InspectTool, EncodeMatchesIconvAfterTheMarkAndDecodeReadsItBack)
     }
     EXPECT_EQ(RunTool({QStringLiteral("encode"), QStringLiteral("EBCDIC"), QStringLiteral("x")}).status, 2);
     EXPECT_EQ(RunTool({QStringLiteral("decode"), QStringLiteral("0g")}).status, 2);
+}
+
+TEST_F(InspectTool, TextAnEncodingCannotHoldIsNamedAndNothingIsStored)
+{
+    const struct {
+        const char *format;
+        QString text;
+        QByteArray lost;  // the lines on standard error, empty when every character is held
+    } rows[] = {
+        {"1", QStringLiteral("H\u00e9llo \u30c6"), "character 7 U+30C6 '\xe3\x83\x86'"},
+        {"ISOLATIN1", QStringLiteral("H\u00e9llo"), {}},
+        {"S-JIS", QStringLiteral("\u00e9\u30c6"), "character 1 U+00E9 '\xc3\xa9'"},
+        {"UTF-8", QStringLiteral("\u30c6\U0001F600"), {}},
+    };
+    for (const auto &row : rows) {
+        SCOPED_TRACE(row.format);
+        const ToolResult r = RunTool({QStringLiteral("encode"), QLatin1String(row.format), row.text});
+        EXPECT_EQ(r.status, row.lost.isEmpty() ? 0 : 1) << r.err.constData();
+        EXPECT_EQ(r.out.isEmpty(), !row.lost.isEmpty());
+        EXPECT_EQ(r.err.count('\n'), row.lost.isEmpty() ? 0 : 1);
+        EXPECT_TRUE(r.err.contains(row.lost)) << r.err.constData();
+    }
+
+    WriteFile(Path(QStringLiteral("lossy.xml")), "<resources>\n<string id=\"1\" format=\"1\">\xe3\x83\x86\xe3\x82\xb9\xe3\x83\x88</string>\n</resources>");
+    const ToolResult compiled = RunTool({QStringLiteral("res"), QStringLiteral("compile"), Path(QStringLiteral("lossy.xml")),
+                                         Path(QStringLiteral("out.kar"))});
+    EXPECT_EQ(compiled.status, 1);
+    EXPECT_EQ(compiled.err.count('\n'), 3) << compiled.err.constData();
+    EXPECT_TRUE(compiled.err.contains("line 2, string 1: character 3 U+30C8")) << compiled.err.constData();
+    EXPECT_FALSE(QFile::exists(Path(QStringLiteral("out.kar"))));
 }
 
 } // namespace
