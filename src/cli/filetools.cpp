@@ -124,7 +124,14 @@ int ResCommand(const QStringList &arguments)
     KestoResources resources;
     if (!LoadResources(resources, args.at(1), command))
         return ExitUsage;
-    Out(action == QLatin1String("dump") ? resources.Dump() : ListResources(resources));
+    if (action == QLatin1String("list")) {
+        Out(ListResources(resources));
+        return ExitSuccess;
+    }
+    // The container pads its hexadecimal values for columns; on the console
+    // "17 (0x11)" reads better than "17(0x      11)".
+    static const QRegularExpression padded(QStringLiteral("\\(0x +([0-9a-f]+)\\)"));
+    Out(resources.Dump().replace(padded, QStringLiteral(" (0x\\1)")));
     return ExitSuccess;
 }
 

@@ -49,6 +49,7 @@ TEST_F(InspectTool, CompiledSourceListsDecodedStringsObjectsAndClassIds)
     const ToolResult dump = RunTool({QStringLiteral("res"), QStringLiteral("dump"), Path(QStringLiteral("out.kar"))});
     EXPECT_EQ(dump.status, 0);
     EXPECT_TRUE(dump.out.startsWith("=== Header ===")) << dump.out.left(200).constData();
+    EXPECT_TRUE(dump.out.contains("Number of Resources:  5 (0x5)\n")) << dump.out.left(400).constData();
 }
 
 TEST_F(InspectTool, BadSourcesAndForeignFilesAreUsageErrors)
