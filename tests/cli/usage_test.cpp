@@ -38,6 +38,8 @@ TEST(ToolUsage, EveryCommandHasHelpAndTheToolAVersion)
         EXPECT_EQ(r.status, 0) << name.toStdString();
         EXPECT_TRUE(r.out.startsWith("Usage: harness " + name.toUtf8())) << r.out.constData();
     }
+    const ToolResult help = RunTool({QStringLiteral("help"), QStringLiteral("run")});
+    EXPECT_TRUE(help.out.startsWith("Usage: harness run")) << help.out.left(200).constData();
     const ToolResult version = RunTool({QStringLiteral("--version")});
     EXPECT_EQ(version.status, 0);
     EXPECT_TRUE(version.out.startsWith("harness "));

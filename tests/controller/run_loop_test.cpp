@@ -208,8 +208,29 @@ TEST_F(RunLoopTest, UnknownFrameworkAndFailedStartSkipTheModuleAndTheRunGoesOn)
     Queue(QStringLiteral("Fine"), QStringLiteral("ctf"));
     QSharedPointer<RecordingModule> silent = Queue(QStringLiteral("Silent"), QStringLiteral("ctf"));
     silent->copies = false;
+    // What the run tells its observer about each module it took.
+    struct Records : RunObserver {
+        QMap<QString, ModuleRecord> byName;
+        void ModuleEnded(const ModuleRecord &record) override { byName.insert(record.name, record); }
+    } records;
+    m_harness.SetRunObserver(&records);
 
     EXPECT_TRUE(m_harness.Run());
+    m_harness.SetRunObserver(nullptr);
+    const QMap<QString, QString> reasons{{QStringLiteral("Menu"), QStringLiteral("no framework for test type uitf")},
+                                         {QStringLiteral("Broken"), QStringLiteral("install or start failed")},
+                                         {QStringLiteral("Fine"), QString()},
+                                         {QStringLiteral("Silent"), QStringLiteral("no log was found")}};
+    ASSERT_EQ(records.byName.keys(), reasons.keys());
+    for (auto it = reasons.cbegin(); it != reasons.cend(); ++it) {
+        const ModuleRecord &record = records.byName.value(it.key());
+        EXPECT_EQ(record.Reason(), it.value()) << it.key().toStdString();
+        EXPECT_EQ(record.handset, QStringLiteral("phone"));
+        EXPECT_EQ(record.start.timeSpec(), Qt::UTC);
+    }
+    const ModuleRecord &fine = records.byName.value(QStringLiteral("Fine"));
+    ASSERT_EQ(fine.results.caseResults.size(), 1);
+    EXPECT_EQ(fine.results.caseResults.at(0).testCase, QStringLiteral("Fine_1"));
     EXPECT_EQ(m_events, (QStringList{"load ctf", "run Broken", "run Fine", "copy Fine", "remove Fine",
                                      "postprocess Fine", "run Silent", "copy Silent", "unload ctf"}));
     const QString log = m_log.Text();
