@@ -16,6 +16,15 @@
 #include <mutex>
 #include <thread>
 
+namespace {
+
+QString ModuleCount(qsizetype count)
+{
+    return count == 1 ? QStringLiteral("1 module") : QStringLiteral("%1 modules").arg(count);
+}
+
+} // namespace
+
 // The modules not yet taken, and what became of those that were. Shared by
 // the workers; every member is guarded by the mutex.
 class ShardedRun::Queue
@@ -202,12 +211,12 @@ private:
         m_result.lost = true;
         m_result.lostAt = QDateTime::currentDateTime();
         m_result.lostAfterMs = timer.Elapsed();
-        m_run.LogMessage(QStringLiteral("Handset %1 dropped out at %2 (%3 ms into the run); %4 modules "
-                                        "left for the other handsets.\n")
+        m_run.LogMessage(QStringLiteral("Handset %1 dropped out at %2 (%3 ms into the run); %4 left for the "
+                                        "other handsets.\n")
                              .arg(m_result.handset,
                                   m_result.lostAt.toString(QStringLiteral("yyyy-MM-dd hh:mm:ss.zzz")))
                              .arg(m_result.lostAfterMs)
-                             .arg(m_queue.Pending()));
+                             .arg(ModuleCount(m_queue.Pending())));
     }
 
     ShardedRun &m_run;
@@ -276,7 +285,9 @@ bool ShardedRun::Run(const QList<QSharedPointer<_TestModule>> &selection)
         LogMessage(QStringLiteral("No handsets to run on.\n"));
         return false;
     }
-    LogMessage(QStringLiteral("Running %1 modules on %2 handsets\n").arg(m_modules.size()).arg(m_harnesses.size()));
+    LogMessage(QStringLiteral("Running %1 on %2\n")
+                   .arg(ModuleCount(m_modules.size()),
+                        m_harnesses.size() == 1 ? QStringLiteral("1 handset") : QStringLiteral("%1 handsets").arg(m_harnesses.size())));
 
     for (Harness *harness : std::as_const(m_harnesses)) {
         HandsetResult handset;
@@ -299,8 +310,8 @@ bool ShardedRun::Run(const QList<QSharedPointer<_TestModule>> &selection)
     if (!notRun.isEmpty() && m_stop) {
         LogMessage(QStringLiteral("The run was stopped; modules not run: %1\n").arg(notRun.join(QStringLiteral(", "))));
     } else if (!notRun.isEmpty()) {
-        LogMessage(QStringLiteral("Every handset has dropped out; %1 modules never ran: %2\n")
-                       .arg(notRun.size())
+        LogMessage(QStringLiteral("Every handset has dropped out; %1 never ran: %2\n")
+                       .arg(ModuleCount(notRun.size()))
                        .arg(notRun.join(QStringLiteral(", "))));
     }
     return notRun.isEmpty();
