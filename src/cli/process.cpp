@@ -58,12 +58,8 @@ int ProcessCommand(const QStringList &arguments)
     Log log;
     setup.Apply(parser, harness, log);
     harness.SetLogOutputPath(logs);
-    // The folder name the processing itself gives the file when none is set.
-    QString resultsPath = logs + QStringLiteral("/ProcessedResults/ProcessedResults.xml");
-    if (parser.isSet(results)) {
-        resultsPath = QFileInfo(parser.value(results)).absoluteFilePath();
-        harness.SetProcessedResultsPath(resultsPath);
-    }
+    if (parser.isSet(results))
+        harness.SetProcessedResultsPath(QFileInfo(parser.value(results)).absoluteFilePath());
     {
         const EchoToStandardError echo;
         if (!harness.Process(0)) {
@@ -71,6 +67,7 @@ int ProcessCommand(const QStringList &arguments)
             return ExitUsage;
         }
     }
+    const QString resultsPath = harness.GetProcessedResultsPath();
     RunReport report;
     if (!report.Read(resultsPath, &error)) {
         Err(command + QStringLiteral(": no log below %1 was recognised (%2)\n").arg(logs, error));

@@ -115,6 +115,11 @@ void Harness::SetProcessedResultsPath(const QString &path)
         m_environment.insert(EnvironmentKey::ProcessedResultsPath, path);
 }
 
+QString Harness::GetProcessedResultsPath() const
+{
+    return m_environment.value(EnvironmentKey::ProcessedResultsPath);
+}
+
 void Harness::SetTestCases(const QStringList &testCases)
 {
     m_testCases = testCases;

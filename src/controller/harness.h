@@ -76,6 +76,10 @@ public:
     // The processed-results file to record verdicts in; overrides the
     // per-handset default (and, for Process, the file below the log folder).
     void SetProcessedResultsPath(const QString &path);
+    // The processed-results file in use: the one set, else the handset's
+    // once connected, else the one Process chose below the log folder;
+    // empty before any of these.
+    QString GetProcessedResultsPath() const;
     void SetTestCases(const QStringList &testCases);
 
     // Takes a device pack: compiles it (once per source file and change) with
