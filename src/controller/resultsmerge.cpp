@@ -1,7 +1,8 @@
 #include "controller/resultsmerge.h"
 
+#include "catalogue/testcase.h"
+#include "catalogue/testmodule.h"
 #include "common/xmlnode.h"
-#include "controller/moduletimings.h"
 #include "controller/processedresults.h"
 
 #include <QDir>
@@ -159,6 +160,7 @@ bool ResultsMerge::Add(const QString &path, const QString &handset, const QStrin
     }
     for (const Row &row : std::as_const(rows))
         Merge(row);
+    m_timings.Merge(timings);
     if (m_kitHash.isEmpty() && !kitHash.isEmpty()) {
         m_kitHash = kitHash;
         m_kitHashFile = path;
@@ -170,6 +172,20 @@ bool ResultsMerge::Add(const QString &path, const QString &handset, const QStrin
 void ResultsMerge::Expect(const QList<Expected> &selection)
 {
     m_expected = selection;
+}
+
+QList<ResultsMerge::Expected> ResultsMerge::ExpectedOf(const QList<QSharedPointer<_TestModule>> &selection)
+{
+    QList<Expected> expected;
+    for (const QSharedPointer<_TestModule> &module : selection) {
+        if (!module)
+            continue;
+        QStringList testCases;
+        for (const TestCase &testCase : std::as_const(module->testCases))
+            testCases.append(testCase.name);
+        expected.append({module->moduleName, module->Source(), module->family, module->subFamily, testCases});
+    }
+    return expected;
 }
 
 QList<ResultsMerge::Row> ResultsMerge::Rows() const

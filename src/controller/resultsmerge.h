@@ -1,12 +1,16 @@
 #pragma once
 
 #include "common/export.h"
+#include "controller/moduletimings.h"
 
 #include <QHash>
 #include <QList>
 #include <QPair>
+#include <QSharedPointer>
 #include <QString>
 #include <QStringList>
+
+class _TestModule;
 
 // Merges the processed-results files of several handsets and hosts, each of
 // which ran its share of one selection, into one row per module. A module
@@ -59,11 +63,17 @@ public:
 
     // The selection's modules, in run order; rows follow this order.
     void Expect(const QList<Expected> &selection);
+    // The same from the selected catalogue modules.
+    static QList<Expected> ExpectedOf(const QList<QSharedPointer<_TestModule>> &selection);
 
     // Every module that ran somewhere or was expected: first the expected
     // ones in their order, then the others in the order they were first seen.
     QList<Row> Rows() const;
     QStringList NotRun() const;
+
+    // The runs of every "Timings.json" found beside the files added, for
+    // the next plan.
+    const ModuleTimings &Timings() const { return m_timings; }
 
     QString ErrorString() const { return m_error; }
 
@@ -77,6 +87,7 @@ private:
     QHash<QString, qsizetype> m_index;   // by source and lower-cased name
     QHash<QString, QList<qsizetype>> m_byName;  // by lower-cased name
     QList<Expected> m_expected;
+    ModuleTimings m_timings;
     QString m_kitHash;
     QString m_kitHashFile;
     QString m_error;

@@ -63,6 +63,7 @@ TEST(ResultsMergeTest, AModuleRunTwiceKeepsTheVerdictThatWins)
     for (qsizetype i = 0; i < kept.size(); ++i)
         EXPECT_EQ(m.testCases.at(i).second, kept.at(i)) << stored.at(i).toStdString() << " then " << reported.at(i).toStdString();
     EXPECT_EQ(merge.NotRun(), QStringList{QStringLiteral("Other")});
+    EXPECT_EQ(merge.Timings().ExpectedMs(QStringLiteral("M"), QStringLiteral("KVK")), 5);
 }
 
 TEST(ResultsMergeTest, RefusesFilesItCannotMergeAndKeepsWhatItHas)
@@ -109,14 +110,9 @@ TEST(ResultsMergeTest, MergedShardsEqualOneRunOfTheSelection)
     QList<QSharedPointer<_TestModule>> selection;
     selector.GetTestModules(selection, {QStringLiteral("*")}, QString(), QString());
     QList<ShardPlan::Module> planned;
-    QList<ResultsMerge::Expected> expected;
-    for (const QSharedPointer<_TestModule> &module : std::as_const(selection)) {
+    for (const QSharedPointer<_TestModule> &module : std::as_const(selection))
         planned.append({module->moduleName, module->Source(), int(module->testCases.size()), -1});
-        QStringList testCases;
-        for (const TestCase &testCase : std::as_const(module->testCases))
-            testCases.append(testCase.name);
-        expected.append({module->moduleName, module->Source(), module->family, module->subFamily, testCases});
-    }
+    const QList<ResultsMerge::Expected> expected = ResultsMerge::ExpectedOf(selection);
     const ShardPlan plan = ShardPlan::Make(planned, 3);
 
     // Handset i runs shard i (0, 1); the last handset runs everything.
