@@ -46,6 +46,17 @@ LIMITS = [
     ("Resource load of 65,535 resources", "LoadResourceFile/65535", 1.0),
 ]
 
+# (what, benchmark name pattern, counter, largest value allowed or None): a
+# counter of each matching benchmark, shown as the figure.
+COUNTERS = [
+    ("Shard balance, longest / mean, history known", r"ShardPlan/shards:\d+/known_percent:100",
+     "longest_over_mean", 1.10),
+    ("Shard balance, longest / mean, 80 % known", r"ShardPlan/shards:\d+/known_percent:80",
+     "longest_over_mean", None),
+    ("Shard balance, longest / mean, test cases only", r"ShardPlan/shards:\d+/known_percent:0",
+     "longest_over_mean", None),
+]
+
 UNITS = {"ns": 1e-9, "us": 1e-6, "ms": 1e-3, "s": 1.0}
 
 
@@ -130,6 +141,15 @@ def main(paths):
             lines.append(f"{what:{width}} {show(t)} {'':>12} {'':>7}  <= {limit:g} s {'ok' if ok else 'MISSED'}")
             if not ok:
                 missed.append(what)
+    for what, pattern, counter, limit in COUNTERS:
+        for name in sorted(results, key=lambda n: (len(n), n)):
+            if not re.fullmatch(pattern, name) or counter not in results[name]:
+                continue
+            value = results[name][counter]
+            label = f"{what} [{name.split('/')[1]}]"
+            lines.append(f"{label:{width}} {value:12.3f} {'':>12} {'':>7}  {verdict(value, limit)}")
+            if limit is not None and value > limit:
+                missed.append(label)
     for b in [b for _, b in sorted(results.items()) if "peak_MiB" in b]:
         label = f"Peak memory, {clean(b['name'])} (baseline: idle child)"
         peak, base = b["peak_MiB"], b.get("baseline_MiB", 0.0)
