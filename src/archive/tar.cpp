@@ -410,11 +410,12 @@ bool Tar::Read(QDataStream &stream)
     qint64 pos = 0;
     char header[kBlockSize];
     for (;;) {
-        if (!device->seek(pos))
+        // A member's padding is part of the archive too.
+        if (pos > fileSize && !ended)
+            return unexpectedEnd();
+        if (pos >= fileSize || !device->seek(pos))
             break;
         const qint64 got = device->read(header, kBlockSize);
-        if (got <= 0)
-            break;
         if (got < kBlockSize) {
             if (ended)
                 break;

@@ -366,6 +366,8 @@ INSTANTIATE_TEST_SUITE_P(
                 {"\\351t\\303\\251"}, "s", ""},
         Crafted{"TruncatedMember", [] { return Member("a", "x") + Header("b", Octal(3000)) + Bytes(1000, 'b'); },
                 {"a"}, "x", "unexpected end of archive at offset 2536"},
+        Crafted{"PaddingCutShort", [] { return Member("a", "x").left(600); }, {"a"}, "x",
+                "unexpected end of archive at offset 600"},
         Crafted{"TruncatedHeader", [] { return Member("a", "x") + QByteArray(100, 'h'); }, {"a"}, "x",
                 "unexpected end of archive at offset 1124"},
         Crafted{"RandomBytes",
