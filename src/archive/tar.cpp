@@ -584,6 +584,10 @@ bool Tar::Read(QDataStream &stream)
                 name = realName;
             if (realSize <= kMaxMemberSize && !SparseMapFits(runs, realSize, stored))
                 return badMap();
+            // A member that is all hole still reads as zeros, not as what
+            // follows it in the archive.
+            if (runs.isEmpty() && realSize <= kMaxMemberSize)
+                runs.append(TarSparseRun{quint32(realSize), 0});
         }
         if (realSize > kMaxMemberSize)
             return Damaged(QStringLiteral("member %1 at offset %2 is larger than 4 GiB - 1 bytes: not supported")

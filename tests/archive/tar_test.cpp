@@ -14,6 +14,8 @@
 #include <cstring>
 #include <functional>
 
+#include <unistd.h>
+
 class TarTestAccess
 {
 public:
@@ -403,6 +405,18 @@ INSTANTIATE_TEST_SUITE_P(
                            + Header("short", Octal(999)) + Padded("abc") + Member("plain", "q") + kEnd;
                 },
                 {QString(300, QLatin1Char('p')) + QStringLiteral("/name.mif"), "global/x"}, "abc", ""},
+        Crafted{"SparseMemberThatIsAllHole",
+                [] {
+                    return Member("x", PaxRecord("GNU.sparse.size", "1000") + PaxRecord("GNU.sparse.map", ""), 'x')
+                           + Header("hole", Octal(0)) + Member("after", "zzz") + kEnd;
+                },
+                {"hole", "after"}, QByteArray(1000, '\0'), ""},
+        Crafted{"SparseRunPastTheMember",
+                [] {
+                    return Member("x", PaxRecord("GNU.sparse.size", "10") + PaxRecord("GNU.sparse.map", "8,4"), 'x')
+                           + Member("bad", "abcd") + kEnd;
+                },
+                {}, "", "invalid sparse map at offset 1024"},
         Crafted{"PaxRecordWithoutNewline",
                 [] { return Member("x", PaxRecord("path", "a").chopped(1) + " ", 'x') + Member("a", "x") + kEnd; },
                 {}, "", "malformed extended header at offset 0"},
