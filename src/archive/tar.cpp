@@ -2,6 +2,7 @@
 
 #include <QDataStream>
 #include <QDateTime>
+#include <QHash>
 #include <QSaveFile>
 
 #include <algorithm>
@@ -406,6 +407,8 @@ bool Tar::Read(QDataStream &stream)
     PaxRecords global;
     bool sawHeader = false;
     bool ended = false;
+    // The latest member of each name, for the hard links after it.
+    QHash<QByteArray, int> latest;
 
     qint64 pos = 0;
     char header[kBlockSize];
@@ -608,18 +611,15 @@ bool Tar::Read(QDataStream &stream)
             // The data of the latest member of that name before the link.
             entry.size = 0;
             entry.offset = 0;
-            const QByteArray key = LinkKey(link);
-            for (auto it = m_entries.crbegin(); it != m_entries.crend(); ++it) {
-                if (LinkKey(it->rawName) == key) {
-                    if (it->IsFile()) {
-                        entry.size = it->size;
-                        entry.offset = it->offset;
-                        entry.sparse = it->sparse;
-                    }
-                    break;
-                }
+            const auto target = latest.constFind(LinkKey(link));
+            if (target != latest.constEnd() && m_entries.at(target.value()).IsFile()) {
+                const TarFileEntry &linked = m_entries.at(target.value());
+                entry.size = linked.size;
+                entry.offset = linked.offset;
+                entry.sparse = linked.sparse;
             }
         }
+        latest.insert(LinkKey(name), int(m_entries.size()));
         m_entries.append(entry);
         pos = dataOffset + RoundUpToBlock(stored);
     }

@@ -467,8 +467,9 @@ TEST(TarNumbers, ReadLikeGnuTar)
     for (const auto &row : rows) {
         quint64 value = 99;
         EXPECT_EQ(TarTestAccess::ReadNumber(row.field, value), row.ok) << row.field.toHex().constData();
-        if (row.ok)
+        if (row.ok) {
             EXPECT_EQ(value, row.value) << row.field.toHex().constData();
+        }
     }
 }
 
