@@ -19,11 +19,6 @@ struct HARNESS_EXPORT TarSparseRun
 {
     quint32 position = 0;
     quint32 length = 0;
-
-    bool operator==(const TarSparseRun &other) const
-    {
-        return position == other.position && length == other.length;
-    }
 };
 
 // One member of a tar archive.
@@ -48,6 +43,7 @@ struct HARNESS_EXPORT TarFileEntry
     char typeflag = 0;
     // The target of a symbolic or hard link.
     QString linkName;
+    // The name's bytes as stored.
     QByteArray rawName;
     // The stored runs of a sparse member, in order; their bytes follow one
     // another from offset. Empty for any other member.
@@ -70,8 +66,8 @@ struct HARNESS_EXPORT TarFileEntry
 // checksums are verified, GNU long names and pax extended headers (path,
 // linkpath, size, global headers) apply to the member that follows, GNU and
 // pax sparse members read as their full contents, a hard link reads as the
-// member it links to, and vendor records (pax 'x'/'g', Solaris 'A'/'X',
-// volume labels) are never listed as members. The zero blocks that end the
+// member it links to, and records that are no members (pax 'x'/'g',
+// Solaris 'A'/'X', volume labels) are never listed. The zero blocks that end the
 // archive are listed too (entries with an empty name and size 0); nothing
 // after them is. Reading stops at the first block that is neither a valid
 // header nor a zero block, or at a member cut short by the end of the file:
