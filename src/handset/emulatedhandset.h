@@ -79,7 +79,7 @@ public:
     // next operation on (a fault to rehearse a handset lost at any step).
     bool IsReachable();
     // Where refusals that a result number cannot explain are reported (a
-    // damaged package); none when null.
+    // damaged package); none when null. The log must outlive the handset.
     void SetLogger(Log *log) { m_log = log; }
     // Real time a behaviour script may run before it is killed.
     void SetBehaviourTimeout(int milliseconds) { m_behaviourTimeoutMs = milliseconds; }
