@@ -7,42 +7,72 @@
 #include <QIODevice>
 #include <QList>
 #include <QString>
+#include <QVector>
 
 #include <memory>
 
 class QDataStream;
 
+// One stored run of a sparse member: where it lies in the member's contents
+// and how many bytes it holds. The member's other bytes are holes (zeros).
+struct HARNESS_EXPORT TarSparseRun
+{
+    quint32 position = 0;
+    quint32 length = 0;
+};
+
 // One member of a tar archive.
 struct HARNESS_EXPORT TarFileEntry
 {
-    // Member name. Names longer than the 100-byte header field are taken in
-    // full from a GNU long-name record, a pax "path" record or the ustar
-    // prefix field when the archive holds one.
+    // Member name, taken in full from a GNU long-name record, a pax "path"
+    // (or sparse "GNU.sparse.name") record or the ustar prefix field when the
+    // archive holds one. A name that is not UTF-8 shows its bytes from 0x80
+    // up as octal escapes ("\351"); rawName keeps the bytes as stored.
     QString name;
-    // Member size in bytes (saturated at 0xFFFFFFFF for larger members).
+    // Member size in bytes: for a sparse member its full size, holes
+    // included; for a hard link the size of the member it links to.
     quint32 size = 0;
-    // Position in the archive of the member's first data byte.
+    // Position in the archive of the member's first data byte (for a hard
+    // link, of the data of the member it links to; 0 when that member is not
+    // in the archive before it).
     qint64 offset = 0;
     // The header's type flag: '0' or '\0' for a regular file, '5' for a
-    // directory, '2' for a symbolic link, ... ('\0' for a default entry and for
-    // the zero blocks that end an archive).
+    // directory, '2' for a symbolic link, '1' for a hard link, 'S' for a GNU
+    // sparse file... ('\0' for a default entry and for the zero blocks that
+    // end an archive).
     char typeflag = 0;
+    // The target of a symbolic or hard link.
+    QString linkName;
+    // The name's bytes as stored.
+    QByteArray rawName;
+    // The stored runs of a sparse member, in order; their bytes follow one
+    // another from offset. Empty for any other member.
+    QVector<TarSparseRun> sparse;
 
-    // True for a regular file member with a name (type flag '0', '\0' or '7').
+    // True for a member with contents: a regular file with a name (type flag
+    // '0', '\0', '7' or 'S'), or a hard link to one found earlier.
     bool IsFile() const;
-    // True for a directory member (type flag '5', or a name ending in "/").
+    // True for a directory member (type flag '5' or 'D', or a name ending in "/").
     bool IsDirectory() const;
+    bool IsSymLink() const;
+    bool IsHardLink() const;
 };
 
 // A tar archive on the host: lists the members of an existing archive and
 // returns their bytes, and writes new archives (POSIX ustar) from members
 // given in memory.
 //
-// Reading: Open lists every 512-byte header block of the archive as an entry,
-// including the zero blocks that end it (entries with an empty name and size
-// 0). Header checksums and magic values are not verified, so a file that is
-// not an archive still opens and lists whatever its blocks describe; nothing
-// the headers claim is trusted for allocation.
+// Reading: Open lists the members the way GNU tar reads them: header
+// checksums are verified, GNU long names and pax extended headers (path,
+// linkpath, size, global headers) apply to the member that follows, GNU and
+// pax sparse members read as their full contents, a hard link reads as the
+// member it links to, and records that are no members (pax 'x'/'g',
+// Solaris 'A'/'X', volume labels) are never listed. The zero blocks that end the
+// archive are listed too (entries with an empty name and size 0); nothing
+// after them is. Reading stops at the first block that is neither a valid
+// header nor a zero block, or at a member cut short by the end of the file:
+// the entries before it stay listed and IsDamaged/ErrorString tell where and
+// why. Nothing the headers claim is trusted for allocation.
 //
 // Writing: AddFile / AddDirectory collect members, Write(path) writes them as
 // ustar headers (mode, size, time, checksum, magic "ustar" version "00"),
@@ -68,7 +98,15 @@ public:
     // Opens the archive (path, when not empty, becomes the file name) and
     // lists its entries. False when there is no file name or the file cannot
     // be opened; the previous entry list then stays and no file is left open.
+    // True for any file that opens, archive or not: ask IsDamaged.
     bool Open(QFlags<QIODevice::OpenModeFlag> mode, const QString &path = QString());
+    // After Open: true when the archive could not be read cleanly to its end
+    // (not an archive, a bad header, a member cut short, or a member this
+    // reader cannot represent). ErrorString then says where and why, in the
+    // words GNU tar uses ("does not look like a tar archive", "unexpected end
+    // of archive at offset N", "checksum error at offset N", ...).
+    bool IsDamaged() const;
+    QString ErrorString() const;
     // Closes the open file; the entry list stays.
     void Close();
     bool IsOpen() const;
@@ -76,8 +114,9 @@ public:
     unsigned int EntryCount() const;
     // A copy of entry index, or a default entry when index is out of range.
     TarFileEntry Entry(unsigned int index) const;
-    // The member's bytes: a null array when no archive is open; fewer bytes
-    // than its size when the member is cut short by the end of the file.
+    // The member's bytes (holes of a sparse member as zeros): a null array
+    // when no archive is open; fewer bytes than its size when the file has
+    // become shorter since it was opened.
     QByteArray EntryData(TarFileEntry &entry);
 
     // Members for Write, in the order added. A name ending in "/" given to
@@ -108,15 +147,20 @@ private:
 
     static unsigned int CalcChecksum(signed char *header);
     static unsigned int ReadOctal(const signed char *field);
+    // A numeric header field as GNU tar reads it: leading blanks and NULs
+    // skipped, then octal digits ended by a blank, a NUL or the field's end,
+    // or GNU's base-256 form. False for anything else, a negative value or
+    // one beyond 63 bits.
+    static bool ReadNumber(const char *field, int width, quint64 &value);
     static void PutOctalNumber(signed char *field, unsigned int width, int value, bool checksumStyle);
-    // ReadOctal over at most width bytes, without the 32-bit limit.
-    static quint64 ReadOctal64(const signed char *field, unsigned int width);
     // Octal into a field, for values of up to 64 bits.
     static bool PutOctal64(signed char *field, unsigned int width, quint64 value);
     static bool SplitUstarName(const QByteArray &name, QByteArray &prefix, QByteArray &base);
     static bool MakeHeader(const Member &member, qint64 mtime, signed char *header);
 
     bool Read(QDataStream &stream);
+    // Marks the archive damaged (the first reason wins); returns false.
+    bool Damaged(const QString &reason);
     bool Write(QDataStream &stream);
 
     QList<TarFileEntry> m_entries;
@@ -124,4 +168,5 @@ private:
     QString m_fileName;
     QList<Member> m_members;
     qint64 m_mtime = -1;
+    QString m_error;
 };

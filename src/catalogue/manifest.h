@@ -124,7 +124,9 @@ private:
     // Forgets the listing of dir and the packages read from it.
     void ForgetListing(const QString &dir);
     // The module-information members of a package, read once per scan.
-    QList<MifRecord> PackageMifs(const QString &package);
+    // False, with a message the first time, when the package is a damaged
+    // archive: the scan then takes nothing from it.
+    bool PackageMifs(const QString &package, QList<MifRecord> &records);
 
     // Set only while GenerateManifest scans.
     ScanState *m_scan = nullptr;

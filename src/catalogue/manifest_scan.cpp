@@ -72,6 +72,7 @@ struct Manifest::ScanState
     QSet<QPair<quint64, quint64>> visited;
     QHash<QString, QList<Manifest::DirEntry>> listings;
     QHash<QString, QList<MifRecord>> packages;
+    QSet<QString> damagedPackages;
 };
 
 namespace {
@@ -422,7 +423,8 @@ void Manifest::ProcessTarget(QSharedPointer<_TestModule>, const QString &)
 void Manifest::ProcessPackageDir(QSharedPointer<_TestModule> module, const QString &dir)
 {
     for (const DirEntry &entry : Listing(dir)) {
-        if (!IsPackageFile(entry))
+        QList<MifRecord> mifs;
+        if (!IsPackageFile(entry) || !PackageMifs(entry.absolutePath, mifs))
             continue;
         DecompileKestoPackage(module, entry.absolutePath);
         QString name;
@@ -436,24 +438,36 @@ void Manifest::ProcessPackageDir(QSharedPointer<_TestModule> module, const QStri
     }
 }
 
-QList<Manifest::MifRecord> Manifest::PackageMifs(const QString &package)
+bool Manifest::PackageMifs(const QString &package, QList<MifRecord> &records)
 {
+    records.clear();
     if (m_scan) {
+        if (m_scan->damagedPackages.contains(package))
+            return false;
         auto found = m_scan->packages.constFind(package);
-        if (found != m_scan->packages.constEnd())
-            return found.value();
+        if (found != m_scan->packages.constEnd()) {
+            records = found.value();
+            return true;
+        }
     }
 
-    QList<MifRecord> records;
     Tar tar;
     if (tar.Open(QIODevice::ReadOnly, package)) {
+        if (tar.IsDamaged()) {
+            LogMessage(QStringLiteral("Manifest::ProcessPackageDir refused %1: %2\n")
+                           .arg(QDir::toNativeSeparators(package), tar.ErrorString()),
+                       true);
+            if (m_scan)
+                m_scan->damagedPackages.insert(package);
+            return false;
+        }
         const unsigned int count = tar.EntryCount();
         for (unsigned int index = 0; index < count; ++index) {
             TarFileEntry entry = tar.Entry(index);
             MifRecord record;
             record.lowerName = entry.name.toLower();
             // Only a member whose name holds ".mif" can ever be asked for.
-            if (!record.lowerName.contains(QLatin1String(".mif")))
+            if (!entry.IsFile() || !record.lowerName.contains(QLatin1String(".mif")))
                 continue;
             const QByteArray data = tar.EntryData(entry);
             KestoResources resources;
@@ -468,7 +482,7 @@ QList<Manifest::MifRecord> Manifest::PackageMifs(const QString &package)
     }
     if (m_scan)
         m_scan->packages.insert(package, records);
-    return records;
+    return true;
 }
 
 void Manifest::DecompileKestoPackage(QSharedPointer<_TestModule> module, const QString &package)
@@ -476,7 +490,9 @@ void Manifest::DecompileKestoPackage(QSharedPointer<_TestModule> module, const Q
     if (!module->classids.isEmpty() || !module->applets.isEmpty())
         return;
     const QString wanted = (module->moduleName + QStringLiteral(".mif")).toLower();
-    for (const MifRecord &record : PackageMifs(package)) {
+    QList<MifRecord> records;
+    PackageMifs(package, records);
+    for (const MifRecord &record : std::as_const(records)) {
         if (!record.lowerName.contains(wanted) || !record.loaded)
             continue;
         module->applets = record.applets;

@@ -201,13 +201,68 @@ int MifCommand(const QStringList &arguments)
 
 // ---- tar ----
 
+// A member name with control characters shown as C escapes, so that a name
+// cannot move the cursor or colour the terminal.
+QString Printable(const QString &name)
+{
+    QString text;
+    for (const QChar c : name) {
+        const char16_t u = c.unicode();
+        if (u >= 0x20 && u != 0x7f && (u < 0x80 || u > 0x9f)) {
+            text += c;
+            continue;
+        }
+        switch (u) {
+        case '\n': text += QStringLiteral("\\n"); break;
+        case '\t': text += QStringLiteral("\\t"); break;
+        case '\r': text += QStringLiteral("\\r"); break;
+        default: text += QStringLiteral("\\%1").arg(unsigned(u), 3, 8, QLatin1Char('0'));
+        }
+    }
+    return text;
+}
+
+// The first column of a listing line, after ls -l: '-' file, 'd' directory,
+// 'l' symbolic link, 'h' hard link, 'c'/'b' devices, 'p' FIFO, '?' other.
+QChar TypeLetter(const TarFileEntry &entry)
+{
+    if (entry.IsDirectory())
+        return QLatin1Char('d');
+    switch (entry.typeflag) {
+    case '1': return QLatin1Char('h');
+    case '2': return QLatin1Char('l');
+    case '3': return QLatin1Char('c');
+    case '4': return QLatin1Char('b');
+    case '6': return QLatin1Char('p');
+    default: return entry.IsFile() ? QLatin1Char('-') : QLatin1Char('?');
+    }
+}
+
+// Why a member has no bytes to print; empty for a member that has them.
+QString NotAFile(const TarFileEntry &entry)
+{
+    if (entry.IsDirectory())
+        return QStringLiteral("is a directory");
+    if (entry.IsSymLink())
+        return QStringLiteral("is a symbolic link to %1").arg(Printable(entry.linkName));
+    if (entry.IsHardLink() && !entry.IsFile())
+        return QStringLiteral("is a hard link to %1, which the archive does not hold before it")
+            .arg(Printable(entry.linkName));
+    if (!entry.IsFile())
+        return QStringLiteral("is a special file (type '%1')").arg(QLatin1Char(entry.typeflag));
+    return QString();
+}
+
 int TarCommand(const QStringList &arguments)
 {
     QCommandLineParser parser;
     parser.setApplicationDescription(QStringLiteral(
         "Tar package archives.\n"
-        "  list FILE         one line per member: offset, size, name (tab-separated)\n"
-        "  cat FILE MEMBER   the bytes of a member on standard output"));
+        "  list FILE         one line per member: type (- d l h c b p ?), size, name\n"
+        "                    (tab-separated; links followed by \" -> TARGET\" or\n"
+        "                    \" link to TARGET\"; control characters escaped)\n"
+        "  cat FILE MEMBER   the bytes of a member on standard output\n"
+        "A damaged archive is reported on standard error with exit status 2."));
     parser.addPositionalArgument(QStringLiteral("ACTION"), QStringLiteral("list or cat."));
     parser.addPositionalArgument(QStringLiteral("FILE"), QStringLiteral("The archive."));
     int status = ExitSuccess;
@@ -225,27 +280,51 @@ int TarCommand(const QStringList &arguments)
         Err(QStringLiteral("%1: cannot open %2\n").arg(arguments.at(0), args.at(1)));
         return ExitUsage;
     }
+    const QString damage = tar.IsDamaged()
+        ? QStringLiteral("%1: %2: %3\n").arg(arguments.at(0), args.at(1), tar.ErrorString())
+        : QString();
     if (list) {
         QString text;
         for (unsigned int i = 0; i < tar.EntryCount(); ++i) {
             const TarFileEntry entry = tar.Entry(i);
-            if (entry.name.isEmpty())  // the zero blocks that end the archive
-                continue;
-            text += QStringLiteral("%1\t%2\t%3\n").arg(entry.offset).arg(entry.size).arg(entry.name);
+            if (entry.name.isEmpty()) // the zero blocks that end the archive
+                break;
+            text += QStringLiteral("%1\t%2\t%3").arg(TypeLetter(entry)).arg(entry.size).arg(Printable(entry.name));
+            if (entry.IsSymLink())
+                text += QStringLiteral(" -> ") + Printable(entry.linkName);
+            else if (entry.IsHardLink())
+                text += QStringLiteral(" link to ") + Printable(entry.linkName);
+            text += QLatin1Char('\n');
         }
         Out(text);
+        if (!damage.isEmpty()) {
+            Err(damage);
+            return ExitUsage;
+        }
         return ExitSuccess;
     }
-    for (unsigned int i = 0; i < tar.EntryCount(); ++i) {
-        TarFileEntry entry = tar.Entry(i);
-        if (entry.name == args.at(2) && !entry.IsDirectory()) {
-            const QByteArray data = tar.EntryData(entry);
-            fwrite(data.constData(), 1, static_cast<size_t>(data.size()), stdout);
-            fflush(stdout);
-            return ExitSuccess;
-        }
+    if (!damage.isEmpty()) {
+        Err(damage);
+        return ExitUsage;
     }
-    Err(QStringLiteral("%1: no member %2 in %3\n").arg(arguments.at(0), args.at(2), args.at(1)));
+    // The last member of that name wins, as when the archive is extracted;
+    // a name may also be given as the listing shows it.
+    const QString wanted = args.at(2);
+    for (unsigned int i = tar.EntryCount(); i-- > 0;) {
+        TarFileEntry entry = tar.Entry(i);
+        if (entry.name.isEmpty() || (entry.name != wanted && Printable(entry.name) != wanted))
+            continue;
+        const QString why = NotAFile(entry);
+        if (!why.isEmpty()) {
+            Err(QStringLiteral("%1: %2 %3 in %4\n").arg(arguments.at(0), Printable(entry.name), why, args.at(1)));
+            return ExitUsage;
+        }
+        const QByteArray data = tar.EntryData(entry);
+        fwrite(data.constData(), 1, static_cast<size_t>(data.size()), stdout);
+        fflush(stdout);
+        return ExitSuccess;
+    }
+    Err(QStringLiteral("%1: no member %2 in %3\n").arg(arguments.at(0), Printable(args.at(2)), args.at(1)));
     return ExitUsage;
 }
 

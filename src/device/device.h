@@ -104,7 +104,9 @@ public:
     static void Uninitialize();
     // Fills targets with the reachable handsets; returns their count.
     static unsigned int ListTargets(QList<ConnectTarget> &targets);
-    // An open connection, or null (with the reason in the log).
+    // An open connection, or null (with the reason in the log). The
+    // connection reports later refusals (a damaged package) to log as well,
+    // so log must outlive it.
     static IKestoDevice *ConnectToTarget(const ConnectTarget &target, Log *log);
     static void DisconnectTarget(IKestoDevice *device);
 };

@@ -90,6 +90,7 @@ IKestoDevice *ConnectFactory::ConnectToTarget(const ConnectTarget &target, Log *
         delete device;
         return nullptr;
     }
+    device->SetLogger(log);
     return device;
 }
 

@@ -2,6 +2,7 @@
 
 #include "archive/tar.h"
 #include "common/handsetpath.h"
+#include "log/log.h"
 #include "resources/kestoresources.h"
 #include "resources/sysresource.h"
 
@@ -370,7 +371,13 @@ unsigned int EmulatedHandset::InstallPackage(const QString &hostPath)
     Tar tar;
     if (!tar.Open(QIODevice::ReadOnly, hostPath))
         return Fail(HANDSET_ERROR_IO);
-    const qint64 archiveSize = QFileInfo(hostPath).size();
+    if (tar.IsDamaged()) {
+        if (m_log)
+            m_log->LogMessage(QStringLiteral("EmulatedHandset::InstallPackage refused %1: %2\n")
+                                  .arg(QDir::toNativeSeparators(hostPath), tar.ErrorString()),
+                              true);
+        return Fail(HANDSET_ERROR_BAD_PACKAGE);
+    }
 
     // Check every member before writing any.
     struct Planned
@@ -403,8 +410,6 @@ unsigned int EmulatedHandset::InstallPackage(const QString &hostPath)
         }
         const QString host = HandsetPath::ToHost(m_folder, QLatin1String(kUserModules) + segments.join(QLatin1Char('/')));
         if (host.isEmpty())
-            return Fail(HANDSET_ERROR_BAD_PACKAGE);
-        if (isFile && entry.offset + qint64(entry.size) > archiveSize)
             return Fail(HANDSET_ERROR_BAD_PACKAGE);
         haveFile = haveFile || isFile;
         plan.append(Planned{entry, host});

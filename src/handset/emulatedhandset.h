@@ -7,6 +7,8 @@
 #include <QString>
 #include <QVector>
 
+class Log;
+
 // Result numbers of the emulated handset's operations (also left in
 // lastError). They are stable: users see them in run logs.
 enum EmulatedHandsetError : unsigned int {
@@ -76,6 +78,9 @@ public:
     // out as if unplugged: it writes its "offline" file and fails from the
     // next operation on (a fault to rehearse a handset lost at any step).
     bool IsReachable();
+    // Where refusals that a result number cannot explain are reported (a
+    // damaged package); none when null. The log must outlive the handset.
+    void SetLogger(Log *log) { m_log = log; }
     // Real time a behaviour script may run before it is killed.
     void SetBehaviourTimeout(int milliseconds) { m_behaviourTimeoutMs = milliseconds; }
 
@@ -94,9 +99,11 @@ public:
     unsigned int DeleteFile(const QString &path) override;
     // Writes every regular member of a tar package below "fs:/usermods/"
     // (directory members become folders; links and other special members are
-    // skipped). A package with an absolute member name, a ".." segment, a
-    // member that would land outside the handset or a member cut short, and
-    // a package without any regular member, is refused as a whole
+    // skipped; a hard link is written as a copy of the file it links to). A
+    // damaged archive (with its reason in the log), a package with an
+    // absolute member name, a ".." segment or a member that would land
+    // outside the handset, and a package without any regular member, is
+    // refused as a whole
     // (HANDSET_ERROR_BAD_PACKAGE) before anything is written; a write that
     // fails (HANDSET_ERROR_IO) takes back the files and folders the package
     // had created (files it replaced keep their new content).
@@ -140,6 +147,7 @@ private:
 
     QString m_folder;
     QString m_version;
+    Log *m_log = nullptr;
     int m_behaviourTimeoutMs = kDefaultBehaviourTimeoutMs;
     // "offlineAfter"; negative when the handset never drops out by itself.
     qint64 m_offlineAfter = -1;

@@ -100,7 +100,7 @@ bool ReadFromPackage(const QString &directory, const QString &moduleName, const 
         return false;
 
     Tar archive;
-    if (!archive.Open(QIODevice::ReadOnly, package))
+    if (!archive.Open(QIODevice::ReadOnly, package) || archive.IsDamaged())
         return false;
     const QString wanted = moduleName + QStringLiteral(".mif");
     for (unsigned int i = 0; i < archive.EntryCount(); ++i) {

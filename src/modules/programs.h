@@ -30,7 +30,8 @@ HARNESS_EXPORT void WriteToManifest(XmlNode &element, QList<SysResource> &progra
 // <directory>/<module>_Win32_Debug.kestix, _Win32_Release.kestix,
 // RVCT22arm9_Release.kestix, then the same with prefix (e.g. "ctf") before the
 // module name. mifName, when given, receives the file name of the module
-// information member. False when no package or member was found.
+// information member. False when no package or member was found, or the
+// package is a damaged archive (nothing is read from it then).
 HARNESS_EXPORT bool ReadFromPackage(const QString &directory, const QString &moduleName,
                                     const QString &prefix, unsigned int programType,
                                     QList<SysResource> &programs, QString *mifName);

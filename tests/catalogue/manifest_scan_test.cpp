@@ -289,8 +289,11 @@ TEST_F(ManifestScanTest, ModuleInformationComesFromTheFirstMatchingMemberThatLoa
                     {{QStringLiteral("Other/Other.mif"), testutil::BuildMif(other)},
                      {QStringLiteral("Mif/MIF.MIF.bak"), QByteArray("not a resource file")},
                      {QStringLiteral("Mif/Mif.mif"), testutil::BuildMif(module.package)}});
-    // A package that is not an archive at all is skipped.
+    // A package that is not an archive, and one cut short, are refused with
+    // their reason: neither becomes a target.
     kit->AddFile(QStringLiteral("tests/mif/package/Mif_armgcc_Release.kestix"), QByteArray(700, 'x'));
+    const QString good = kit->Path(QStringLiteral("tests/mif/package/Mif_Win32_Debug.kestix"));
+    kit->AddFile(QStringLiteral("tests/mif/package/Mif_Win32_Release.kestix"), testutil::ReadFile(good).left(1500));
 
     Manifest manifest(kit->Root(), false);
     Scan(manifest);
@@ -298,7 +301,13 @@ TEST_F(ManifestScanTest, ModuleInformationComesFromTheFirstMatchingMemberThatLoa
     const auto found = manifest.FindTestModule(QStringLiteral("mif"));
     ASSERT_TRUE(found);
     EXPECT_EQ(found->classids, QVector<unsigned int>{0x0101});
-    EXPECT_EQ(found->targets.size(), 2);
+    EXPECT_EQ(found->targets.keys(), QStringList{QStringLiteral("Mif_Win32_Debug")});
+    const QString log = LogText();
+    EXPECT_TRUE(log.contains(QStringLiteral("Manifest::ProcessPackageDir refused %1: does not look like a tar archive\n")
+                                 .arg(kit->Path(QStringLiteral("tests/mif/package/Mif_armgcc_Release.kestix")))))
+        << log.toStdString();
+    EXPECT_TRUE(log.contains(QStringLiteral("Mif_Win32_Release.kestix: unexpected end of archive at offset 1500\n")))
+        << log.toStdString();
 }
 
 TEST_F(ManifestScanTest, ASymbolicLinkLoopIsWalkedOnce)

@@ -3,6 +3,7 @@
 #include "support/testutil.h"
 
 #include <QDir>
+#include <QFile>
 #include <QTemporaryDir>
 
 #include <gtest/gtest.h>
@@ -85,33 +86,60 @@ TEST_F(InspectTool, TarListAndCatReadAnArchiveMadeByGnuTar)
         GTEST_SKIP() << "tar not installed";
     WriteFile(Path(QStringLiteral("pkg/mod/a.txt")), "alpha\n");
     WriteFile(Path(QStringLiteral("pkg/mod/empty")), "");
-    ASSERT_EQ(testutil::RunProgram(QStringLiteral("tar"), {QStringLiteral("-cf"), Path(QStringLiteral("p.tar")),
-                                                           QStringLiteral("-C"), Path(QStringLiteral("pkg")),
-                                                           QStringLiteral("mod")}),
-              0);
-    const ToolResult list = RunTool({QStringLiteral("tar"), QStringLiteral("list"), Path(QStringLiteral("p.tar"))});
-    ASSERT_EQ(list.status, 0);
-    const QList<QByteArray> lines = list.out.trimmed().split('\n');
-    ASSERT_EQ(lines.size(), 3) << list.out.constData();
-    QStringList names;
-    for (const QByteArray &line : lines) {
-        const QList<QByteArray> fields = line.split('\t');
-        ASSERT_EQ(fields.size(), 3);
-        names << QString::fromUtf8(fields.at(2));
-        if (fields.at(2) == "mod/a.txt") {
-            EXPECT_EQ(fields.at(1), "6");
-        }
-    }
-    names.sort();
-    EXPECT_EQ(names, (QStringList{QStringLiteral("mod/"), QStringLiteral("mod/a.txt"), QStringLiteral("mod/empty")}));
+    WriteFile(Path(QStringLiteral("pkg/mod/red\x1b[31m\n")), "x");
+    ASSERT_TRUE(QFile::link(QStringLiteral("a.txt"), Path(QStringLiteral("pkg/mod/link"))));
+    WriteFile(Path(QStringLiteral("pkg/late")), "late");
+    const auto makeTar = [this](const QString &name, const QStringList &members) {
+        return testutil::RunProgram(QStringLiteral("tar"), QStringList{QStringLiteral("--sort=name"), QStringLiteral("-cf"),
+                                                                       Path(name), QStringLiteral("-C"),
+                                                                       Path(QStringLiteral("pkg"))} + members);
+    };
+    ASSERT_EQ(makeTar(QStringLiteral("p.tar"), {QStringLiteral("mod")}), 0);
+    ASSERT_EQ(makeTar(QStringLiteral("late.tar"), {QStringLiteral("late")}), 0);
+    // Whatever follows the end-of-archive blocks is not listed, as with tar -t.
+    const QByteArray archive = ReadFile(Path(QStringLiteral("p.tar")));
+    WriteFile(Path(QStringLiteral("both.tar")), archive + ReadFile(Path(QStringLiteral("late.tar"))));
+    const ToolResult list = RunTool({QStringLiteral("tar"), QStringLiteral("list"), Path(QStringLiteral("both.tar"))});
+    ASSERT_EQ(list.status, 0) << list.err.constData();
+    EXPECT_EQ(list.out, QByteArray("d\t0\tmod/\n"
+                                   "-\t6\tmod/a.txt\n"
+                                   "-\t0\tmod/empty\n"
+                                   "l\t0\tmod/link -> a.txt\n"
+                                   "-\t1\tmod/red\\033[31m\\n\n"));
 
-    const ToolResult cat = RunTool({QStringLiteral("tar"), QStringLiteral("cat"), Path(QStringLiteral("p.tar")),
-                                    QStringLiteral("mod/a.txt")});
-    EXPECT_EQ(cat.status, 0);
-    EXPECT_EQ(cat.out, QByteArray("alpha\n"));
-    EXPECT_EQ(RunTool({QStringLiteral("tar"), QStringLiteral("cat"), Path(QStringLiteral("p.tar")),
-                       QStringLiteral("mod/none")}).status,
-              2);
+    const auto cat = [this](const QString &file, const QString &member) {
+        return RunTool({QStringLiteral("tar"), QStringLiteral("cat"), Path(file), member});
+    };
+    ToolResult r = cat(QStringLiteral("p.tar"), QStringLiteral("mod/a.txt"));
+    EXPECT_EQ(r.status, 0);
+    EXPECT_EQ(r.out, QByteArray("alpha\n"));
+    // A name is found as the listing shows it too.
+    EXPECT_EQ(cat(QStringLiteral("p.tar"), QStringLiteral("mod/red\\033[31m\\n")).out, QByteArray("x"));
+    const struct
+    {
+        QString file;
+        QString member;
+        QByteArray message;
+    } refusals[] = {
+        {QStringLiteral("p.tar"), QStringLiteral("mod/none"), "no member mod/none"},
+        {QStringLiteral("p.tar"), QStringLiteral("mod/"), "mod/ is a directory"},
+        {QStringLiteral("p.tar"), QStringLiteral("mod/link"), "mod/link is a symbolic link to a.txt"},
+        {QStringLiteral("cut.tar"), QStringLiteral("mod/a.txt"), "cut.tar: unexpected end of archive at offset 1300"},
+        {QStringLiteral("pkg/mod/a.txt"), QStringLiteral("a"), "a.txt: does not look like a tar archive"},
+    };
+    WriteFile(Path(QStringLiteral("cut.tar")), archive.left(1300));
+    for (const auto &refusal : refusals) {
+        r = cat(refusal.file, refusal.member);
+        EXPECT_EQ(r.status, 2) << refusal.message.constData();
+        EXPECT_TRUE(r.out.isEmpty());
+        EXPECT_TRUE(r.err.startsWith("harness tar: ")) << r.err.constData();
+        EXPECT_TRUE(r.err.contains(refusal.message)) << r.err.constData();
+    }
+    // A damaged archive lists what comes before the damage, then says why.
+    r = RunTool({QStringLiteral("tar"), QStringLiteral("list"), Path(QStringLiteral("cut.tar"))});
+    EXPECT_EQ(r.status, 2);
+    EXPECT_EQ(r.out, QByteArray("d\t0\tmod/\n-\t6\tmod/a.txt\n"));
+    EXPECT_TRUE(r.err.endsWith("cut.tar: unexpected end of archive at offset 1300\n")) << r.err.constData();
 }
 
 TEST_F(InspectTool, EncodeMatchesIconvAfterTheMarkAndDecodeReadsItBack)

@@ -1,5 +1,6 @@
 #include "device/device.h"
 #include "handset/emulatedhandset.h"
+#include "log/log.h"
 
 #include "support/handsetfixture.h"
 #include "support/testutil.h"
@@ -15,6 +16,7 @@
 #include <thread>
 
 #include <signal.h>
+#include <unistd.h>
 
 namespace {
 
@@ -98,6 +100,10 @@ TEST_F(PackageTest, PackageMadeByTheTarProgramInstalls)
     const QString source = fixture.WorkFolder() + QStringLiteral("/src");
     for (const auto &member : testutil::ModuleMembers(layout))
         testutil::WriteFile(source + QLatin1Char('/') + member.first, member.second);
+    // Two links to one file: GNU tar stores the second as a hard link.
+    ASSERT_EQ(::link(QFile::encodeName(source + QStringLiteral("/ctfmod/data/table.txt")).constData(),
+                     QFile::encodeName(source + QStringLiteral("/ctfmod/data/same.txt")).constData()),
+              0);
     const QString package = fixture.WorkFolder() + QStringLiteral("/gnu.kestix");
     ASSERT_EQ(testutil::RunProgram(QStringLiteral("tar"), {QStringLiteral("-cf"), package, QStringLiteral("-C"),
                                                            source, QStringLiteral(".")}),
@@ -106,6 +112,8 @@ TEST_F(PackageTest, PackageMadeByTheTarProgramInstalls)
     QString directory;
     EXPECT_EQ(device->FindModule(kClass, directory), 0u);
     EXPECT_EQ(directory, QStringLiteral("fs:/usermods/ctfmod/"));
+    EXPECT_EQ(testutil::ReadFile(Host("fs:/usermods/ctfmod/data/same.txt")), QByteArray("rows"));
+    EXPECT_EQ(testutil::ReadFile(Host("fs:/usermods/ctfmod/data/table.txt")), QByteArray("rows"));
 }
 
 TEST_F(PackageTest, ModuleInformationDirectlyInUsermodsNamesNoModule)
@@ -176,15 +184,37 @@ TEST_F(PackageTest, MemberLeadingThroughALinkOutOfTheHandsetRefusesThePackage)
     EXPECT_EQ(Tree(Fs()), (QStringList{QStringLiteral("usermods"), QStringLiteral("usermods/ctfmod")}));
 }
 
-TEST_F(PackageTest, MemberCutShortRefusesThePackage)
+TEST_F(PackageTest, DamagedPackageIsRefusedWithItsReasonAndInstallsNothing)
 {
+    Log log;
+    log.SetLogPath(fixture.WorkFolder() + QStringLiteral("/log.txt"));
+    device = fixture.Connect(QStringLiteral("phone"), &log);
+    ASSERT_TRUE(device);
     const QString package = fixture.MakePackage(QStringLiteral("p.kestix"),
                                                 testutil::Members{{QStringLiteral("m/a.txt"), "a"},
                                                                   {QStringLiteral("m/big.bin"), QByteArray(4096, 'x')}});
-    QFile file(package);
-    ASSERT_TRUE(file.resize(512 + 512 + 512 + 1000));
-    EXPECT_EQ(device->InstallPackage(package), HANDSET_ERROR_BAD_PACKAGE);
-    EXPECT_TRUE(Tree(Fs()).isEmpty());
+    QByteArray bytes = testutil::ReadFile(package);
+    const struct
+    {
+        const char *name;
+        QByteArray bytes;
+        const char *reason;
+    } damaged[] = {
+        {"cut.kestix", bytes.left(512 + 512 + 512 + 1000), "unexpected end of archive at offset 2536"},
+        {"sum.kestix", bytes.left(1024) + "junk" + bytes.mid(1028), "checksum error at offset 1024"},
+        {"text.kestix", QByteArray("m/a.txt\n").repeated(100), "does not look like a tar archive"},
+    };
+    for (const auto &c : damaged) {
+        const QString path = fixture.WorkFolder() + QLatin1Char('/') + QLatin1String(c.name);
+        testutil::WriteFile(path, c.bytes);
+        EXPECT_EQ(device->InstallPackage(path), HANDSET_ERROR_BAD_PACKAGE) << c.name;
+        EXPECT_TRUE(Tree(Fs()).isEmpty()) << c.name;
+        EXPECT_TRUE(testutil::ReadFile(fixture.WorkFolder() + QStringLiteral("/log.txt"))
+                        .contains(QStringLiteral("EmulatedHandset::InstallPackage refused %1: %2\n")
+                                      .arg(path, QLatin1String(c.reason))
+                                      .toLatin1()))
+            << c.name;
+    }
 }
 
 TEST_F(PackageTest, WriteFailureTakesBackWhatThePackageWrote)

@@ -116,9 +116,9 @@ void HandsetFixture::Disconnect::operator()(IKestoDevice *device) const
     ConnectFactory::DisconnectTarget(device);
 }
 
-HandsetFixture::Device HandsetFixture::Connect(const QString &name) const
+HandsetFixture::Device HandsetFixture::Connect(const QString &name, Log *log) const
 {
-    return Device(ConnectFactory::ConnectToTarget(ConnectTarget(name, name), nullptr));
+    return Device(ConnectFactory::ConnectToTarget(ConnectTarget(name, name), log));
 }
 
 } // namespace testutil

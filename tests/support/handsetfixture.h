@@ -13,6 +13,8 @@
 
 class IKestoDevice;
 
+class Log;
+
 namespace testutil {
 
 // A program record (system resource of a program type) of a module
@@ -96,8 +98,8 @@ public:
     };
     using Device = std::unique_ptr<IKestoDevice, Disconnect>;
     // ConnectFactory::ConnectToTarget to the handset of that name (null when
-    // it refuses).
-    Device Connect(const QString &name) const;
+    // it refuses), reporting to log.
+    Device Connect(const QString &name, Log *log = nullptr) const;
 
 private:
     QTemporaryDir m_dir;
