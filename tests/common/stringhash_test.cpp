@@ -32,9 +32,4 @@ INSTANTIATE_TEST_SUITE_P(KnownValues, StringHashTest,
                                            HashCase{u"\U0001F600x", 15080824}),
                          [](const auto &info) { return std::to_string(info.index); });
 
-TEST(StringHash, EmptyModuleNameIsHashZero)
-{
-    EXPECT_EQ(StringHashName(QString()), u"#0"_s);
-}
-
 } // namespace

@@ -68,6 +68,10 @@ TEST_F(EmulatedHandsetTest, CopiesListsDeletesAndRemovesFiles)
     EXPECT_EQ(testutil::ReadFile(Work("back/B.log")), QByteArray("bravo"));
     EXPECT_TRUE(device->CopyOnDevice(u"fs:/usermods/x/B.log"_s, u"fs:/mif/B.log"_s));
     EXPECT_EQ(testutil::ReadFile(Host("fs:/mif/B.log")), QByteArray("bravo"));
+    // A shorter file replaces a longer one whole.
+    testutil::WriteFile(Work("short"), "sh");
+    ASSERT_EQ(device->CopyFileToDevice(Work("short"), u"fs:/mif/B.log"_s), 0u);
+    EXPECT_EQ(testutil::ReadFile(Host("fs:/mif/B.log")), QByteArray("sh"));
 
     EXPECT_EQ(device->DeleteFile(u"fs:/usermods/x/a.log"_s), 0u);
     EXPECT_FALSE(device->FileExists(u"fs:/usermods/x/a.log"_s));
@@ -75,15 +79,6 @@ TEST_F(EmulatedHandsetTest, CopiesListsDeletesAndRemovesFiles)
     EXPECT_FALSE(QFileInfo::exists(Host("fs:/usermods/x")));
     EXPECT_TRUE(QFileInfo::exists(Host("fs:/mif/B.log")));
     EXPECT_EQ(device->lastError, 0u);
-}
-
-TEST_F(EmulatedHandsetTest, CopyReplacesAnExistingFile)
-{
-    testutil::WriteFile(Work("long"), "a much longer text");
-    testutil::WriteFile(Work("short"), "short");
-    ASSERT_EQ(device->CopyFileToDevice(Work("long"), u"fs:/f"_s), 0u);
-    ASSERT_EQ(device->CopyFileToDevice(Work("short"), u"fs:/f"_s), 0u);
-    EXPECT_EQ(testutil::ReadFile(Host("fs:/f")), QByteArray("short"));
 }
 
 TEST_F(EmulatedHandsetTest, ListingShowsOnlyPlainFiles)
@@ -120,93 +115,68 @@ TEST_P(EmulatedHandsetFailure, FailsWithItsErrorNumber)
     EXPECT_EQ(testutil::ReadFile(outside + u"/keep.txt"_s), QByteArray("keep"));
 }
 
+// The error of a listing, or 99 when a failed listing left no empty result.
+unsigned int List(IKestoDevice &d, const QString &path)
+{
+    QSharedPointer<_DirectoryInfo> info;
+    const unsigned int result = d.ListDirectory(path, info);
+    return info && !info->HasFiles() ? result : 99u;
+}
+
+// The error a false result left, or 99 for a true one.
+unsigned int ErrorOf(IKestoDevice &d, bool result)
+{
+    return result ? 99u : d.lastError;
+}
+
+const QString kOut = u"fs:/../../../work/outside/keep.txt"_s;
+constexpr unsigned int kNotFound = HANDSET_ERROR_NOT_FOUND;
+constexpr unsigned int kBadPath = HANDSET_ERROR_BAD_PATH;
+using Work = const QString &;
+
 const FailureCase kFailures[] = {
-    {"ListMissing", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &) {
-         QSharedPointer<_DirectoryInfo> info;
-         const unsigned int result = d.ListDirectory(u"fs:/none"_s, info);
-         return info && !info->HasFiles() ? result : 99u;
-     }},
-    {"ListAFile", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &) {
-         QSharedPointer<_DirectoryInfo> info;
-         return d.ListDirectory(u"fs:/file"_s, info);
-     }},
-    {"ListOutside", HANDSET_ERROR_BAD_PATH,
-     [](IKestoDevice &d, const QString &) {
-         QSharedPointer<_DirectoryInfo> info;
-         return d.ListDirectory(u"fs:/../../../work/outside"_s, info);
-     }},
-    {"ListNoPrefix", HANDSET_ERROR_BAD_PATH,
-     [](IKestoDevice &d, const QString &work) {
-         QSharedPointer<_DirectoryInfo> info;
-         return d.ListDirectory(work, info);
-     }},
-    {"DeleteMissing", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &) { return d.DeleteFile(u"fs:/none"_s); }},
-    {"DeleteOutside", HANDSET_ERROR_BAD_PATH,
-     [](IKestoDevice &d, const QString &) { return d.DeleteFile(u"fs:/../../../work/outside/keep.txt"_s); }},
-    {"RemoveMissing", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &) { return d.RemoveDirectory(u"fs:/none"_s); }},
-    {"RemoveParent", HANDSET_ERROR_BAD_PATH,
-     [](IKestoDevice &d, const QString &) { return d.RemoveDirectory(u"fs:/.."_s); }},
-    {"CopyFromMissingHostFile", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &work) {
-         return d.CopyFileToDevice(work + u"/none"_s, u"fs:/x"_s);
-     }},
-    {"CopyToOutside", HANDSET_ERROR_BAD_PATH,
-     [](IKestoDevice &d, const QString &work) {
-         return d.CopyFileToDevice(work + u"/outside/keep.txt"_s, u"fs:/../../../work/outside/keep.txt"_s);
-     }},
-    {"CopyMissingFromDevice", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &work) {
-         return d.CopyFileFromDevice(u"fs:/none"_s, work + u"/x"_s);
-     }},
-    {"CopyFromOutsideOfDevice", HANDSET_ERROR_BAD_PATH,
-     [](IKestoDevice &d, const QString &work) {
-         return d.CopyFileFromDevice(u"fs:/../handset.ini"_s, work + u"/x"_s);
-     }},
-    {"ExistsOutside", HANDSET_ERROR_BAD_PATH,
-     [](IKestoDevice &d, const QString &) {
-         return d.FileExists(u"fs:/../handset.ini"_s) ? 99u : d.lastError;
-     }},
-    {"ExistsMissing", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &) { return d.FileExists(u"fs:/none"_s) ? 99u : d.lastError; }},
-    {"CopyOnDeviceMissing", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &) {
-         return d.CopyOnDevice(u"fs:/none"_s, u"fs:/y"_s) ? 99u : d.lastError;
-     }},
-    {"CopyOnDeviceToOutside", HANDSET_ERROR_BAD_PATH,
-     [](IKestoDevice &d, const QString &) {
-         return d.CopyOnDevice(u"fs:/file"_s, u"fs:/../../../work/outside/keep.txt"_s) ? 99u
-                                                                                                      : d.lastError;
-     }},
-    {"FindModuleNone", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &) {
+    {"ListMissing", kNotFound, [](IKestoDevice &d, Work) { return List(d, u"fs:/none"_s); }},
+    {"ListAFile", kNotFound, [](IKestoDevice &d, Work) { return List(d, u"fs:/file"_s); }},
+    {"ListOutside", kBadPath, [](IKestoDevice &d, Work) { return List(d, u"fs:/../../../work/outside"_s); }},
+    {"ListNoPrefix", kBadPath, [](IKestoDevice &d, Work work) { return List(d, work); }},
+    {"ListUnknownClass", kNotFound, [](IKestoDevice &d, Work) { return List(d, u"fs:/~0x01010001"_s); }},
+    {"DeleteMissing", kNotFound, [](IKestoDevice &d, Work) { return d.DeleteFile(u"fs:/none"_s); }},
+    {"DeleteOutside", kBadPath, [](IKestoDevice &d, Work) { return d.DeleteFile(kOut); }},
+    {"RemoveMissing", kNotFound, [](IKestoDevice &d, Work) { return d.RemoveDirectory(u"fs:/none"_s); }},
+    {"RemoveParent", kBadPath, [](IKestoDevice &d, Work) { return d.RemoveDirectory(u"fs:/.."_s); }},
+    {"CopyFromMissingHostFile", kNotFound,
+     [](IKestoDevice &d, Work work) { return d.CopyFileToDevice(work + u"/none"_s, u"fs:/x"_s); }},
+    {"CopyToOutside", kBadPath,
+     [](IKestoDevice &d, Work work) { return d.CopyFileToDevice(work + u"/outside/keep.txt"_s, kOut); }},
+    {"CopyMissingFromDevice", kNotFound,
+     [](IKestoDevice &d, Work work) { return d.CopyFileFromDevice(u"fs:/none"_s, work + u"/x"_s); }},
+    {"CopyFromOutsideOfDevice", kBadPath,
+     [](IKestoDevice &d, Work work) { return d.CopyFileFromDevice(u"fs:/../handset.ini"_s, work + u"/x"_s); }},
+    {"ExistsOutside", kBadPath,
+     [](IKestoDevice &d, Work) { return ErrorOf(d, d.FileExists(u"fs:/../handset.ini"_s)); }},
+    {"ExistsMissing", kNotFound, [](IKestoDevice &d, Work) { return ErrorOf(d, d.FileExists(u"fs:/none"_s)); }},
+    {"CopyOnDeviceMissing", kNotFound,
+     [](IKestoDevice &d, Work) { return ErrorOf(d, d.CopyOnDevice(u"fs:/none"_s, u"fs:/y"_s)); }},
+    {"CopyOnDeviceToOutside", kBadPath,
+     [](IKestoDevice &d, Work) { return ErrorOf(d, d.CopyOnDevice(u"fs:/file"_s, kOut)); }},
+    {"FindModuleNone", kNotFound,
+     [](IKestoDevice &d, Work) {
          QString directory = u"stale"_s;
          const unsigned int result = d.FindModule(0x01010001, directory);
          return directory.isEmpty() ? result : 99u;
      }},
-    {"FindModuleZero", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &) {
+    {"FindModuleZero", kNotFound,
+     [](IKestoDevice &d, Work) {
          QString directory;
          return d.FindModule(0, directory);
      }},
-    {"ListUnknownClass", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &) {
-         QSharedPointer<_DirectoryInfo> info;
-         return d.ListDirectory(u"fs:/~0x01010001"_s, info);
-     }},
-    {"DeleteDirectoryUnknownClass", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &) { return d.DeleteDirectory(0x01010001); }},
-    {"StartUnknownProgram", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &) { return d.StartProgram(u"nothing"_s, QString()); }},
-    {"StartUnknownApplet", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &) { return d.StartApplet(0x1234, QString()); }},
-    {"InstallMissingPackage", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &work) { return d.InstallPackage(work + u"/none.kestix"_s); }},
+    {"DeleteDirectoryUnknownClass", kNotFound, [](IKestoDevice &d, Work) { return d.DeleteDirectory(0x01010001); }},
+    {"StartUnknownProgram", kNotFound, [](IKestoDevice &d, Work) { return d.StartProgram(u"nothing"_s, QString()); }},
+    {"StartUnknownApplet", kNotFound, [](IKestoDevice &d, Work) { return d.StartApplet(0x1234, QString()); }},
+    {"InstallMissingPackage", kNotFound,
+     [](IKestoDevice &d, Work work) { return d.InstallPackage(work + u"/none.kestix"_s); }},
     {"InstallNotATar", HANDSET_ERROR_BAD_PACKAGE,
-     [](IKestoDevice &d, const QString &work) { return d.InstallPackage(work + u"/outside/keep.txt"_s); }},
+     [](IKestoDevice &d, Work work) { return d.InstallPackage(work + u"/outside/keep.txt"_s); }},
 };
 
 INSTANTIATE_TEST_SUITE_P(Operations, EmulatedHandsetFailure, ::testing::ValuesIn(kFailures),

@@ -1,6 +1,8 @@
 // OAT modules and the OAT framework: derived names, run options, the
 // framework's data files and the Perl post-processing.
 
+#include "moduletest.h"
+
 #include "log/log.h"
 #include "modules/oatframework.h"
 #include "modules/oattestmodule.h"
@@ -19,6 +21,7 @@ using ::testing::DoAll;
 using ::testing::NiceMock;
 using ::testing::Return;
 using ::testing::SetArgReferee;
+using moduletest::Target;
 
 namespace {
 
@@ -28,16 +31,6 @@ SysResource Program(const QByteArray &name)
     program.type = 0x01010100;
     program.SetProperty("Program Name", name);
     return program;
-}
-
-QSharedPointer<_CompilerVariant> Variant(const QString &package)
-{
-    QSharedPointer<_CompilerVariant> variant(new _CompilerVariant);
-    variant->name = u"v"_s;
-    variant->arch = IKestoDevice::PLATFORM_WIN32;
-    variant->build = u"Release"_s;
-    variant->packagePath = package;
-    return variant;
 }
 
 struct NameCase {
@@ -82,7 +75,7 @@ protected:
         log.SetLogPath(dir.filePath(u"log.txt"_s));
         module.SetLogger(&log);
         module.moduleName = u"OatTimer"_s;
-        module.targets.insert(u"v"_s, Variant(u"/oattimer.kestix"_s));
+        module.targets.insert(u"v"_s, Target(u"/oattimer.kestix"_s));
         device.platform = IKestoDevice::PLATFORM_WIN32;
         ON_CALL(device, InstallPackage(_)).WillByDefault(Return(0u));
         ON_CALL(device, StartApplet(_, _)).WillByDefault(Return(0u));
@@ -135,16 +128,14 @@ TEST_F(OatRun, PublishesTheModuleInformationFileBeforeStarting)
     EXPECT_TRUE(module.Run(&device, env));
 }
 
-TEST_F(OatRun, WithoutAProgramNothingIsInstalled)
+TEST_F(OatRun, WithoutAProgramNothingIsInstalledAndStartFailuresAreReported)
 {
     module.SetRunOption(u"auto"_s);
     EXPECT_CALL(device, InstallPackage(_)).Times(0);
     EXPECT_FALSE(module.Run(&device, env));
     EXPECT_TRUE(module.runOption.isEmpty());
-}
 
-TEST_F(OatRun, StartFailureIsReported)
-{
+    ::testing::Mock::VerifyAndClearExpectations(&device);
     module.programs << Program("OatSuite1");
     device.lastError = 0x80004005u;
     EXPECT_CALL(device, StartApplet(_, _)).WillOnce(Return(1u));
@@ -176,7 +167,7 @@ TEST(OatFramework, LoadPushesBothCachesAndRestoresTheFlags)
                                {u"DevicePackCachePath"_s, u"/cache/dp.kar"_s}};
     EXPECT_FALSE(framework.Load(&device, env));
 
-    framework.variants.insert(u"v"_s, Variant(u"/oat.kestix"_s));
+    framework.variants.insert(u"v"_s, Target(u"/oat.kestix"_s));
     EXPECT_CALL(device, InstallPackage(u"/oat.kestix"_s)).WillOnce(Return(0u));
     EXPECT_CALL(device, FindModule(0x01010001u, _))
         .WillRepeatedly(DoAll(SetArgReferee<1>(u"fs:/usermods/oat/"_s), Return(0u)));

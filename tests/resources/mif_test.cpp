@@ -263,16 +263,6 @@ TEST(SysResource, DecodesEachKindOfRecord)
     EXPECT_TRUE(record.PropertyNames().isEmpty());
 }
 
-TEST(SysResource, KeyWithTwoPartsGetsNoProgramName)
-{
-    KestoResources resources;
-    resources.AddBinary(0x6000, 1, SysBlock(5, 0x01010100, "ab:cd", {}));
-    SysResource record;
-    ASSERT_TRUE(resources.GetSysResource(1, record));
-    EXPECT_EQ(record.Property("Key").toByteArray(), QByteArray("ab:cd"));
-    EXPECT_FALSE(record.Property("Program Name").isValid());
-}
-
 TEST(SysResource, TruncatedAndOversizedRecordsStayInsideTheBlock)
 {
     KestoResources resources;

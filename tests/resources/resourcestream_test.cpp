@@ -295,24 +295,6 @@ TEST(ResourceStream, At65535PairsSavesAndOneMoreIsRefused)
     EXPECT_EQ(more, QByteArray("keep"));
 }
 
-TEST(ResourceStream, CopiesAreIndependent)
-{
-    ResourceStream original;
-    original.AddResource(1, 1, "a");
-    Save(original);
-    ResourceStream copy(original);
-    copy.AddResource(1, 2, "b");
-    Save(copy);
-    EXPECT_TRUE(original.GetResource(1, 2).isNull());
-    EXPECT_EQ(original.GetResourceHeader()->resourceCount, 1u);
-    EXPECT_EQ(copy.GetResourceHeader()->resourceCount, 2u);
-    original = copy;
-    copy.Clear();
-    EXPECT_EQ(original.GetResource(1, 2), QByteArray("b"));
-    EXPECT_EQ(copy.GetResourceHeader()->offsetToMap, 32u);
-    EXPECT_EQ(copy.GetResourceHeader()->resourceCount, 0u);
-}
-
 // Corrupt inputs: each must load or fail without crashing, a failure must
 // leave the stream as it was, and nothing may describe more than the input.
 struct CorruptCase
