@@ -66,8 +66,7 @@ protected:
 
 TEST_F(FlattenDeviceXmlTest, IncludesEntityFilesBesideThePackAndDropsTheDoctype)
 {
-    Write(u"keys.xml"_s,
-          "<?xml version=\"1.0\"?>\n<include>\n  <keys><key code=\"1\"/></keys>\n</include>\n");
+    Write(u"keys.xml"_s, "<?xml version=\"1.0\"?>\n<include>\n  <keys><key code=\"1\"/></keys>\n</include>\n");
     Write(u"sub/extra.xml"_s, "<include><extra/><more n=\"2\"/></include>");
     const QString device = Write(u"device.xml"_s,
         "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n"

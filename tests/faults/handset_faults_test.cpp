@@ -1,7 +1,7 @@
 // Faults met during whole runs on the emulated handset: the handset dropping
 // out at every step of a module's run, logs that never end or are huge,
 // packages whose module information is damaged, and host files (processed
-// results, catalogue cache) that cannot be written or were cut off.
+// results, catalogue cache) that cannot be written.
 //
 // In every case the run must end (quickly, with the instant clock), report
 // what happened, and keep every verdict recorded before.
@@ -70,8 +70,7 @@ protected:
     void SetUp() override
     {
         ASSERT_TRUE(m_dir.isValid());
-        m_kit.AddFrameworkPackage(u"testframeworks"_s, u"ctf"_s, u"Win32"_s,
-                                  u"Debug"_s);
+        m_kit.AddFrameworkPackage(u"testframeworks"_s, u"ctf"_s, u"Win32"_s, u"Debug"_s);
         AddModule(CtfModule(u"Audio"_s, 0x01230001, {u"play"_s, u"record"_s}));
         AddModule(CtfModule(u"Video"_s, 0x01230002, {u"show"_s, u"seek"_s}));
         ASSERT_TRUE(m_kit.Ok()) << m_kit.Errors().join(QLatin1Char('\n')).toStdString();
@@ -210,32 +209,14 @@ TEST_F(HandsetFaultTest, HandsetLostAtAnyStepEndsTheRunAndKeepsRecordedVerdicts)
                                         u"remove"_s, u"unload"_s}));
 }
 
-TEST_F(HandsetFaultTest, HandsetCountsOperationsBeforeDroppingOut)
-{
-    SetHandsetKey(u"offlineAfter"_s, 2);
-    auto device = m_handsets.Connect(u"phone"_s);
-    ASSERT_TRUE(device);
-    QString version;
-    EXPECT_EQ(device->GetPlatformVersion(version), 0u);
-    EXPECT_FALSE(device->FileExists(u"fs:/nothing"_s));
-    EXPECT_FALSE(device->connectionLost);
-    EXPECT_NE(device->GetPlatformVersion(version), 0u);
-    EXPECT_TRUE(device->connectionLost);
-    EXPECT_TRUE(QFileInfo::exists(HandsetFolder() + u"/offline"_s));
-    // Later connections find it unplugged.
-    EXPECT_FALSE(m_handsets.Connect(u"phone"_s));
-}
-
 class NeverEndingLogTest : public HandsetFaultTest
 {
 protected:
     void SetUp() override
     {
         HandsetFaultTest::SetUp();
-        kitbuilder::Module endless = CtfModule(u"Endless"_s, 0x01230003,
-                                               {u"first"_s, u"second"_s});
-        endless.package.behaviour = CtfBehaviour(u"Endless"_s, u"first"_s,
-                                                 u"second"_s, false);
+        kitbuilder::Module endless = CtfModule(u"Endless"_s, 0x01230003, {u"first"_s, u"second"_s});
+        endless.package.behaviour = CtfBehaviour(u"Endless"_s, u"first"_s, u"second"_s, false);
         AddModule(endless);
         ASSERT_TRUE(m_kit.Ok());
     }
@@ -261,8 +242,7 @@ protected:
     void SetUp() override
     {
         HandsetFaultTest::SetUp();
-        kitbuilder::Module chatty = CtfModule(u"Chatty"_s, 0x01230004,
-                                              {u"early"_s, u"late"_s});
+        kitbuilder::Module chatty = CtfModule(u"Chatty"_s, 0x01230004, {u"early"_s, u"late"_s});
         // About 24 MB: a verdict, half a million lines of chatter, one line
         // of 4 MB without a break, then the last verdict and the end marker.
         chatty.package.behaviour =
@@ -298,8 +278,7 @@ class CorruptMifTest : public HandsetFaultTest, public ::testing::WithParamInter
 
 TEST_P(CorruptMifTest, ModuleFailsToStartAndTheRunGoesOn)
 {
-    kitbuilder::Module broken = CtfModule(u"Broken"_s, 0x01230005,
-                                          {u"a"_s, u"b"_s});
+    kitbuilder::Module broken = CtfModule(u"Broken"_s, 0x01230005, {u"a"_s, u"b"_s});
     QByteArray mif = testutil::BuildMif(broken.package);
     mif = GetParam() == 0 ? mif.left(mif.size() / 2) : QByteArray("not a module information file");
     const QString folder = u"tests/broken"_s;
@@ -351,28 +330,6 @@ TEST_F(HandsetFaultTest, UnwritableResultsFileIsReportedAndTheLogsStayForReproce
     EXPECT_EQ(ReadResults(LogFolder() + u"/ProcessedResults/ProcessedResults.xml"_s).verdicts, kAllRecorded);
 }
 
-TEST_F(HandsetFaultTest, ResultsFileCutOffHalfWayIsKeptAsideAndRebuilt)
-{
-    {
-        auto harness = MakeHarness();
-        ASSERT_TRUE(RunModules(*harness, {u"Audio"_s}));
-    }
-    const QByteArray whole = ReadFile(ResultsPath());
-    const QByteArray half = whole.left(whole.size() / 2);
-    WriteFile(ResultsPath(), half);
-
-    ResetHandset();
-    auto harness = MakeHarness();
-    ASSERT_TRUE(RunModules(*harness, {u"Video"_s}));
-    const ResultsView view = ReadResults(ResultsPath());
-    ASSERT_TRUE(view.ok);
-    EXPECT_EQ(view.verdicts.value(u"Video/show"_s), u"pass"_s);
-    // The damaged file is kept byte for byte beside the new one.
-    QDirIterator aside(QFileInfo(ResultsPath()).absolutePath(), {u"*.unreadable-*"_s}, QDir::Files);
-    ASSERT_TRUE(aside.hasNext()) << m_log.Text().toStdString();
-    EXPECT_EQ(ReadFile(aside.next()), half);
-}
-
 TEST_F(HandsetFaultTest, UnwritableCatalogueCacheStillRunsTheKit)
 {
     // The folder of every catalogue cache is a regular file.
@@ -383,25 +340,6 @@ TEST_F(HandsetFaultTest, UnwritableCatalogueCacheStillRunsTheKit)
     EXPECT_TRUE(RunModules(*harness, {u"Audio"_s})) << m_log.Text().toStdString();
     EXPECT_EQ(ReadResults(ResultsPath()).verdicts.value(u"Audio/play"_s), u"pass"_s);
     EXPECT_EQ(ReadFile(caches), QByteArray("not a folder"));
-}
-
-TEST_F(HandsetFaultTest, CatalogueCacheCutOffHalfWayIsScannedAgain)
-{
-    {
-        auto harness = MakeHarness();
-        ASSERT_TRUE(RunModules(*harness, {u"Audio"_s}));
-    }
-    const QString cache = Manifest(m_kit.Root(), false).ManifestFilePath();
-    const QByteArray whole = ReadFile(cache);
-    ASSERT_FALSE(whole.isEmpty());
-    WriteFile(cache, whole.left(whole.size() / 2));
-
-    ResetHandset();
-    auto harness = MakeHarness();
-    ASSERT_TRUE(RunModules(*harness, {u"Video"_s}));
-    EXPECT_TRUE(m_log.Text().contains(u"Manifest out of date for "_s));
-    EXPECT_EQ(ReadFile(cache), whole);
-    EXPECT_EQ(ReadResults(ResultsPath()).verdicts, kAllRecorded);
 }
 
 } // namespace

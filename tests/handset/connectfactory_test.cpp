@@ -64,8 +64,7 @@ TEST(ConnectFactory, ReadsPlatformAndVersionWithDefaults)
     ASSERT_TRUE(odd);
     EXPECT_EQ(odd->platform, IKestoDevice::PLATFORM_UNKNOWN);
 
-    testutil::WriteFile(fixture.HandsetFolder(u"odd"_s) + u"/handset.ini"_s,
-                        "platform=\nversion=\n");
+    testutil::WriteFile(fixture.HandsetFolder(u"odd"_s) + u"/handset.ini"_s, "platform=\nversion=\n");
     auto blank = fixture.Connect(u"odd"_s);
     ASSERT_TRUE(blank);
     EXPECT_EQ(blank->platform, IKestoDevice::PLATFORM_WIN32);

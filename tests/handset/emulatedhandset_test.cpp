@@ -240,6 +240,22 @@ TEST_F(EmulatedHandsetTest, OfflineFileAppearingMidSessionLosesTheConnectionForG
     EXPECT_TRUE(again->FileExists(u"fs:/a"_s));
 }
 
+TEST_F(EmulatedHandsetTest, HandsetCountsOperationsBeforeDroppingOut)
+{
+    testutil::WriteFile(folder + u"/handset.ini"_s, "offlineAfter=2\n");
+    auto counted = fixture.Connect(u"phone"_s);
+    ASSERT_TRUE(counted);
+    QString version;
+    EXPECT_EQ(counted->GetPlatformVersion(version), 0u);
+    EXPECT_FALSE(counted->FileExists(u"fs:/nothing"_s));
+    EXPECT_FALSE(counted->connectionLost);
+    EXPECT_NE(counted->GetPlatformVersion(version), 0u);
+    EXPECT_TRUE(counted->connectionLost);
+    EXPECT_TRUE(QFileInfo::exists(folder + u"/offline"_s));
+    // Later connections find it unplugged.
+    EXPECT_FALSE(fixture.Connect(u"phone"_s));
+}
+
 TEST_F(EmulatedHandsetTest, VanishedHandsetFolderLosesTheConnection)
 {
     ASSERT_TRUE(QDir(folder).removeRecursively());

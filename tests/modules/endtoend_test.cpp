@@ -91,8 +91,7 @@ TEST_F(EndToEnd, CtfModuleRunsItsProgramAndLeavesNothingBehind)
 {
     testutil::ModuleSpec layout;
     layout.directory = u"ITimer"_s;
-    layout.programs = {{u"Helper"_s, QString(), 0x0102FAF7},
-                     {u"ITimer_k_main"_s, u"-suite all"_s, 0x0102FAF7}};
+    layout.programs = {{u"Helper"_s, QString(), 0x0102FAF7}, {u"ITimer_k_main"_s, u"-suite all"_s, 0x0102FAF7}};
     layout.behaviour = "log=usermods/CTF/CTF.log\n"
                      "[ -f \"$log\" ] || exit 3\n"
                      "{ echo \"Suite: ITimer\"; echo \"Args: $3 $4\"; echo \"Time: 2026/12/03 14:05:09\";\n"
@@ -112,8 +111,7 @@ TEST_F(EndToEnd, CtfModuleRunsItsProgramAndLeavesNothingBehind)
     module.WriteToManifest(entry); // computes the ID hash
 
     // A stale log from an earlier run is replaced by the empty template.
-    testutil::WriteFile(fixture.HostPath(u"phone"_s, u"fs:/usermods/CTF/CTF.log"_s),
-                        "Suite: stale\n");
+    testutil::WriteFile(fixture.HostPath(u"phone"_s, u"fs:/usermods/CTF/CTF.log"_s), "Suite: stale\n");
     RunModule(module);
 
     ASSERT_EQ(module.desktopLogFiles.size(), 1);
@@ -184,8 +182,7 @@ TEST_F(EndToEnd, OatModuleRunsInTheFrameworkAndIsPostProcessed)
                               "  echo \"Status: Failed\"; echo \"RESULT: done\"; } > shared/pek/log/timer_u.oat\n";
     _OatFramework framework;
     framework.name = u"oat"_s;
-    framework.variants.insert(u"oat"_s,
-                              Target(fixture.MakePackage(u"oat_Win32_Release.kestix"_s, frameworkSpec)));
+    framework.variants.insert(u"oat"_s, Target(fixture.MakePackage(u"oat_Win32_Release.kestix"_s, frameworkSpec)));
 
     testutil::ModuleSpec layout;
     layout.directory = u"oattimer"_s;
@@ -347,8 +344,7 @@ TEST_F(EndToEnd, PackagesAreFoundUnderEveryNameTheKitUses)
     testutil::ModuleSpec layout;
     layout.directory = u"ITimer"_s;
     layout.mifName = u"itimer.MIF"_s;
-    layout.programs = {{u"ITimer_k"_s, u"-a"_s, 0x0102FAF7},
-                     {u"NotAProgram"_s, QString(), 0x0102C305}};
+    layout.programs = {{u"ITimer_k"_s, u"-a"_s, 0x0102FAF7}, {u"NotAProgram"_s, QString(), 0x0102C305}};
     testutil::Members members = testutil::ModuleMembers(other) + testutil::ModuleMembers(layout);
     const QString folder = fixture.WorkFolder() + u"/package"_s;
     QDir().mkpath(folder);

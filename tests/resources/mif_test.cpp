@@ -193,8 +193,7 @@ QByteArray SysBlock(quint16 keysize, quint32 type, const QByteArray &key, const 
 TEST(SysResource, ProgramRecordWithAnEightByteKey)
 {
     KestoResources resources;
-    resources.AddBinary(0x6000, 1,
-                        SysBlock(8, 0x0102FAF7, QByteArray("tests\0\0\0", 8), {1, 2, 3, 4, 5, 6, 7, 8, 0}));
+    resources.AddBinary(0x6000, 1, SysBlock(8, 0x0102FAF7, QByteArray("tests\0\0\0", 8), {1, 2, 3, 4, 5, 6, 7, 8, 0}));
     resources.AddBinary(0x6000, 2,
                         SysBlock(8, 0x0102C305, QByteArray("other\0\0\0", 8), {1, 2, 3, 4, 5, 6, 7, 8, 6},
                                  QByteArray("-v x\0\0", 6)));
