@@ -22,17 +22,7 @@ namespace {
 using moduletest::Pairs;
 using moduletest::PairsOf;
 
-class LogFiles : public ::testing::Test
-{
-protected:
-    QString Write(const QString &name, const QByteArray &bytes)
-    {
-        const QString path = dir.filePath(name);
-        testutil::WriteFile(path, bytes);
-        return path;
-    }
-    QTemporaryDir dir;
-};
+using LogFiles = moduletest::ModuleFolder;
 
 } // namespace
 

@@ -67,12 +67,11 @@ INSTANTIATE_TEST_SUITE_P(
 
 namespace {
 
-class OatRun : public ::testing::Test
+class OatRun : public moduletest::ModuleFolder
 {
 protected:
     void SetUp() override
     {
-        log.SetLogPath(dir.filePath(u"log.txt"_s));
         module.SetLogger(&log);
         module.moduleName = u"OatTimer"_s;
         module.targets.insert(u"v"_s, Target(u"/oattimer.kestix"_s));
@@ -92,10 +91,7 @@ protected:
         EXPECT_TRUE(module.runOption.isEmpty());
         return arguments;
     }
-    QString LogText() { return QString::fromLatin1(testutil::ReadFile(dir.filePath(u"log.txt"_s))); }
 
-    QTemporaryDir dir;
-    Log log;
     OatTestModule module;
     NiceMock<MockDevice> device;
     QMap<QString, QString> env;
@@ -222,7 +218,7 @@ for my $name (grep { /\.oat$/ } readdir($dh)) {
 }
 )perl";
 
-class OatPostProcess : public ::testing::Test
+class OatPostProcess : public moduletest::ModuleFolder
 {
 protected:
     void SetUp() override
@@ -232,7 +228,6 @@ protected:
         raw = logs + u"/oatRawLogs"_s;
         testutil::WriteFile(perlCache + u"/PostProcess3.pl"_s, kScript);
         testutil::WriteFile(raw + u"/timer-2026.oat"_s, "@Timer\nModuleVer: 1\n");
-        log.SetLogPath(dir.filePath(u"log.txt"_s));
         module.SetLogger(&log);
         module.moduleName = u"Timer"_s;
         module.AddDesktopLogFile(raw + u"/timer-2026.oat"_s);
@@ -244,13 +239,9 @@ protected:
                {u"DSOCacheFilePath"_s, u"/cache/dp.dso"_s},
                {u"Platform"_s, u"/sdk/pvs/platform"_s}};
     }
-    QString LogText() { return QString::fromLatin1(testutil::ReadFile(dir.filePath(u"log.txt"_s))); }
-
-    QTemporaryDir dir;
     QString perlCache;
     QString logs;
     QString raw;
-    Log log;
     OatTestModule module;
     QMap<QString, QString> env;
 };

@@ -49,28 +49,15 @@ auto CopiesContent(const QByteArray &content)
 using moduletest::AppletWithId;
 using moduletest::Target;
 
-class RunContract : public ::testing::Test
+class RunContract : public moduletest::ModuleFolder
 {
 protected:
     void SetUp() override
     {
-        logPath = dir.filePath(u"log.txt"_s);
-        log.SetLogPath(logPath);
         env.insert(u"LogPath"_s, dir.filePath(u"logs"_s));
         env.insert(u"TestRunID"_s, u"{run-1}"_s);
         QDir().mkpath(env.value(u"LogPath"_s));
     }
-    QString LogText() { return QString::fromLatin1(testutil::ReadFile(logPath)); }
-    QString Write(const QString &name, const QByteArray &bytes)
-    {
-        const QString path = dir.filePath(name);
-        testutil::WriteFile(path, bytes);
-        return path;
-    }
-
-    QTemporaryDir dir;
-    QString logPath;
-    Log log;
     QMap<QString, QString> env;
     NiceMock<MockDevice> device;
 };
