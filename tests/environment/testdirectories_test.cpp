@@ -49,6 +49,13 @@ TEST_F(TestDirectoriesTest, CacheFoldersAreCreatedButNotTheirFiles)
     EXPECT_EQ(dso, base + u"/Norvane/TestDataCache/DSOFiles/#7.dso"_s);
     EXPECT_TRUE(QFileInfo(QFileInfo(dso).path()).isDir());
     EXPECT_FALSE(QFileInfo::exists(dso));
+
+    // An empty data root falls back to the generic data location.
+    const QString xdg = temp.path() + u"/xdg"_s;
+    ASSERT_TRUE(QDir().mkpath(xdg));
+    env.Set("XDG_DATA_HOME", xdg);
+    env.Set("KESTIX_DATA_ROOT", QString());
+    EXPECT_EQ(TestDirectories::GetTestDataPath(), xdg + u"/Norvane/TestDataCache"_s);
 }
 
 TEST_F(TestDirectoriesTest, ProcessResultsPathCreatesFoldersButNotTheFile)
@@ -64,15 +71,6 @@ TEST_F(TestDirectoriesTest, ProcessResultsPathCreatesFoldersButNotTheFile)
     testutil::WriteFile(path, "<results/>");
     EXPECT_EQ(TestDirectories::GetProcessResultsPath(u"phone"_s), path);
     EXPECT_EQ(testutil::ReadFile(path), QByteArray("<results/>"));
-}
-
-TEST_F(TestDirectoriesTest, EmptyDataRootFallsBackToGenericDataLocation)
-{
-    const QString xdg = temp.path() + u"/xdg"_s;
-    ASSERT_TRUE(QDir().mkpath(xdg));
-    env.Set("XDG_DATA_HOME", xdg);
-    env.Set("KESTIX_DATA_ROOT", QString());
-    EXPECT_EQ(TestDirectories::GetTestDataPath(), xdg + u"/Norvane/TestDataCache"_s);
 }
 
 struct TargetCase

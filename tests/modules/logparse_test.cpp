@@ -117,12 +117,8 @@ TEST_F(LogFiles, OatMapsStatusWordsAndMarksUnfinishedCasesUnexecuted)
     EXPECT_EQ(results.timeStamp, QDateTime(QDate(2026, 12, 3), QTime(14, 5, 9)));
     EXPECT_EQ(PairsOf(results), (Pairs{{"t1", "unexecuted"}, {"t2", "pass"}, {"t3", "fail"},
                                        {"t4", "unsupported"}, {"t5", "unexecuted"}}));
-}
 
-TEST_F(LogFiles, OatStampedManifestNameReplacesTheSuiteLine)
-{
-    OatTestModule module;
-    TestResults results;
+    // A stamped manifest name replaces the suite line; a log of another kind is not read.
     ASSERT_TRUE(module.ParseLog(Write(u"a.oat"_s, "@suite\nManifest Name: Timer\n"), results));
     EXPECT_EQ(results.manifestName, u"Timer"_s);
     EXPECT_FALSE(module.ParseLog(Write(u"a.log"_s, "@suite\n"), results));
@@ -152,16 +148,7 @@ TEST_F(LogFiles, UtReadsTheResultTableAndDropsTheUtPrefix)
     EXPECT_FALSE(module.ParseLog(Write(u"ut.xml"_s, "<TestRunLog/>"), results));
 }
 
-TEST_F(LogFiles, SecondaryModulesParseNothing)
-{
-    SecondaryModule module;
-    TestResults results;
-    module.AddDesktopLogFile(Write(u"a.log"_s, "Suite: x\n"));
-    EXPECT_FALSE(module.ParseLog(results));
-    EXPECT_FALSE(module.selectable);
-}
-
-TEST_F(LogFiles, BaseParseStopsAtTheFirstRecognisedLog)
+TEST_F(LogFiles, BaseParseStopsAtTheFirstRecognisedLogAndSecondaryModulesParseNothing)
 {
     CtfTestModule module;
     TestResults results;
@@ -172,6 +159,11 @@ TEST_F(LogFiles, BaseParseStopsAtTheFirstRecognisedLog)
     module.AddDesktopLogFile(Write(u"c.log"_s, "Suite: second\n"));
     ASSERT_TRUE(module.ParseLog(results));
     EXPECT_EQ(results.manifestName, u"first"_s);
+
+    SecondaryModule secondary;
+    secondary.AddDesktopLogFile(Write(u"a.log"_s, "Suite: x\n"));
+    EXPECT_FALSE(secondary.ParseLog(results));
+    EXPECT_FALSE(secondary.selectable);
 }
 
 // Whatever a handset leaves in a log file, the parsers return and keep what

@@ -239,7 +239,7 @@ TEST(ResourceStream, EmptiedTypeStaysListedAndIsNotWritten)
     EXPECT_TRUE(stream.GetResource(4, 1).isNull());
 }
 
-TEST(ResourceStream, SaveWithoutPathWritesBackToTheLoadedFile)
+TEST(ResourceStream, SaveWithoutPathWritesBackToTheLoadedFileAndFailuresLeaveFilesAlone)
 {
     QTemporaryDir dir;
     const QString path = dir.filePath("back.kar");
@@ -256,22 +256,17 @@ TEST(ResourceStream, SaveWithoutPathWritesBackToTheLoadedFile)
     ResourceStream check;
     ASSERT_TRUE(check.Load(path));
     EXPECT_EQ(check.GetResource(1, 2), QByteArray("two"));
-}
 
-TEST(ResourceStream, SaveFailuresLeaveTheFileAlone)
-{
-    QTemporaryDir dir;
-    const QString path = dir.filePath("keep.kar");
-    testutil::WriteFile(path, "old");
+    // Failures leave the file alone.
+    const QString keep = dir.filePath(u"keep.kar"_s);
+    testutil::WriteFile(keep, "old");
     ResourceStream empty;
-    EXPECT_FALSE(empty.Save(path));
+    EXPECT_FALSE(empty.Save(keep));
     QByteArray bytes("untouched");
     EXPECT_FALSE(empty.SaveTo(bytes));
     EXPECT_EQ(bytes, QByteArray("untouched"));
-    ResourceStream stream;
-    stream.AddResource(1, 1, "x");
     EXPECT_FALSE(stream.Save(dir.filePath("no/such/dir/x.kar")));
-    EXPECT_EQ(ReadFile(path), QByteArray("old"));
+    EXPECT_EQ(ReadFile(keep), QByteArray("old"));
     EXPECT_FALSE(stream.Load(dir.filePath("missing.kar")));
     EXPECT_FALSE(stream.Load(QString()));
 }
