@@ -145,7 +145,7 @@ TEST(Mif, RecordsAreReadOnlyInsideTheirBlock)
     EXPECT_EQ(types[0].mimeType, u"text/plain"_s);
 }
 
-TEST(Mif, HeaderShorterThan40BytesIsNoHeader)
+TEST(Mif, HeaderShorterThan40BytesIsNoHeaderAndAnEntryWithoutOneIsLeftAlone)
 {
     KestoResources mif = ModuleInfo();
     mif.AddBinary(0x5000, 0, MifHeaderBlock(2, 2).left(39));
@@ -157,11 +157,7 @@ TEST(Mif, HeaderShorterThan40BytesIsNoHeader)
     QVector<Notifier> notifications;
     EXPECT_TRUE(mif.GetMifNotifications(notifications));
     EXPECT_TRUE(notifications.isEmpty());
-}
 
-TEST(Mif, EntryWithoutAHeaderIsLeftAlone)
-{
-    KestoResources mif = ModuleInfo();
     mif.Clear(0x5000, 0);
     MifEntry entry;
     entry.classes = {7};
