@@ -23,14 +23,11 @@ TEST_F(ClockTest, ScaleZeroAdvancesTheClockWithoutWaiting)
         Clock::Sleep(1000);
     EXPECT_GE(timer.Elapsed(), 600000);
     EXPECT_LT(real.elapsed(), 5000);
-}
 
-TEST_F(ClockTest, NonPositiveSleepsDoNothing)
-{
-    Clock::Timer timer;
+    const qint64 before = timer.Elapsed();
     Clock::Sleep(0);
     Clock::Sleep(-50);
-    EXPECT_LT(timer.Elapsed(), 1000);
+    EXPECT_LT(timer.Elapsed() - before, 1000);
 }
 
 TEST_F(ClockTest, SkippedTimeBelongsToTheSleepingThreadOnly)

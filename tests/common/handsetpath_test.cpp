@@ -8,6 +8,8 @@
 
 #include <gtest/gtest.h>
 
+using namespace Qt::StringLiterals;
+
 namespace {
 
 struct CleanCase
@@ -20,8 +22,7 @@ class HandsetPathClean : public ::testing::TestWithParam<CleanCase> {};
 
 TEST_P(HandsetPathClean, KeepsPathsInsideTheFileSystemAndRefusesTheRest)
 {
-    EXPECT_EQ(HandsetPath::Clean(QString::fromUtf8(GetParam().path)),
-              QString::fromUtf8(GetParam().cleaned));
+    EXPECT_EQ(HandsetPath::Clean(QString::fromUtf8(GetParam().path)), QString::fromUtf8(GetParam().cleaned));
 }
 
 INSTANTIATE_TEST_SUITE_P(
@@ -36,22 +37,17 @@ INSTANTIATE_TEST_SUITE_P(
                       CleanCase{"", ""}, CleanCase{"fs:/my file $x", "fs:/my file $x"}),
     [](const auto &info) { return std::to_string(info.index); });
 
-TEST(HandsetPath, NulCharacterIsRefused)
-{
-    EXPECT_TRUE(HandsetPath::Clean(QStringLiteral("fs:/a") + QChar(0) + QStringLiteral("b")).isEmpty());
-}
-
 class HandsetPathHost : public ::testing::Test
 {
 protected:
     void SetUp() override
     {
         ASSERT_TRUE(dir.isValid());
-        handset = dir.filePath(QStringLiteral("phone"));
-        outside = dir.filePath(QStringLiteral("outside"));
-        ASSERT_TRUE(QDir().mkpath(handset + QStringLiteral("/fs/usermods")));
+        handset = dir.filePath(u"phone"_s);
+        outside = dir.filePath(u"outside"_s);
+        ASSERT_TRUE(QDir().mkpath(handset + u"/fs/usermods"_s));
         ASSERT_TRUE(QDir().mkpath(outside));
-        testutil::WriteFile(outside + QStringLiteral("/secret"), "secret");
+        testutil::WriteFile(outside + u"/secret"_s, "secret");
     }
 
     QString Host(const char *path) { return HandsetPath::ToHost(handset, QString::fromUtf8(path)); }
@@ -61,56 +57,49 @@ protected:
     QString outside;
 };
 
-TEST_F(HandsetPathHost, MapsHandsetPathsBelowTheFsFolder)
+TEST_F(HandsetPathHost, MapsHandsetPathsBelowTheFsFolderAndRefusesTheRest)
 {
-    EXPECT_EQ(Host("fs:/usermods/x/a.log"), handset + QStringLiteral("/fs/usermods/x/a.log"));
-    EXPECT_EQ(Host("fs:/"), handset + QStringLiteral("/fs"));
-    EXPECT_EQ(Host("fs:/new/deeper/file"), handset + QStringLiteral("/fs/new/deeper/file"));
-    EXPECT_EQ(Host("fs:/a/../usermods"), handset + QStringLiteral("/fs/usermods"));
-}
-
-TEST_F(HandsetPathHost, RefusesPathsThatClimbOutOfTheHandset)
-{
+    EXPECT_EQ(Host("fs:/usermods/x/a.log"), handset + u"/fs/usermods/x/a.log"_s);
+    EXPECT_EQ(Host("fs:/"), handset + u"/fs"_s);
+    EXPECT_EQ(Host("fs:/new/deeper/file"), handset + u"/fs/new/deeper/file"_s);
+    EXPECT_EQ(Host("fs:/a/../usermods"), handset + u"/fs/usermods"_s);
+    EXPECT_TRUE(HandsetPath::Clean(u"fs:/a"_s + QChar(0) + u"b"_s).isEmpty());
     EXPECT_TRUE(Host("fs:/../outside/secret").isEmpty());
     EXPECT_TRUE(Host("fs:/usermods/../../handset.ini").isEmpty());
     EXPECT_TRUE(Host("/etc/passwd").isEmpty());
-    EXPECT_TRUE(HandsetPath::ToHost(QString(), QStringLiteral("fs:/a")).isEmpty());
+    EXPECT_TRUE(HandsetPath::ToHost(QString(), u"fs:/a"_s).isEmpty());
 }
 
 TEST_F(HandsetPathHost, RefusesSymbolicLinksThatLeadOutOfTheHandset)
 {
-    ASSERT_TRUE(QFile::link(outside, handset + QStringLiteral("/fs/usermods/escape")));
-    ASSERT_TRUE(QFile::link(outside + QStringLiteral("/secret"), handset + QStringLiteral("/fs/leak")));
-    ASSERT_TRUE(QFile::link(outside + QStringLiteral("/missing"), handset + QStringLiteral("/fs/dangling")));
+    ASSERT_TRUE(QFile::link(outside, handset + u"/fs/usermods/escape"_s));
+    ASSERT_TRUE(QFile::link(outside + u"/secret"_s, handset + u"/fs/leak"_s));
+    ASSERT_TRUE(QFile::link(outside + u"/missing"_s, handset + u"/fs/dangling"_s));
     EXPECT_TRUE(Host("fs:/usermods/escape").isEmpty());
     EXPECT_TRUE(Host("fs:/usermods/escape/secret").isEmpty());
     EXPECT_TRUE(Host("fs:/usermods/escape/new/file").isEmpty());
     EXPECT_TRUE(Host("fs:/leak").isEmpty());
     EXPECT_TRUE(Host("fs:/dangling").isEmpty());
-}
-
-TEST_F(HandsetPathHost, AcceptsSymbolicLinksThatStayInside)
-{
-    ASSERT_TRUE(QFile::link(handset + QStringLiteral("/fs/usermods"), handset + QStringLiteral("/fs/mods")));
-    EXPECT_EQ(Host("fs:/mods/a"), handset + QStringLiteral("/fs/mods/a"));
+    // Links that stay inside are followed.
+    ASSERT_TRUE(QFile::link(handset + u"/fs/usermods"_s, handset + u"/fs/mods"_s));
+    EXPECT_EQ(Host("fs:/mods/a"), handset + u"/fs/mods/a"_s);
 }
 
 TEST_F(HandsetPathHost, RefusesAnFsFolderThatIsADanglingLink)
 {
-    const QString other = dir.filePath(QStringLiteral("other"));
+    const QString other = dir.filePath(u"other"_s);
     ASSERT_TRUE(QDir().mkpath(other));
-    ASSERT_TRUE(QFile::link(outside + QStringLiteral("/nowhere"), other + QStringLiteral("/fs")));
-    EXPECT_TRUE(HandsetPath::ToHost(other, QStringLiteral("fs:/a")).isEmpty());
+    ASSERT_TRUE(QFile::link(outside + u"/nowhere"_s, other + u"/fs"_s));
+    EXPECT_TRUE(HandsetPath::ToHost(other, u"fs:/a"_s).isEmpty());
 }
 
 TEST_F(HandsetPathHost, MapsHostPathsBack)
 {
-    EXPECT_EQ(HandsetPath::FromHost(handset, handset + QStringLiteral("/fs/usermods/x/a.log")),
-              QStringLiteral("fs:/usermods/x/a.log"));
-    EXPECT_EQ(HandsetPath::FromHost(handset, handset + QStringLiteral("/fs")), QStringLiteral("fs:/"));
-    EXPECT_TRUE(HandsetPath::FromHost(handset, handset + QStringLiteral("/fsx/a")).isEmpty());
-    EXPECT_TRUE(HandsetPath::FromHost(handset, handset + QStringLiteral("/handset.ini")).isEmpty());
-    EXPECT_TRUE(HandsetPath::FromHost(handset, handset + QStringLiteral("/fs/../offline")).isEmpty());
+    EXPECT_EQ(HandsetPath::FromHost(handset, handset + u"/fs/usermods/x/a.log"_s), u"fs:/usermods/x/a.log"_s);
+    EXPECT_EQ(HandsetPath::FromHost(handset, handset + u"/fs"_s), u"fs:/"_s);
+    EXPECT_TRUE(HandsetPath::FromHost(handset, handset + u"/fsx/a"_s).isEmpty());
+    EXPECT_TRUE(HandsetPath::FromHost(handset, handset + u"/handset.ini"_s).isEmpty());
+    EXPECT_TRUE(HandsetPath::FromHost(handset, handset + u"/fs/../offline"_s).isEmpty());
 }
 
 } // namespace

@@ -127,8 +127,7 @@ TableCase MakeCase(const char *name)
             for (unsigned int trail = 0x40; trail <= 0xFC; ++trail)
                 if (trail != 0x7F)
                     c.decodeDifferences[lead << 8 | trail] = kSjisUserArea;
-        c.encodeDifferences = {{0x5C, kSjisAscii}, {0x7E, kSjisAscii}, {0xA5, kSjisAscii},
-                               {0x203E, kSjisAscii}};
+        c.encodeDifferences = {{0x5C, kSjisAscii}, {0x7E, kSjisAscii}, {0xA5, kSjisAscii}, {0x203E, kSjisAscii}};
         for (unsigned int unit = 0xE000; unit <= 0xE757; ++unit)
             c.encodeDifferences[unit] = kSjisUserArea;
         return c;

@@ -2,6 +2,8 @@
 
 #include <gtest/gtest.h>
 
+using namespace Qt::StringLiterals;
+
 namespace {
 
 using namespace encodingtest;
@@ -104,7 +106,7 @@ TEST(CreateEncoder, NoConverterForUnicodeNoneOrUnknown)
 // mark (KSC5601, which shares CP949's mark, decodes as CP949).
 TEST(CreateEncoder, MarkOfEachFormatSelectsAConverterThatReadsIt)
 {
-    const QString text = QStringLiteral("Ab1");
+    const QString text = u"Ab1"_s;
     for (int value = 1; value <= 6; ++value) {
         const auto format = static_cast<KestoEncodingFormat>(value);
         EncoderPtr writer = Make(format);
@@ -166,6 +168,9 @@ INSTANTIATE_TEST_SUITE_P(
         Utf8Decode{Bytes({0x02, '1'}), Units({0x02, '1'})},
         Utf8Decode{Bytes({'a', 0xC3, 0xA9}), Units({'a', 0xE9})},
         Utf8Decode{Bytes({0xF0, 0x9F, 0x98, 0x80}), Units({0xD83D, 0xDE00})},
+        // U+FFFF is the last three-byte character, U+10000 the first four-byte one.
+        Utf8Decode{Bytes({0xEF, 0xBF, 0xBF, 0xF0, 0x90, 0x80, 0x80}), Units({0xFFFF, 0xD800, 0xDC00})},
+        Utf8Decode{Bytes({0xF0, 0x8F, 0xBF, 0xBF}), Units({0xFFFD, 0xFFFD, 0xFFFD, 0xFFFD})},
         Utf8Decode{Bytes({0xED, 0xA0, 0xBD, 0xED, 0xB8, 0x80}), Units({0xD83D, 0xDE00})},
         Utf8Decode{Bytes({'a', 0, 'b'}), "a"},
         Utf8Decode{Bytes({'a', 0xE2, 0x82}), "a"},

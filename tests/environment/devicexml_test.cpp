@@ -11,6 +11,8 @@
 
 #include <gtest/gtest.h>
 
+using namespace Qt::StringLiterals;
+
 namespace {
 
 class FlattenDeviceXmlTest : public ::testing::Test
@@ -19,12 +21,12 @@ protected:
     void SetUp() override
     {
         ASSERT_TRUE(temp.isValid());
-        pack = temp.path() + QStringLiteral("/pack");
-        elsewhere = temp.path() + QStringLiteral("/elsewhere");
-        output = temp.path() + QStringLiteral("/out/device.dso");
+        pack = temp.path() + u"/pack"_s;
+        elsewhere = temp.path() + u"/elsewhere"_s;
+        output = temp.path() + u"/out/device.dso"_s;
         ASSERT_TRUE(QDir().mkpath(elsewhere));
-        ASSERT_TRUE(QDir().mkpath(temp.path() + QStringLiteral("/out")));
-        env.Set("HOME", temp.path() + QStringLiteral("/home"));
+        ASSERT_TRUE(QDir().mkpath(temp.path() + u"/out"_s));
+        env.Set("HOME", temp.path() + u"/home"_s);
     }
 
     QString Write(const QString &name, const QByteArray &bytes)
@@ -46,10 +48,10 @@ protected:
     // xmllint's verdict on the flattened file, when it is installed.
     void ExpectWellFormed()
     {
-        if (!testutil::HaveProgram(QStringLiteral("xmllint")))
+        if (!testutil::HaveProgram(u"xmllint"_s))
             return;
         QByteArray messages;
-        EXPECT_EQ(testutil::RunProgram(QStringLiteral("xmllint"), {QStringLiteral("--noout"), output},
+        EXPECT_EQ(testutil::RunProgram(u"xmllint"_s, {u"--noout"_s, output},
                                        &messages),
                   0)
             << messages.toStdString();
@@ -64,10 +66,9 @@ protected:
 
 TEST_F(FlattenDeviceXmlTest, IncludesEntityFilesBesideThePackAndDropsTheDoctype)
 {
-    Write(QStringLiteral("keys.xml"),
-          "<?xml version=\"1.0\"?>\n<include>\n  <keys><key code=\"1\"/></keys>\n</include>\n");
-    Write(QStringLiteral("sub/extra.xml"), "<include><extra/><more n=\"2\"/></include>");
-    const QString device = Write(QStringLiteral("device.xml"),
+    Write(u"keys.xml"_s, "<?xml version=\"1.0\"?>\n<include>\n  <keys><key code=\"1\"/></keys>\n</include>\n");
+    Write(u"sub/extra.xml"_s, "<include><extra/><more n=\"2\"/></include>");
+    const QString device = Write(u"device.xml"_s,
         "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n"
         "<!DOCTYPE devicepack [\n"
         "  <!ENTITY keys SYSTEM \"keys.xml\">\n"
@@ -98,8 +99,8 @@ TEST_F(FlattenDeviceXmlTest, IncludesEntityFilesBesideThePackAndDropsTheDoctype)
 
 TEST_F(FlattenDeviceXmlTest, MergesSectionsOfTheSameNameInDocumentOrder)
 {
-    Write(QStringLiteral("more.xml"), "<x><display><mode n=\"3\"/></display></x>");
-    const QString device = Write(QStringLiteral("device.xml"),
+    Write(u"more.xml"_s, "<x><display><mode n=\"3\"/></display></x>");
+    const QString device = Write(u"device.xml"_s,
         "<?xml version=\"1.0\"?>\n"
         "<!DOCTYPE pack [<!ENTITY more SYSTEM \"more.xml\">]>\n"
         "<pack>\n"
@@ -127,8 +128,8 @@ TEST_F(FlattenDeviceXmlTest, MergesSectionsOfTheSameNameInDocumentOrder)
 
 TEST_F(FlattenDeviceXmlTest, PackWithoutXmlDeclarationKeepsItsDoctype)
 {
-    Write(QStringLiteral("keys.xml"), "<i><keys/></i>");
-    const QString device = Write(QStringLiteral("device.xml"),
+    Write(u"keys.xml"_s, "<i><keys/></i>");
+    const QString device = Write(u"device.xml"_s,
         "<!DOCTYPE pack [<!ENTITY keys SYSTEM \"keys.xml\">]>\n<pack>&keys;</pack>\n");
 
     EXPECT_EQ(Flatten(device), QByteArray("<!DOCTYPE pack [\n"
@@ -142,7 +143,7 @@ TEST_F(FlattenDeviceXmlTest, PackWithoutXmlDeclarationKeepsItsDoctype)
 TEST_F(FlattenDeviceXmlTest, DoctypeWithoutInternalSubsetStays)
 {
     // "]>" further on belongs to the body, not to the declaration.
-    const QString device = Write(QStringLiteral("device.xml"),
+    const QString device = Write(u"device.xml"_s,
         "<?xml version=\"1.0\"?>\n<!DOCTYPE pack SYSTEM \"pack.dtd\">\n<pack><!-- ]> --><a/></pack>\n");
     EXPECT_EQ(Flatten(device), QByteArray("<?xml version='1.0'?>\n"
                                           "<!DOCTYPE pack SYSTEM \"pack.dtd\">\n"
@@ -154,9 +155,9 @@ TEST_F(FlattenDeviceXmlTest, DoctypeWithoutInternalSubsetStays)
 
 TEST_F(FlattenDeviceXmlTest, MissingOrMalformedIncludesKeepTheirReferences)
 {
-    Write(QStringLiteral("broken.xml"), "<i><unclosed></i>");
-    Write(QStringLiteral("good.xml"), "<i><good/></i>");
-    const QString device = Write(QStringLiteral("device.xml"),
+    Write(u"broken.xml"_s, "<i><unclosed></i>");
+    Write(u"good.xml"_s, "<i><good/></i>");
+    const QString device = Write(u"device.xml"_s,
         "<?xml version=\"1.0\"?>\n"
         "<!DOCTYPE pack [\n"
         "<!ENTITY gone SYSTEM \"gone.xml\">\n"
@@ -182,8 +183,8 @@ TEST_F(FlattenDeviceXmlTest, MissingOrMalformedIncludesKeepTheirReferences)
 
 TEST_F(FlattenDeviceXmlTest, TextOutsideAsciiSurvivesAsCharacterReferences)
 {
-    Write(QStringLiteral("names.xml"), "<i><name>\xe6\x97\xa5\xe6\x9c\xac</name></i>");
-    const QString device = Write(QStringLiteral("device.xml"),
+    Write(u"names.xml"_s, "<i><name>\xe6\x97\xa5\xe6\x9c\xac</name></i>");
+    const QString device = Write(u"device.xml"_s,
         "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n"
         "<!DOCTYPE pack [<!ENTITY names SYSTEM \"names.xml\">]>\n"
         "<pack title=\"Caf\xc3\xa9\">&names;<c><![CDATA[\xc3\xa9<\xf0\x9f\x98\x80>]]></c></pack>\n");
@@ -197,60 +198,57 @@ TEST_F(FlattenDeviceXmlTest, TextOutsideAsciiSurvivesAsCharacterReferences)
     QDomDocument document;
     ASSERT_TRUE(document.setContent(flattened));
     const QDomElement root = document.documentElement();
-    EXPECT_EQ(root.attribute(QStringLiteral("title")), QStringLiteral("Caf\u00e9"));
-    EXPECT_EQ(root.firstChildElement(QStringLiteral("name")).text(), QStringLiteral("\u65e5\u672c"));
-    EXPECT_EQ(root.firstChildElement(QStringLiteral("c")).text(),
-              QString::fromUtf8("\xc3\xa9<\xf0\x9f\x98\x80>"));
+    EXPECT_EQ(root.attribute(u"title"_s), u"Caf\u00e9"_s);
+    EXPECT_EQ(root.firstChildElement(u"name"_s).text(), u"\u65e5\u672c"_s);
+    EXPECT_EQ(root.firstChildElement(u"c"_s).text(), QString::fromUtf8("\xc3\xa9<\xf0\x9f\x98\x80>"));
 }
 
 TEST_F(FlattenDeviceXmlTest, PacksInOtherEncodingsAreExpandedToo)
 {
-    if (!testutil::HaveProgram(QStringLiteral("iconv")))
+    if (!testutil::HaveProgram(u"iconv"_s))
         GTEST_SKIP() << "iconv is not installed";
-    Write(QStringLiteral("keys.xml"), "<i><keys/></i>");
+    Write(u"keys.xml"_s, "<i><keys/></i>");
     const QByteArray utf8 = "<?xml version=\"1.0\" encoding=\"%1\"?>\n"
                             "<!DOCTYPE pack [<!ENTITY keys SYSTEM \"keys.xml\">]>\n"
                             "<pack name=\"T\xc3\xa9l\xc3\xa9phone\">&keys;</pack>\n";
     for (const char *encoding : {"ISO-8859-1", "UTF-16"}) {
         SCOPED_TRACE(encoding);
-        const QString plain = Write(QStringLiteral("plain.xml"), QByteArray(utf8).replace("%1", encoding));
+        const QString plain = Write(u"plain.xml"_s, QByteArray(utf8).replace("%1", encoding));
         QByteArray converted;
-        ASSERT_EQ(testutil::RunProgram(QStringLiteral("iconv"),
-                                       {QStringLiteral("-f"), QStringLiteral("UTF-8"), QStringLiteral("-t"),
+        ASSERT_EQ(testutil::RunProgram(u"iconv"_s,
+                                       {u"-f"_s, u"UTF-8"_s, u"-t"_s,
                                         QString::fromLatin1(encoding), plain},
                                        &converted),
                   0);
-        const QString device = Write(QStringLiteral("device.xml"), converted);
+        const QString device = Write(u"device.xml"_s, converted);
         const QByteArray flattened = Flatten(device);
         EXPECT_TRUE(flattened.contains("<pack name=\"T&#xe9;l&#xe9;phone\">\n <keys/>\n</pack>"))
             << flattened.toStdString();
     }
 }
 
-TEST_F(FlattenDeviceXmlTest, RelativeSourceIsFoundFromTheCurrentDirectory)
+TEST_F(FlattenDeviceXmlTest, FailsWithoutWritingOnBadSourceOrDestinationAndReadsRelativeSources)
 {
-    Write(QStringLiteral("keys.xml"), "<i><keys/></i>");
-    Write(QStringLiteral("device.xml"), "<!DOCTYPE p [<!ENTITY k SYSTEM \"keys.xml\">]><p>&k;</p>");
-    CurrentDirectory cd(temp.path());
-    ASSERT_TRUE(FlattenDeviceXml(QStringLiteral("pack/device.xml"), output));
-    EXPECT_TRUE(testutil::ReadFile(output).contains("<p>\n <keys/>\n</p>"));
-}
-
-TEST_F(FlattenDeviceXmlTest, FailsWithoutWritingOnBadSourceOrDestination)
-{
-    const QString good = Write(QStringLiteral("good.xml"), "<pack/>");
-    const QString bad = Write(QStringLiteral("bad.xml"), "<pack><open></pack>");
-    EXPECT_FALSE(FlattenDeviceXml(pack + QStringLiteral("/missing.xml"), output));
-    EXPECT_FALSE(FlattenDeviceXml(QStringLiteral("missing-relative.xml"), output));
+    const QString good = Write(u"good.xml"_s, "<pack/>");
+    const QString bad = Write(u"bad.xml"_s, "<pack><open></pack>");
+    EXPECT_FALSE(FlattenDeviceXml(pack + u"/missing.xml"_s, output));
+    EXPECT_FALSE(FlattenDeviceXml(u"missing-relative.xml"_s, output));
     EXPECT_FALSE(FlattenDeviceXml(bad, output));
     EXPECT_FALSE(FlattenDeviceXml(pack, output));
     EXPECT_FALSE(QFileInfo::exists(output));
-    EXPECT_FALSE(FlattenDeviceXml(good, temp.path() + QStringLiteral("/no/such/folder/x.dso")));
+    EXPECT_FALSE(FlattenDeviceXml(good, temp.path() + u"/no/such/folder/x.dso"_s));
 
     // A device or a pipe named by an entity is never read.
-    Write(QStringLiteral("dev.xml"), "<!DOCTYPE p [<!ENTITY z SYSTEM \"/dev/zero\">]><p>&z;</p>");
-    EXPECT_TRUE(FlattenDeviceXml(pack + QStringLiteral("/dev.xml"), output));
+    Write(u"dev.xml"_s, "<!DOCTYPE p [<!ENTITY z SYSTEM \"/dev/zero\">]><p>&z;</p>");
+    EXPECT_TRUE(FlattenDeviceXml(pack + u"/dev.xml"_s, output));
     EXPECT_TRUE(testutil::ReadFile(output).contains("<p>&z;</p>"));
+
+    // A relative source is found from the current directory.
+    Write(u"keys.xml"_s, "<i><keys/></i>");
+    Write(u"device.xml"_s, "<!DOCTYPE p [<!ENTITY k SYSTEM \"keys.xml\">]><p>&k;</p>");
+    CurrentDirectory cd(temp.path());
+    ASSERT_TRUE(FlattenDeviceXml(u"pack/device.xml"_s, output));
+    EXPECT_TRUE(testutil::ReadFile(output).contains("<p>\n <keys/>\n</p>"));
 }
 
 } // namespace

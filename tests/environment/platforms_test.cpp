@@ -7,6 +7,8 @@
 
 #include <gtest/gtest.h>
 
+using namespace Qt::StringLiterals;
+
 namespace {
 
 class PlatformsTest : public ::testing::Test
@@ -15,8 +17,8 @@ protected:
     void SetUp() override
     {
         ASSERT_TRUE(temp.isValid());
-        root = temp.path() + QStringLiteral("/platforms");
-        kits = temp.path() + QStringLiteral("/Tests");
+        root = temp.path() + u"/platforms"_s;
+        kits = temp.path() + u"/Tests"_s;
         env.Unset("KESTIX_PLATFORMS_ALL");
         env.Unset("KESTIX_PLATFORM");
         env.Unset("KESTIX_TESTSETS_ALL");
@@ -53,7 +55,7 @@ TEST_F(PlatformsTest, NoPlatformsRootListsNothingAndClearsTheList)
 TEST_F(PlatformsTest, ListsSubDirectoriesByNameStrippingTheProWord)
 {
     MakeDirs(root, {"Product", "Foo Pro", "abc", "Pro", "My Project", "Bar PRO 2", "zed"});
-    testutil::WriteFile(root + QStringLiteral("/notes.txt"), "not a platform");
+    testutil::WriteFile(root + u"/notes.txt"_s, "not a platform");
     env.Set("KESTIX_PLATFORMS_ALL", root);
 
     QList<Platform> platforms;
@@ -79,7 +81,7 @@ TEST_F(PlatformsTest, DefaultPlatformIsMatchedIgnoringCase)
 {
     MakeDirs(root, {"abc", "Foo Pro"});
     env.Set("KESTIX_PLATFORMS_ALL", root);
-    env.Set("KESTIX_PLATFORM", (root + QStringLiteral("/ABC/")).toUpper());
+    env.Set("KESTIX_PLATFORM", (root + u"/ABC/"_s).toUpper());
 
     QList<Platform> platforms;
     ASSERT_EQ(GetPlatforms(platforms), 2u);
@@ -88,24 +90,15 @@ TEST_F(PlatformsTest, DefaultPlatformIsMatchedIgnoringCase)
 
     // A root written with a trailing separator still finds its default.
     env.Set("KESTIX_PLATFORMS_ALL", root + QLatin1Char('/'));
-    env.Set("KESTIX_PLATFORM", root + QStringLiteral("/Foo Pro/bin"));
+    env.Set("KESTIX_PLATFORM", root + u"/Foo Pro/bin"_s);
     ASSERT_EQ(GetPlatforms(platforms), 2u);
-    EXPECT_EQ(platforms[1].path, root + QStringLiteral("//Foo Pro"));
+    EXPECT_EQ(platforms[1].path, root + u"//Foo Pro"_s);
     EXPECT_FALSE(platforms[0].isDefault);
     EXPECT_TRUE(platforms[1].isDefault);
-}
 
-TEST_F(PlatformsTest, PlatformSettingWithoutSeparatorMarksNoPlatform)
-{
-    MakeDirs(root, {"abc"});
-    env.Set("KESTIX_PLATFORMS_ALL", root);
-    env.Set("KESTIX_PLATFORM", QStringLiteral("abc"));
-
-    QString path;
-    EXPECT_TRUE(GetDefaultPlatform(path));
-    EXPECT_EQ(path, QStringLiteral("abc"));
-    QList<Platform> platforms;
-    ASSERT_EQ(GetPlatforms(platforms), 1u);
+    // A setting without a separator names no platform.
+    env.Set("KESTIX_PLATFORM", u"abc"_s);
+    ASSERT_EQ(GetPlatforms(platforms), 2u);
     EXPECT_FALSE(platforms[0].isDefault);
 }
 
@@ -141,7 +134,7 @@ class DefaultPlatformTest : public ::testing::TestWithParam<DefaultPlatformCase>
 TEST_P(DefaultPlatformTest, CutsAtLastBackslashThenLastSlash)
 {
     testutil::EnvGuard env("KESTIX_PLATFORM", QString::fromUtf8(GetParam().setting));
-    QString out = QStringLiteral("stale");
+    QString out = u"stale"_s;
     EXPECT_EQ(GetDefaultPlatform(out), GetParam().found);
     EXPECT_EQ(out, QString::fromUtf8(GetParam().path));
 }
@@ -166,42 +159,45 @@ TEST_F(PlatformsTest, TestKitsDefaultToTestsBesidePlatformsRoot)
     EXPECT_EQ(GetTestSetsRoot(), kits);
     QList<TestKit> found{TestKit()};
     ASSERT_EQ(GetTestKits(found), 2u);
-    EXPECT_EQ(found[0].name, QStringLiteral("kitA"));
-    EXPECT_EQ(found[0].path, kits + QStringLiteral("/kitA"));
+    EXPECT_EQ(found[0].name, u"kitA"_s);
+    EXPECT_EQ(found[0].path, kits + u"/kitA"_s);
     EXPECT_EQ(found[0].type, TestKit::TEST_KIT);
     EXPECT_FALSE(found[0].reserved);
-    EXPECT_EQ(found[1].name, QStringLiteral("kitB"));
+    EXPECT_EQ(found[1].name, u"kitB"_s);
 
     // An explicit root takes precedence and is cleaned.
-    const QString other = temp.path() + QStringLiteral("/other");
+    const QString other = temp.path() + u"/other"_s;
     MakeDirs(other, {"only"});
-    env.Set("KESTIX_TESTSETS_ALL", other + QStringLiteral("/./"));
+    env.Set("KESTIX_TESTSETS_ALL", other + u"/./"_s);
     ASSERT_EQ(GetTestKits(found), 1u);
-    EXPECT_EQ(found[0].path, other + QStringLiteral("/only"));
+    EXPECT_EQ(found[0].path, other + u"/only"_s);
 }
 
 TEST_F(PlatformsTest, DefaultTestKitIsTheNamedOneExactly)
 {
-    MakeDirs(kits, {"kitA", "kitB"});
     env.Set("KESTIX_TESTSETS_ALL", kits);
-    env.Set("KESTIX_TESTSET", kits + QStringLiteral("/kitB"));
-
+    env.Set("KESTIX_TESTSET", kits + u"/kitB"_s);
     TestKit kit;
-    ASSERT_TRUE(GetDefaultTestKit(kit));
-    EXPECT_EQ(kit.name, QStringLiteral("kitB"));
-    EXPECT_EQ(kit.path, kits + QStringLiteral("/kitB"));
+    kit.name = u"mine"_s;
+    EXPECT_FALSE(GetDefaultTestKit(kit)); // none installed
+    EXPECT_EQ(kit.name, u"mine"_s);
 
-    env.Set("KESTIX_TESTSET", QStringLiteral("C:\\kits\\kitA"));
+    MakeDirs(kits, {"kitA", "kitB"});
     ASSERT_TRUE(GetDefaultTestKit(kit));
-    EXPECT_EQ(kit.name, QStringLiteral("kitA"));
+    EXPECT_EQ(kit.name, u"kitB"_s);
+    EXPECT_EQ(kit.path, kits + u"/kitB"_s);
+
+    env.Set("KESTIX_TESTSET", u"C:\\kits\\kitA"_s);
+    ASSERT_TRUE(GetDefaultTestKit(kit));
+    EXPECT_EQ(kit.name, u"kitA"_s);
 
     // Not installed, or differing in case only: nothing picked, out unchanged.
     for (const char *setting : {"/kits/kitC", "/kits/KITA"}) {
         env.Set("KESTIX_TESTSET", QString::fromUtf8(setting));
         TestKit untouched;
-        untouched.name = QStringLiteral("mine");
+        untouched.name = u"mine"_s;
         EXPECT_FALSE(GetDefaultTestKit(untouched)) << setting;
-        EXPECT_EQ(untouched.name, QStringLiteral("mine"));
+        EXPECT_EQ(untouched.name, u"mine"_s);
         EXPECT_EQ(untouched.type, TestKit::USER_KIT);
     }
 }
@@ -216,23 +212,13 @@ TEST_F(PlatformsTest, TestSetEndingInSeparatorPicksTheGreatestName)
 
     TestKit kit;
     ASSERT_TRUE(GetDefaultTestKit(kit));
-    EXPECT_EQ(kit.name, QStringLiteral("beta"));
+    EXPECT_EQ(kit.name, u"beta"_s);
 
     // Whatever out held before does not change the choice.
     TestKit prefilled;
-    prefilled.name = QStringLiteral("zzz");
+    prefilled.name = u"zzz"_s;
     ASSERT_TRUE(GetDefaultTestKit(prefilled));
-    EXPECT_EQ(prefilled.name, QStringLiteral("beta"));
-}
-
-TEST_F(PlatformsTest, NoTestKitsInstalledPicksNothing)
-{
-    env.Set("KESTIX_TESTSETS_ALL", kits);
-    env.Set("KESTIX_TESTSET", kits + QStringLiteral("/kitA"));
-    TestKit kit;
-    kit.name = QStringLiteral("mine");
-    EXPECT_FALSE(GetDefaultTestKit(kit));
-    EXPECT_EQ(kit.name, QStringLiteral("mine"));
+    EXPECT_EQ(prefilled.name, u"beta"_s);
 }
 
 TEST(TestKitNames, DefaultTestKitNameIsTheLastComponent)
@@ -249,21 +235,21 @@ TEST(TestKitNames, DefaultTestKitNameIsTheLastComponent)
 
 TEST(TestKitNames, TypeNames)
 {
-    EXPECT_EQ(TestKit::TypeToName(TestKit::USER_KIT), QStringLiteral("User Kit"));
-    EXPECT_EQ(TestKit::TypeToName(TestKit::TEST_KIT), QStringLiteral("Test Kit"));
-    EXPECT_EQ(TestKit::TypeToName(TestKit::PVS_KIT), QStringLiteral("Pvs Kit"));
-    EXPECT_EQ(TestKit::TypeToName(static_cast<TestKit::KitType>(7)), QStringLiteral("unknown"));
-    EXPECT_EQ(TestKit::TypeToName(static_cast<TestKit::KitType>(-1)), QStringLiteral("unknown"));
+    EXPECT_EQ(TestKit::TypeToName(TestKit::USER_KIT), u"User Kit"_s);
+    EXPECT_EQ(TestKit::TypeToName(TestKit::TEST_KIT), u"Test Kit"_s);
+    EXPECT_EQ(TestKit::TypeToName(TestKit::PVS_KIT), u"Pvs Kit"_s);
+    EXPECT_EQ(TestKit::TypeToName(static_cast<TestKit::KitType>(7)), u"unknown"_s);
+    EXPECT_EQ(TestKit::TypeToName(static_cast<TestKit::KitType>(-1)), u"unknown"_s);
 }
 
 TEST(EnvironmentReaders, EmptyTestSetsRootFallsBackBesidePlatforms)
 {
     testutil::EnvGuard env;
-    env.Set("KESTIX_PLATFORMS_ALL", QStringLiteral("/sdk/./platforms"));
-    env.Set("KESTIX_TESTSETS_ALL", QStringLiteral("/kits/../kits"));
-    EXPECT_EQ(GetTestSetsRoot(), QStringLiteral("/kits/../kits"));
+    env.Set("KESTIX_PLATFORMS_ALL", u"/sdk/./platforms"_s);
+    env.Set("KESTIX_TESTSETS_ALL", u"/kits/../kits"_s);
+    EXPECT_EQ(GetTestSetsRoot(), u"/kits/../kits"_s);
     env.Set("KESTIX_TESTSETS_ALL", QString());
-    EXPECT_EQ(GetTestSetsRoot(), QStringLiteral("/sdk/Tests"));
+    EXPECT_EQ(GetTestSetsRoot(), u"/sdk/Tests"_s);
 }
 
 struct PackageCase
@@ -282,7 +268,8 @@ class BreakPackageNameTest : public ::testing::TestWithParam<PackageCase>
 TEST_P(BreakPackageNameTest, Splits)
 {
     const PackageCase &c = GetParam();
-    QString first, middle, last;
+    // Too few parts leave the outputs as they were; callers pass first empty.
+    QString first, middle = u"2"_s, last = u"3"_s;
     EXPECT_EQ(BreakPackageName(QString::fromUtf8(c.package), first, middle, last), c.split);
     EXPECT_EQ(first, QString::fromUtf8(c.first));
     EXPECT_EQ(middle, QString::fromUtf8(c.middle));
@@ -299,15 +286,8 @@ INSTANTIATE_TEST_SUITE_P(
         PackageCase{"_b_c", true, "", "b", "c"},
         PackageCase{"a_b_", true, "a", "b", ""},
         PackageCase{"a.kestix_b.kestix_c.kestix", true, "a", "b", "c"},
-        PackageCase{"a_b.kestix", false, "", "", ""},
-        PackageCase{"plain", false, "", "", ""},
-        PackageCase{"", false, "", "", ""}));
-
-TEST(BreakPackageName, LeavesOutputsUntouchedWhenTooFewParts)
-{
-    QString first = QStringLiteral("1"), middle = QStringLiteral("2"), last = QStringLiteral("3");
-    EXPECT_FALSE(BreakPackageName(QStringLiteral("a_b.kestix"), first, middle, last));
-    EXPECT_EQ(first + middle + last, QStringLiteral("123"));
-}
+        PackageCase{"a_b.kestix", false, "", "2", "3"},
+        PackageCase{"plain", false, "", "2", "3"},
+        PackageCase{"", false, "", "2", "3"}));
 
 } // namespace

@@ -11,6 +11,8 @@
 
 #include <gtest/gtest.h>
 
+using namespace Qt::StringLiterals;
+
 namespace {
 
 using testutil::DataPath;
@@ -23,9 +25,9 @@ using testutil::ReadFile;
 TEST(HostileManifest, ProgramWhosePropertiesHaveNoValuesSettlesAfterOneWrite)
 {
     QTemporaryDir dir;
-    const QString kit = dir.filePath(QStringLiteral("kit"));
+    const QString kit = dir.filePath(u"kit"_s);
     Manifest catalogue(kit, false);
-    catalogue.cacheFile = DataPath(QStringLiteral("manifest/program-properties-without-values.xml"));
+    catalogue.cacheFile = DataPath(u"manifest/program-properties-without-values.xml"_s);
     ASSERT_TRUE(catalogue.ReadManifest());
     ASSERT_EQ(catalogue.testModules.size(), 1);
 
@@ -33,7 +35,7 @@ TEST(HostileManifest, ProgramWhosePropertiesHaveNoValuesSettlesAfterOneWrite)
     Manifest *current = &catalogue;
     Manifest copies[] = {Manifest(kit, false), Manifest(kit, false), Manifest(kit, false)};
     for (int i = 0; i < 3; ++i) {
-        const QString path = dir.filePath(QStringLiteral("written%1.xml").arg(i));
+        const QString path = dir.filePath(u"written%1.xml"_s.arg(i));
         ASSERT_TRUE(current->WriteManifest(path));
         written[i] = ReadFile(path);
         copies[i].cacheFile = path;
@@ -43,7 +45,7 @@ TEST(HostileManifest, ProgramWhosePropertiesHaveNoValuesSettlesAfterOneWrite)
     EXPECT_TRUE(written[0].contains("<properties/>"));
     EXPECT_EQ(written[1], written[2]);
 
-    auto *timer = dynamic_cast<CtfTestModule *>(copies[2].FindTestModule(QStringLiteral("timer")).data());
+    auto *timer = dynamic_cast<CtfTestModule *>(copies[2].FindTestModule(u"timer"_s).data());
     ASSERT_NE(timer, nullptr);
     ASSERT_EQ(timer->programs.size(), 1);
     EXPECT_EQ(timer->programs.first().type, 16972535u);

@@ -11,6 +11,8 @@
 
 #include <gtest/gtest.h>
 
+using namespace Qt::StringLiterals;
+
 namespace {
 
 QStringList Names(const QList<ConnectTarget> &targets)
@@ -24,48 +26,46 @@ QStringList Names(const QList<ConnectTarget> &targets)
 TEST(ConnectFactory, ListsHandsetsSortedByNameIgnoringCaseWithTheirDescriptions)
 {
     testutil::HandsetFixture fixture;
-    fixture.AddHandset(QStringLiteral("beta"));
-    fixture.AddHandset(QStringLiteral("Alpha"), QStringLiteral("Lab phone 1"), QStringLiteral("arm"));
-    fixture.AddHandset(QStringLiteral("charlie"), QString(), QStringLiteral("1"));
-    QDir().mkpath(fixture.HandsetsFolder() + QStringLiteral("/not-a-handset/fs"));
-    testutil::WriteFile(fixture.HandsetsFolder() + QStringLiteral("/stray.ini"), "x");
+    fixture.AddHandset(u"beta"_s);
+    fixture.AddHandset(u"Alpha"_s, u"Lab phone 1"_s, u"arm"_s);
+    fixture.AddHandset(u"charlie"_s, QString(), u"1"_s);
+    QDir().mkpath(fixture.HandsetsFolder() + u"/not-a-handset/fs"_s);
+    testutil::WriteFile(fixture.HandsetsFolder() + u"/stray.ini"_s, "x");
 
     ASSERT_TRUE(ConnectFactory::Initialize());
-    QList<ConnectTarget> targets{ConnectTarget(QStringLiteral("left"), QStringLiteral("over"))};
+    QList<ConnectTarget> targets{ConnectTarget(u"left"_s, u"over"_s)};
     EXPECT_EQ(ConnectFactory::ListTargets(targets), 3u);
-    EXPECT_EQ(Names(targets), (QStringList{QStringLiteral("Alpha|Lab phone 1"), QStringLiteral("beta|beta"),
-                                           QStringLiteral("charlie|charlie")}));
+    EXPECT_EQ(Names(targets), (QStringList{u"Alpha|Lab phone 1"_s, u"beta|beta"_s, u"charlie|charlie"_s}));
     ConnectFactory::Uninitialize();
 }
 
 TEST(ConnectFactory, ReadsPlatformAndVersionWithDefaults)
 {
     testutil::HandsetFixture fixture;
-    fixture.AddHandset(QStringLiteral("plain"));
-    fixture.AddHandset(QStringLiteral("arm"), QString(), QStringLiteral("ARM"), QStringLiteral("4.1.7"));
-    fixture.AddHandset(QStringLiteral("odd"), QString(), QStringLiteral("z80"));
+    fixture.AddHandset(u"plain"_s);
+    fixture.AddHandset(u"arm"_s, QString(), u"ARM"_s, u"4.1.7"_s);
+    fixture.AddHandset(u"odd"_s, QString(), u"z80"_s);
 
-    auto plain = fixture.Connect(QStringLiteral("plain"));
+    auto plain = fixture.Connect(u"plain"_s);
     ASSERT_TRUE(plain);
     EXPECT_EQ(plain->platform, IKestoDevice::PLATFORM_WIN32);
-    QString version = QStringLiteral("stale");
+    QString version = u"stale"_s;
     EXPECT_EQ(plain->GetPlatformVersion(version), 0u);
     EXPECT_TRUE(version.isEmpty());
 
-    auto arm = fixture.Connect(QStringLiteral("arm"));
+    auto arm = fixture.Connect(u"arm"_s);
     ASSERT_TRUE(arm);
     EXPECT_EQ(arm->platform, IKestoDevice::PLATFORM_ARM);
     EXPECT_EQ(arm->GetPlatformVersion(version), 0u);
-    EXPECT_EQ(version, QStringLiteral("4.1.7"));
-    EXPECT_EQ(arm->GetConnectTarget().name, QStringLiteral("arm"));
+    EXPECT_EQ(version, u"4.1.7"_s);
+    EXPECT_EQ(arm->GetConnectTarget().name, u"arm"_s);
 
-    auto odd = fixture.Connect(QStringLiteral("odd"));
+    auto odd = fixture.Connect(u"odd"_s);
     ASSERT_TRUE(odd);
     EXPECT_EQ(odd->platform, IKestoDevice::PLATFORM_UNKNOWN);
 
-    testutil::WriteFile(fixture.HandsetFolder(QStringLiteral("odd")) + QStringLiteral("/handset.ini"),
-                        "platform=\nversion=\n");
-    auto blank = fixture.Connect(QStringLiteral("odd"));
+    testutil::WriteFile(fixture.HandsetFolder(u"odd"_s) + u"/handset.ini"_s, "platform=\nversion=\n");
+    auto blank = fixture.Connect(u"odd"_s);
     ASSERT_TRUE(blank);
     EXPECT_EQ(blank->platform, IKestoDevice::PLATFORM_WIN32);
 }
@@ -75,20 +75,15 @@ TEST(ConnectFactory, DefaultHandsetsFolderLiesBelowTheDataRoot)
     QTemporaryDir root;
     testutil::EnvGuard env("KESTIX_DATA_ROOT", root.path());
     env.Unset("KESTIX_HANDSETS");
-    testutil::WriteFile(root.path() + QStringLiteral("/Norvane/Handsets/phone/handset.ini"), "");
+    testutil::WriteFile(root.path() + u"/Norvane/Handsets/phone/handset.ini"_s, "");
     QList<ConnectTarget> targets;
     EXPECT_EQ(ConnectFactory::ListTargets(targets), 1u);
-    EXPECT_EQ(Names(targets), QStringList{QStringLiteral("phone|phone")});
+    EXPECT_EQ(Names(targets), QStringList{u"phone|phone"_s});
 
     env.Set("KESTIX_HANDSETS", QString());
     EXPECT_EQ(ConnectFactory::ListTargets(targets), 1u);
-}
 
-TEST(ConnectFactory, MissingHandsetsFolderListsNothing)
-{
-    QTemporaryDir root;
-    testutil::EnvGuard env("KESTIX_HANDSETS", root.filePath(QStringLiteral("none")));
-    QList<ConnectTarget> targets;
+    env.Set("KESTIX_HANDSETS", root.filePath(u"none"_s));
     EXPECT_EQ(ConnectFactory::ListTargets(targets), 0u);
     EXPECT_TRUE(targets.isEmpty());
 }
@@ -98,28 +93,26 @@ class ConnectFactoryRefusal : public ::testing::Test
 protected:
     void SetUp() override
     {
-        fixture.AddHandset(QStringLiteral("phone"));
-        log.SetLogPath(logDir.filePath(QStringLiteral("log.txt")));
+        fixture.AddHandset(u"phone"_s);
+        log.SetLogPath(logDir.filePath(u"log.txt"_s));
     }
 
-    QString LogText() { return QString::fromLatin1(testutil::ReadFile(logDir.filePath(QStringLiteral("log.txt")))); }
+    QString LogText() { return QString::fromLatin1(testutil::ReadFile(logDir.filePath(u"log.txt"_s))); }
 
     testutil::HandsetFixture fixture;
     QTemporaryDir logDir;
     Log log;
 };
 
-TEST_F(ConnectFactoryRefusal, UnknownHandsetGivesNullAndAMessage)
+TEST_F(ConnectFactoryRefusal, UnknownHandsetsAndNamesThatAreNoPlainFolderNameGiveNull)
 {
-    EXPECT_EQ(ConnectFactory::ConnectToTarget(ConnectTarget(QStringLiteral("nokia"), QString()), &log), nullptr);
-    EXPECT_TRUE(LogText().contains(QStringLiteral("Handset nokia not found")));
-    EXPECT_EQ(ConnectFactory::ConnectToTarget(ConnectTarget(QStringLiteral("nokia"), QString()), nullptr), nullptr);
-}
+    EXPECT_EQ(ConnectFactory::ConnectToTarget(ConnectTarget(u"nokia"_s, QString()), &log), nullptr);
+    EXPECT_TRUE(LogText().contains(u"Handset nokia not found"_s));
+    EXPECT_EQ(ConnectFactory::ConnectToTarget(ConnectTarget(u"nokia"_s, QString()), nullptr), nullptr);
+    ConnectFactory::DisconnectTarget(nullptr);
 
-TEST_F(ConnectFactoryRefusal, NamesThatAreNoPlainFolderNameAreRefused)
-{
     // A handset one level up must not be reachable through "..".
-    testutil::WriteFile(fixture.HandsetsFolder() + QStringLiteral("/../handset.ini"), "");
+    testutil::WriteFile(fixture.HandsetsFolder() + u"/../handset.ini"_s, "");
     for (const char *name : {"..", ".", "", "phone/fs", "../handsets/phone"})
         EXPECT_EQ(ConnectFactory::ConnectToTarget(ConnectTarget(QString::fromUtf8(name), QString()), &log), nullptr)
             << name;
@@ -127,16 +120,11 @@ TEST_F(ConnectFactoryRefusal, NamesThatAreNoPlainFolderNameAreRefused)
 
 TEST_F(ConnectFactoryRefusal, OfflineHandsetIsListedButRefusesTheConnection)
 {
-    testutil::WriteFile(fixture.HandsetFolder(QStringLiteral("phone")) + QStringLiteral("/offline"), "");
+    testutil::WriteFile(fixture.HandsetFolder(u"phone"_s) + u"/offline"_s, "");
     QList<ConnectTarget> targets;
     EXPECT_EQ(ConnectFactory::ListTargets(targets), 1u);
     EXPECT_EQ(ConnectFactory::ConnectToTarget(targets.first(), &log), nullptr);
-    EXPECT_TRUE(LogText().contains(QStringLiteral("Handset phone is offline.")));
-}
-
-TEST(ConnectFactory, DisconnectAcceptsNull)
-{
-    ConnectFactory::DisconnectTarget(nullptr);
+    EXPECT_TRUE(LogText().contains(u"Handset phone is offline."_s));
 }
 
 } // namespace

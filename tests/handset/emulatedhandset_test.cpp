@@ -10,6 +10,8 @@
 
 #include <gtest/gtest.h>
 
+using namespace Qt::StringLiterals;
+
 namespace {
 
 using testutil::HandsetFixture;
@@ -27,16 +29,16 @@ class EmulatedHandsetTest : public ::testing::Test
 protected:
     void SetUp() override
     {
-        folder = fixture.AddHandset(QStringLiteral("phone"));
-        device = fixture.Connect(QStringLiteral("phone"));
+        folder = fixture.AddHandset(u"phone"_s);
+        device = fixture.Connect(u"phone"_s);
         ASSERT_TRUE(device);
-        outside = fixture.WorkFolder() + QStringLiteral("/outside");
-        testutil::WriteFile(outside + QStringLiteral("/keep.txt"), "keep");
+        outside = fixture.WorkFolder() + u"/outside"_s;
+        testutil::WriteFile(outside + u"/keep.txt"_s, "keep");
     }
 
     QString Host(const char *handsetPath) const
     {
-        return fixture.HostPath(QStringLiteral("phone"), QString::fromUtf8(handsetPath));
+        return fixture.HostPath(u"phone"_s, QString::fromUtf8(handsetPath));
     }
     QString Work(const char *name) const { return fixture.WorkFolder() + QLatin1Char('/') + QString::fromUtf8(name); }
 
@@ -50,39 +52,33 @@ TEST_F(EmulatedHandsetTest, CopiesListsDeletesAndRemovesFiles)
 {
     testutil::WriteFile(Work("a.log"), "alpha");
     testutil::WriteFile(Work("B.log"), "bravo");
-    EXPECT_EQ(device->CopyFileToDevice(Work("a.log"), QStringLiteral("fs:/usermods/x/a.log")), 0u);
-    EXPECT_EQ(device->CopyFileToDevice(Work("B.log"), QStringLiteral("fs:/usermods/x/B.log")), 0u);
-    EXPECT_EQ(device->CopyFileToDevice(Work("a.log"), QStringLiteral("fs:/usermods/x/sub/c.log")), 0u);
-    EXPECT_TRUE(device->FileExists(QStringLiteral("fs:/usermods/x/a.log")));
-    EXPECT_TRUE(device->FileExists(QStringLiteral("fs:/usermods/x/sub")));
+    EXPECT_EQ(device->CopyFileToDevice(Work("a.log"), u"fs:/usermods/x/a.log"_s), 0u);
+    EXPECT_EQ(device->CopyFileToDevice(Work("B.log"), u"fs:/usermods/x/B.log"_s), 0u);
+    EXPECT_EQ(device->CopyFileToDevice(Work("a.log"), u"fs:/usermods/x/sub/c.log"_s), 0u);
+    EXPECT_TRUE(device->FileExists(u"fs:/usermods/x/a.log"_s));
+    EXPECT_TRUE(device->FileExists(u"fs:/usermods/x/sub"_s));
 
     QSharedPointer<_DirectoryInfo> info;
-    ASSERT_EQ(device->ListDirectory(QStringLiteral("fs:/usermods/x/"), info), 0u);
+    ASSERT_EQ(device->ListDirectory(u"fs:/usermods/x/"_s, info), 0u);
     ASSERT_TRUE(info);
-    EXPECT_EQ(FileNames(info),
-              (QStringList{QStringLiteral("fs:/usermods/x/a.log"), QStringLiteral("fs:/usermods/x/B.log")}));
+    EXPECT_EQ(FileNames(info), (QStringList{u"fs:/usermods/x/a.log"_s, u"fs:/usermods/x/B.log"_s}));
     EXPECT_EQ(info->files.first().size, 5);
 
-    EXPECT_EQ(device->CopyFileFromDevice(QStringLiteral("fs:/usermods/x/B.log"), Work("back/B.log")), 0u);
+    EXPECT_EQ(device->CopyFileFromDevice(u"fs:/usermods/x/B.log"_s, Work("back/B.log")), 0u);
     EXPECT_EQ(testutil::ReadFile(Work("back/B.log")), QByteArray("bravo"));
-    EXPECT_TRUE(device->CopyOnDevice(QStringLiteral("fs:/usermods/x/B.log"), QStringLiteral("fs:/mif/B.log")));
+    EXPECT_TRUE(device->CopyOnDevice(u"fs:/usermods/x/B.log"_s, u"fs:/mif/B.log"_s));
     EXPECT_EQ(testutil::ReadFile(Host("fs:/mif/B.log")), QByteArray("bravo"));
+    // A shorter file replaces a longer one whole.
+    testutil::WriteFile(Work("short"), "sh");
+    ASSERT_EQ(device->CopyFileToDevice(Work("short"), u"fs:/mif/B.log"_s), 0u);
+    EXPECT_EQ(testutil::ReadFile(Host("fs:/mif/B.log")), QByteArray("sh"));
 
-    EXPECT_EQ(device->DeleteFile(QStringLiteral("fs:/usermods/x/a.log")), 0u);
-    EXPECT_FALSE(device->FileExists(QStringLiteral("fs:/usermods/x/a.log")));
-    EXPECT_EQ(device->RemoveDirectory(QStringLiteral("fs:/usermods/x")), 0u);
+    EXPECT_EQ(device->DeleteFile(u"fs:/usermods/x/a.log"_s), 0u);
+    EXPECT_FALSE(device->FileExists(u"fs:/usermods/x/a.log"_s));
+    EXPECT_EQ(device->RemoveDirectory(u"fs:/usermods/x"_s), 0u);
     EXPECT_FALSE(QFileInfo::exists(Host("fs:/usermods/x")));
     EXPECT_TRUE(QFileInfo::exists(Host("fs:/mif/B.log")));
     EXPECT_EQ(device->lastError, 0u);
-}
-
-TEST_F(EmulatedHandsetTest, CopyReplacesAnExistingFile)
-{
-    testutil::WriteFile(Work("long"), "a much longer text");
-    testutil::WriteFile(Work("short"), "short");
-    ASSERT_EQ(device->CopyFileToDevice(Work("long"), QStringLiteral("fs:/f")), 0u);
-    ASSERT_EQ(device->CopyFileToDevice(Work("short"), QStringLiteral("fs:/f")), 0u);
-    EXPECT_EQ(testutil::ReadFile(Host("fs:/f")), QByteArray("short"));
 }
 
 TEST_F(EmulatedHandsetTest, ListingShowsOnlyPlainFiles)
@@ -92,11 +88,11 @@ TEST_F(EmulatedHandsetTest, ListingShowsOnlyPlainFiles)
     QDir().mkpath(Host("fs:/d/folder"));
     ASSERT_TRUE(QFile::link(Host("fs:/d/file"), Host("fs:/d/link")));
     QSharedPointer<_DirectoryInfo> info;
-    ASSERT_EQ(device->ListDirectory(QStringLiteral("fs:/d"), info), 0u);
-    EXPECT_EQ(FileNames(info), (QStringList{QStringLiteral("fs:/d/.hidden"), QStringLiteral("fs:/d/file")}));
+    ASSERT_EQ(device->ListDirectory(u"fs:/d"_s, info), 0u);
+    EXPECT_EQ(FileNames(info), (QStringList{u"fs:/d/.hidden"_s, u"fs:/d/file"_s}));
 
     QDir().mkpath(Host("fs:/empty"));
-    ASSERT_EQ(device->ListDirectory(QStringLiteral("fs:/empty"), info), 0u);
+    ASSERT_EQ(device->ListDirectory(u"fs:/empty"_s, info), 0u);
     EXPECT_FALSE(info->HasFiles());
 }
 
@@ -116,96 +112,71 @@ TEST_P(EmulatedHandsetFailure, FailsWithItsErrorNumber)
     EXPECT_EQ(GetParam().call(*device, fixture.WorkFolder()), GetParam().error);
     EXPECT_EQ(device->lastError, GetParam().error);
     EXPECT_FALSE(device->connectionLost);
-    EXPECT_EQ(testutil::ReadFile(outside + QStringLiteral("/keep.txt")), QByteArray("keep"));
+    EXPECT_EQ(testutil::ReadFile(outside + u"/keep.txt"_s), QByteArray("keep"));
 }
 
+// The error of a listing, or 99 when a failed listing left no empty result.
+unsigned int List(IKestoDevice &d, const QString &path)
+{
+    QSharedPointer<_DirectoryInfo> info;
+    const unsigned int result = d.ListDirectory(path, info);
+    return info && !info->HasFiles() ? result : 99u;
+}
+
+// The error a false result left, or 99 for a true one.
+unsigned int ErrorOf(IKestoDevice &d, bool result)
+{
+    return result ? 99u : d.lastError;
+}
+
+const QString kOut = u"fs:/../../../work/outside/keep.txt"_s;
+constexpr unsigned int kNotFound = HANDSET_ERROR_NOT_FOUND;
+constexpr unsigned int kBadPath = HANDSET_ERROR_BAD_PATH;
+using Work = const QString &;
+
 const FailureCase kFailures[] = {
-    {"ListMissing", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &) {
-         QSharedPointer<_DirectoryInfo> info;
-         const unsigned int result = d.ListDirectory(QStringLiteral("fs:/none"), info);
-         return info && !info->HasFiles() ? result : 99u;
-     }},
-    {"ListAFile", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &) {
-         QSharedPointer<_DirectoryInfo> info;
-         return d.ListDirectory(QStringLiteral("fs:/file"), info);
-     }},
-    {"ListOutside", HANDSET_ERROR_BAD_PATH,
-     [](IKestoDevice &d, const QString &) {
-         QSharedPointer<_DirectoryInfo> info;
-         return d.ListDirectory(QStringLiteral("fs:/../../../work/outside"), info);
-     }},
-    {"ListNoPrefix", HANDSET_ERROR_BAD_PATH,
-     [](IKestoDevice &d, const QString &work) {
-         QSharedPointer<_DirectoryInfo> info;
-         return d.ListDirectory(work, info);
-     }},
-    {"DeleteMissing", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &) { return d.DeleteFile(QStringLiteral("fs:/none")); }},
-    {"DeleteOutside", HANDSET_ERROR_BAD_PATH,
-     [](IKestoDevice &d, const QString &) { return d.DeleteFile(QStringLiteral("fs:/../../../work/outside/keep.txt")); }},
-    {"RemoveMissing", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &) { return d.RemoveDirectory(QStringLiteral("fs:/none")); }},
-    {"RemoveParent", HANDSET_ERROR_BAD_PATH,
-     [](IKestoDevice &d, const QString &) { return d.RemoveDirectory(QStringLiteral("fs:/..")); }},
-    {"CopyFromMissingHostFile", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &work) {
-         return d.CopyFileToDevice(work + QStringLiteral("/none"), QStringLiteral("fs:/x"));
-     }},
-    {"CopyToOutside", HANDSET_ERROR_BAD_PATH,
-     [](IKestoDevice &d, const QString &work) {
-         return d.CopyFileToDevice(work + QStringLiteral("/outside/keep.txt"), QStringLiteral("fs:/../../../work/outside/keep.txt"));
-     }},
-    {"CopyMissingFromDevice", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &work) {
-         return d.CopyFileFromDevice(QStringLiteral("fs:/none"), work + QStringLiteral("/x"));
-     }},
-    {"CopyFromOutsideOfDevice", HANDSET_ERROR_BAD_PATH,
-     [](IKestoDevice &d, const QString &work) {
-         return d.CopyFileFromDevice(QStringLiteral("fs:/../handset.ini"), work + QStringLiteral("/x"));
-     }},
-    {"ExistsOutside", HANDSET_ERROR_BAD_PATH,
-     [](IKestoDevice &d, const QString &) {
-         return d.FileExists(QStringLiteral("fs:/../handset.ini")) ? 99u : d.lastError;
-     }},
-    {"ExistsMissing", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &) { return d.FileExists(QStringLiteral("fs:/none")) ? 99u : d.lastError; }},
-    {"CopyOnDeviceMissing", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &) {
-         return d.CopyOnDevice(QStringLiteral("fs:/none"), QStringLiteral("fs:/y")) ? 99u : d.lastError;
-     }},
-    {"CopyOnDeviceToOutside", HANDSET_ERROR_BAD_PATH,
-     [](IKestoDevice &d, const QString &) {
-         return d.CopyOnDevice(QStringLiteral("fs:/file"), QStringLiteral("fs:/../../../work/outside/keep.txt")) ? 99u
-                                                                                                      : d.lastError;
-     }},
-    {"FindModuleNone", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &) {
-         QString directory = QStringLiteral("stale");
+    {"ListMissing", kNotFound, [](IKestoDevice &d, Work) { return List(d, u"fs:/none"_s); }},
+    {"ListAFile", kNotFound, [](IKestoDevice &d, Work) { return List(d, u"fs:/file"_s); }},
+    {"ListOutside", kBadPath, [](IKestoDevice &d, Work) { return List(d, u"fs:/../../../work/outside"_s); }},
+    {"ListNoPrefix", kBadPath, [](IKestoDevice &d, Work work) { return List(d, work); }},
+    {"ListUnknownClass", kNotFound, [](IKestoDevice &d, Work) { return List(d, u"fs:/~0x01010001"_s); }},
+    {"DeleteMissing", kNotFound, [](IKestoDevice &d, Work) { return d.DeleteFile(u"fs:/none"_s); }},
+    {"DeleteOutside", kBadPath, [](IKestoDevice &d, Work) { return d.DeleteFile(kOut); }},
+    {"RemoveMissing", kNotFound, [](IKestoDevice &d, Work) { return d.RemoveDirectory(u"fs:/none"_s); }},
+    {"RemoveParent", kBadPath, [](IKestoDevice &d, Work) { return d.RemoveDirectory(u"fs:/.."_s); }},
+    {"CopyFromMissingHostFile", kNotFound,
+     [](IKestoDevice &d, Work work) { return d.CopyFileToDevice(work + u"/none"_s, u"fs:/x"_s); }},
+    {"CopyToOutside", kBadPath,
+     [](IKestoDevice &d, Work work) { return d.CopyFileToDevice(work + u"/outside/keep.txt"_s, kOut); }},
+    {"CopyMissingFromDevice", kNotFound,
+     [](IKestoDevice &d, Work work) { return d.CopyFileFromDevice(u"fs:/none"_s, work + u"/x"_s); }},
+    {"CopyFromOutsideOfDevice", kBadPath,
+     [](IKestoDevice &d, Work work) { return d.CopyFileFromDevice(u"fs:/../handset.ini"_s, work + u"/x"_s); }},
+    {"ExistsOutside", kBadPath,
+     [](IKestoDevice &d, Work) { return ErrorOf(d, d.FileExists(u"fs:/../handset.ini"_s)); }},
+    {"ExistsMissing", kNotFound, [](IKestoDevice &d, Work) { return ErrorOf(d, d.FileExists(u"fs:/none"_s)); }},
+    {"CopyOnDeviceMissing", kNotFound,
+     [](IKestoDevice &d, Work) { return ErrorOf(d, d.CopyOnDevice(u"fs:/none"_s, u"fs:/y"_s)); }},
+    {"CopyOnDeviceToOutside", kBadPath,
+     [](IKestoDevice &d, Work) { return ErrorOf(d, d.CopyOnDevice(u"fs:/file"_s, kOut)); }},
+    {"FindModuleNone", kNotFound,
+     [](IKestoDevice &d, Work) {
+         QString directory = u"stale"_s;
          const unsigned int result = d.FindModule(0x01010001, directory);
          return directory.isEmpty() ? result : 99u;
      }},
-    {"FindModuleZero", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &) {
+    {"FindModuleZero", kNotFound,
+     [](IKestoDevice &d, Work) {
          QString directory;
          return d.FindModule(0, directory);
      }},
-    {"ListUnknownClass", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &) {
-         QSharedPointer<_DirectoryInfo> info;
-         return d.ListDirectory(QStringLiteral("fs:/~0x01010001"), info);
-     }},
-    {"DeleteDirectoryUnknownClass", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &) { return d.DeleteDirectory(0x01010001); }},
-    {"StartUnknownProgram", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &) { return d.StartProgram(QStringLiteral("nothing"), QString()); }},
-    {"StartUnknownApplet", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &) { return d.StartApplet(0x1234, QString()); }},
-    {"InstallMissingPackage", HANDSET_ERROR_NOT_FOUND,
-     [](IKestoDevice &d, const QString &work) { return d.InstallPackage(work + QStringLiteral("/none.kestix")); }},
+    {"DeleteDirectoryUnknownClass", kNotFound, [](IKestoDevice &d, Work) { return d.DeleteDirectory(0x01010001); }},
+    {"StartUnknownProgram", kNotFound, [](IKestoDevice &d, Work) { return d.StartProgram(u"nothing"_s, QString()); }},
+    {"StartUnknownApplet", kNotFound, [](IKestoDevice &d, Work) { return d.StartApplet(0x1234, QString()); }},
+    {"InstallMissingPackage", kNotFound,
+     [](IKestoDevice &d, Work work) { return d.InstallPackage(work + u"/none.kestix"_s); }},
     {"InstallNotATar", HANDSET_ERROR_BAD_PACKAGE,
-     [](IKestoDevice &d, const QString &work) { return d.InstallPackage(work + QStringLiteral("/outside/keep.txt")); }},
+     [](IKestoDevice &d, Work work) { return d.InstallPackage(work + u"/outside/keep.txt"_s); }},
 };
 
 INSTANTIATE_TEST_SUITE_P(Operations, EmulatedHandsetFailure, ::testing::ValuesIn(kFailures),
@@ -215,59 +186,74 @@ TEST_F(EmulatedHandsetTest, SymbolicLinksOutOfTheHandsetAreNeverFollowed)
 {
     QDir().mkpath(Host("fs:/usermods"));
     ASSERT_TRUE(QFile::link(outside, Host("fs:/usermods/escape")));
-    ASSERT_TRUE(QFile::link(outside + QStringLiteral("/keep.txt"), Host("fs:/leak")));
+    ASSERT_TRUE(QFile::link(outside + u"/keep.txt"_s, Host("fs:/leak")));
     testutil::WriteFile(Work("new"), "new");
 
     QSharedPointer<_DirectoryInfo> info;
-    EXPECT_EQ(device->ListDirectory(QStringLiteral("fs:/usermods/escape"), info), HANDSET_ERROR_BAD_PATH);
-    EXPECT_EQ(device->DeleteFile(QStringLiteral("fs:/usermods/escape/keep.txt")), HANDSET_ERROR_BAD_PATH);
-    EXPECT_EQ(device->DeleteFile(QStringLiteral("fs:/leak")), HANDSET_ERROR_BAD_PATH);
-    EXPECT_EQ(device->RemoveDirectory(QStringLiteral("fs:/usermods/escape")), HANDSET_ERROR_BAD_PATH);
-    EXPECT_EQ(device->CopyFileToDevice(Work("new"), QStringLiteral("fs:/usermods/escape/keep.txt")),
-              HANDSET_ERROR_BAD_PATH);
-    EXPECT_EQ(device->CopyFileToDevice(Work("new"), QStringLiteral("fs:/leak")), HANDSET_ERROR_BAD_PATH);
-    EXPECT_EQ(device->CopyFileFromDevice(QStringLiteral("fs:/leak"), Work("copy")), HANDSET_ERROR_BAD_PATH);
-    EXPECT_FALSE(device->FileExists(QStringLiteral("fs:/usermods/escape/keep.txt")));
+    EXPECT_EQ(device->ListDirectory(u"fs:/usermods/escape"_s, info), HANDSET_ERROR_BAD_PATH);
+    EXPECT_EQ(device->DeleteFile(u"fs:/usermods/escape/keep.txt"_s), HANDSET_ERROR_BAD_PATH);
+    EXPECT_EQ(device->DeleteFile(u"fs:/leak"_s), HANDSET_ERROR_BAD_PATH);
+    EXPECT_EQ(device->RemoveDirectory(u"fs:/usermods/escape"_s), HANDSET_ERROR_BAD_PATH);
+    EXPECT_EQ(device->CopyFileToDevice(Work("new"), u"fs:/usermods/escape/keep.txt"_s), HANDSET_ERROR_BAD_PATH);
+    EXPECT_EQ(device->CopyFileToDevice(Work("new"), u"fs:/leak"_s), HANDSET_ERROR_BAD_PATH);
+    EXPECT_EQ(device->CopyFileFromDevice(u"fs:/leak"_s, Work("copy")), HANDSET_ERROR_BAD_PATH);
+    EXPECT_FALSE(device->FileExists(u"fs:/usermods/escape/keep.txt"_s));
     EXPECT_FALSE(QFileInfo::exists(Work("copy")));
-    EXPECT_EQ(testutil::ReadFile(outside + QStringLiteral("/keep.txt")), QByteArray("keep"));
-    EXPECT_EQ(QDir(outside).entryList(QDir::Files), QStringList{QStringLiteral("keep.txt")});
+    EXPECT_EQ(testutil::ReadFile(outside + u"/keep.txt"_s), QByteArray("keep"));
+    EXPECT_EQ(QDir(outside).entryList(QDir::Files), QStringList{u"keep.txt"_s});
 }
 
 TEST_F(EmulatedHandsetTest, OfflineFileAppearingMidSessionLosesTheConnectionForGood)
 {
     testutil::WriteFile(Work("a"), "a");
-    ASSERT_EQ(device->CopyFileToDevice(Work("a"), QStringLiteral("fs:/a")), 0u);
-    testutil::WriteFile(folder + QStringLiteral("/offline"), "");
-    EXPECT_TRUE(device->FileExists(QStringLiteral("fs:/a")) == false);
+    ASSERT_EQ(device->CopyFileToDevice(Work("a"), u"fs:/a"_s), 0u);
+    testutil::WriteFile(folder + u"/offline"_s, "");
+    EXPECT_TRUE(device->FileExists(u"fs:/a"_s) == false);
     EXPECT_TRUE(device->connectionLost);
     EXPECT_EQ(device->lastError, HANDSET_ERROR_CONNECTION_LOST);
 
     // Even when the handset comes back, this connection stays lost.
-    ASSERT_TRUE(QFile::remove(folder + QStringLiteral("/offline")));
+    ASSERT_TRUE(QFile::remove(folder + u"/offline"_s));
     QString version;
     QString directory;
     QSharedPointer<_DirectoryInfo> info;
     EXPECT_EQ(device->GetPlatformVersion(version), HANDSET_ERROR_CONNECTION_LOST);
-    EXPECT_EQ(device->CopyFileToDevice(Work("a"), QStringLiteral("fs:/b")), HANDSET_ERROR_CONNECTION_LOST);
-    EXPECT_EQ(device->CopyFileFromDevice(QStringLiteral("fs:/a"), Work("b")), HANDSET_ERROR_CONNECTION_LOST);
-    EXPECT_EQ(device->ListDirectory(QStringLiteral("fs:/"), info), HANDSET_ERROR_CONNECTION_LOST);
-    EXPECT_EQ(device->DeleteFile(QStringLiteral("fs:/a")), HANDSET_ERROR_CONNECTION_LOST);
-    EXPECT_EQ(device->RemoveDirectory(QStringLiteral("fs:/")), HANDSET_ERROR_CONNECTION_LOST);
+    EXPECT_EQ(device->CopyFileToDevice(Work("a"), u"fs:/b"_s), HANDSET_ERROR_CONNECTION_LOST);
+    EXPECT_EQ(device->CopyFileFromDevice(u"fs:/a"_s, Work("b")), HANDSET_ERROR_CONNECTION_LOST);
+    EXPECT_EQ(device->ListDirectory(u"fs:/"_s, info), HANDSET_ERROR_CONNECTION_LOST);
+    EXPECT_EQ(device->DeleteFile(u"fs:/a"_s), HANDSET_ERROR_CONNECTION_LOST);
+    EXPECT_EQ(device->RemoveDirectory(u"fs:/"_s), HANDSET_ERROR_CONNECTION_LOST);
     EXPECT_EQ(device->InstallPackage(Work("a")), HANDSET_ERROR_CONNECTION_LOST);
     EXPECT_EQ(device->FindModule(1, directory), HANDSET_ERROR_CONNECTION_LOST);
-    EXPECT_EQ(device->StartProgram(QStringLiteral("p"), QString()), HANDSET_ERROR_CONNECTION_LOST);
+    EXPECT_EQ(device->StartProgram(u"p"_s, QString()), HANDSET_ERROR_CONNECTION_LOST);
     EXPECT_EQ(device->StartApplet(1, QString()), HANDSET_ERROR_CONNECTION_LOST);
-    EXPECT_FALSE(device->IsProgramRunning(QStringLiteral("p")));
+    EXPECT_FALSE(device->IsProgramRunning(u"p"_s));
     EXPECT_FALSE(device->IsAppletRunning(1));
-    EXPECT_FALSE(device->CopyOnDevice(QStringLiteral("fs:/a"), QStringLiteral("fs:/c")));
+    EXPECT_FALSE(device->CopyOnDevice(u"fs:/a"_s, u"fs:/c"_s));
     EXPECT_EQ(device->lastError, HANDSET_ERROR_CONNECTION_LOST);
     EXPECT_TRUE(QFileInfo::exists(Host("fs:/a")));
     EXPECT_FALSE(QFileInfo::exists(Host("fs:/c")));
 
     // A new connection works again.
-    auto again = fixture.Connect(QStringLiteral("phone"));
+    auto again = fixture.Connect(u"phone"_s);
     ASSERT_TRUE(again);
-    EXPECT_TRUE(again->FileExists(QStringLiteral("fs:/a")));
+    EXPECT_TRUE(again->FileExists(u"fs:/a"_s));
+}
+
+TEST_F(EmulatedHandsetTest, HandsetCountsOperationsBeforeDroppingOut)
+{
+    testutil::WriteFile(folder + u"/handset.ini"_s, "offlineAfter=2\n");
+    auto counted = fixture.Connect(u"phone"_s);
+    ASSERT_TRUE(counted);
+    QString version;
+    EXPECT_EQ(counted->GetPlatformVersion(version), 0u);
+    EXPECT_FALSE(counted->FileExists(u"fs:/nothing"_s));
+    EXPECT_FALSE(counted->connectionLost);
+    EXPECT_NE(counted->GetPlatformVersion(version), 0u);
+    EXPECT_TRUE(counted->connectionLost);
+    EXPECT_TRUE(QFileInfo::exists(folder + u"/offline"_s));
+    // Later connections find it unplugged.
+    EXPECT_FALSE(fixture.Connect(u"phone"_s));
 }
 
 TEST_F(EmulatedHandsetTest, VanishedHandsetFolderLosesTheConnection)
@@ -277,7 +263,7 @@ TEST_F(EmulatedHandsetTest, VanishedHandsetFolderLosesTheConnection)
     EXPECT_EQ(device->GetPlatformVersion(version), HANDSET_ERROR_CONNECTION_LOST);
     EXPECT_TRUE(device->connectionLost);
     testutil::WriteFile(Work("a"), "a");
-    EXPECT_EQ(device->CopyFileToDevice(Work("a"), QStringLiteral("fs:/a")), HANDSET_ERROR_CONNECTION_LOST);
+    EXPECT_EQ(device->CopyFileToDevice(Work("a"), u"fs:/a"_s), HANDSET_ERROR_CONNECTION_LOST);
     EXPECT_FALSE(QFileInfo::exists(folder));
 }
 

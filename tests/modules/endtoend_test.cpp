@@ -22,6 +22,8 @@
 
 #include <gtest/gtest.h>
 
+using namespace Qt::StringLiterals;
+
 namespace {
 
 using moduletest::AppletWithId;
@@ -40,18 +42,18 @@ class EndToEnd : public ::testing::Test
 protected:
     void SetUp() override
     {
-        fixture.AddHandset(QStringLiteral("phone"), QStringLiteral("Test phone"), QStringLiteral("win32"));
-        device = fixture.Connect(QStringLiteral("phone"));
+        fixture.AddHandset(u"phone"_s, u"Test phone"_s, u"win32"_s);
+        device = fixture.Connect(u"phone"_s);
         ASSERT_TRUE(device);
-        logs = fixture.WorkFolder() + QStringLiteral("/logs");
+        logs = fixture.WorkFolder() + u"/logs"_s;
         QDir().mkpath(logs);
-        log.SetLogPath(fixture.WorkFolder() + QStringLiteral("/log.txt"));
-        env = {{QStringLiteral("LogPath"), logs},
-               {QStringLiteral("TestRunID"), QStringLiteral("{5f0c2f1e-0000-4000-8000-000000000001}")},
-               {QStringLiteral("DataCachePath"), fixture.WorkFolder()}};
+        log.SetLogPath(fixture.WorkFolder() + u"/log.txt"_s);
+        env = {{u"LogPath"_s, logs},
+               {u"TestRunID"_s, u"{5f0c2f1e-0000-4000-8000-000000000001}"_s},
+               {u"DataCachePath"_s, fixture.WorkFolder()}};
     }
 
-    bool OnHandset(const QString &path) { return QFileInfo::exists(fixture.HostPath(QStringLiteral("phone"), path)); }
+    bool OnHandset(const QString &path) { return QFileInfo::exists(fixture.HostPath(u"phone"_s, path)); }
 
     // Runs the module through the controller's order of calls.
     void RunModule(_TestModule &module)
@@ -69,9 +71,9 @@ protected:
     {
         const qsizetype at = lines.indexOf(anchor);
         ASSERT_GE(at, 3) << lines.join(QLatin1Char('\n')).toStdString();
-        EXPECT_EQ(lines.at(at - 3), QStringLiteral("GUID:") + env.value(QStringLiteral("TestRunID")));
-        EXPECT_EQ(lines.at(at - 2), QStringLiteral("Manifest Name:") + module.moduleName);
-        EXPECT_EQ(lines.at(at - 1), QStringLiteral("ID Hash:") + module.IDHash());
+        EXPECT_EQ(lines.at(at - 3), u"GUID:"_s + env.value(u"TestRunID"_s));
+        EXPECT_EQ(lines.at(at - 2), u"Manifest Name:"_s + module.moduleName);
+        EXPECT_EQ(lines.at(at - 1), u"ID Hash:"_s + module.IDHash());
     }
 
     testutil::HandsetFixture fixture;
@@ -81,99 +83,97 @@ protected:
     QMap<QString, QString> env;
 };
 
-const QString kStamp = QStringLiteral("-\\d{4}-\\d\\d-\\d\\d-\\d\\d-\\d\\d-\\d\\d\\.");
+const QString kStamp = u"-\\d{4}-\\d\\d-\\d\\d-\\d\\d-\\d\\d-\\d\\d\\."_s;
 
 } // namespace
 
 TEST_F(EndToEnd, CtfModuleRunsItsProgramAndLeavesNothingBehind)
 {
     testutil::ModuleSpec layout;
-    layout.directory = QStringLiteral("ITimer");
-    layout.programs = {{QStringLiteral("Helper"), QString(), 0x0102FAF7},
-                     {QStringLiteral("ITimer_k_main"), QStringLiteral("-suite all"), 0x0102FAF7}};
+    layout.directory = u"ITimer"_s;
+    layout.programs = {{u"Helper"_s, QString(), 0x0102FAF7}, {u"ITimer_k_main"_s, u"-suite all"_s, 0x0102FAF7}};
     layout.behaviour = "log=usermods/CTF/CTF.log\n"
                      "[ -f \"$log\" ] || exit 3\n"
                      "{ echo \"Suite: ITimer\"; echo \"Args: $3 $4\"; echo \"Time: 2026/12/03 14:05:09\";\n"
                      "  echo \"Test: t1\"; echo \"Result: PASS\"; echo \"Result: Fail\"; echo \"Test: t2\";\n"
                      "  echo \"[/VERBOSE]\"; } >> \"$log\"\n";
-    const QString package = fixture.MakePackage(QStringLiteral("ITimer_Win32_Release.kestix"), layout);
+    const QString package = fixture.MakePackage(u"ITimer_Win32_Release.kestix"_s, layout);
 
     CtfTestModule module;
-    module.moduleName = QStringLiteral("ITimer");
-    module.source = QStringLiteral("KVK");
+    module.moduleName = u"ITimer"_s;
+    module.source = u"KVK"_s;
     ASSERT_TRUE(module.ProcessPackage(QFileInfo(package).absolutePath()) == false);
     ASSERT_EQ(module.programs.size(), 2);
-    EXPECT_EQ(module.ModuleName(), QStringLiteral("ITimer_k_main"));
-    module.targets.insert(QStringLiteral("t"), Target(package));
+    EXPECT_EQ(module.ModuleName(), u"ITimer_k_main"_s);
+    module.targets.insert(u"t"_s, Target(package));
     QDomDocument document;
-    QDomElement entry = document.createElement(QStringLiteral("testmodule"));
+    QDomElement entry = document.createElement(u"testmodule"_s);
     module.WriteToManifest(entry); // computes the ID hash
 
     // A stale log from an earlier run is replaced by the empty template.
-    testutil::WriteFile(fixture.HostPath(QStringLiteral("phone"), QStringLiteral("fs:/usermods/CTF/CTF.log")),
-                        "Suite: stale\n");
+    testutil::WriteFile(fixture.HostPath(u"phone"_s, u"fs:/usermods/CTF/CTF.log"_s), "Suite: stale\n");
     RunModule(module);
 
     ASSERT_EQ(module.desktopLogFiles.size(), 1);
     const QString copied = module.desktopLogFiles.first();
-    EXPECT_TRUE(QFileInfo(copied).fileName().contains(QRegularExpression(QStringLiteral("^ITimer-CTF") + kStamp + QStringLiteral("log$"))));
+    EXPECT_TRUE(QFileInfo(copied).fileName().contains(QRegularExpression(u"^ITimer-CTF"_s + kStamp + u"log$"_s)));
     const QStringList lines = Lines(copied);
-    EXPECT_EQ(lines.first(), QStringLiteral("Suite: ITimer"));
-    EXPECT_TRUE(lines.contains(QStringLiteral("Args: -suite all")));
-    ExpectHeaderBefore(lines, QStringLiteral("Test: t1"), module);
+    EXPECT_EQ(lines.first(), u"Suite: ITimer"_s);
+    EXPECT_TRUE(lines.contains(u"Args: -suite all"_s));
+    ExpectHeaderBefore(lines, u"Test: t1"_s, module);
 
     TestResults results;
     ASSERT_TRUE(module.ParseLog(results));
-    EXPECT_EQ(results.manifestName, QStringLiteral("ITimer"));
+    EXPECT_EQ(results.manifestName, u"ITimer"_s);
     EXPECT_EQ(results.idHash, module.IDHash());
     EXPECT_TRUE(results.complete);
     EXPECT_EQ(PairsOf(results), (Pairs{{"t1", "pass"}, {"t2", "fail"}}));
 
-    EXPECT_FALSE(OnHandset(QStringLiteral("fs:/usermods/ITimer")));
-    EXPECT_FALSE(OnHandset(QStringLiteral("fs:/usermods/CTF/CTF.log")));
+    EXPECT_FALSE(OnHandset(u"fs:/usermods/ITimer"_s));
+    EXPECT_FALSE(OnHandset(u"fs:/usermods/CTF/CTF.log"_s));
 
     // The programs survive the manifest.
     CtfTestModule back;
     EXPECT_TRUE(back.ReadFromManifest(entry));
-    EXPECT_EQ(back.ModuleName(), QStringLiteral("ITimer_k_main"));
+    EXPECT_EQ(back.ModuleName(), u"ITimer_k_main"_s);
 }
 
 TEST_F(EndToEnd, CtfAppletModuleRunsByClassId)
 {
     testutil::ModuleSpec layout;
-    layout.directory = QStringLiteral("suite");
+    layout.directory = u"suite"_s;
     layout.appletIds = {0x10001000};
     layout.behaviour = "[ \"$1 $2\" = \"applet 0x10001000\" ] || exit 4\n"
                      "{ echo \"Suite: Suite_k\"; echo \"Test: t1 with words\"; echo \"Result: Pass\";\n"
                      "  echo \"[/VERBOSE]\"; } > usermods/suite/suite_k.log\n"
                      "echo notes > usermods/suite/notes.txt\n";
-    const QString package = fixture.MakePackage(QStringLiteral("Suite_Win32_Release.kestix"), layout);
+    const QString package = fixture.MakePackage(u"Suite_Win32_Release.kestix"_s, layout);
 
     CtfAppletTestModule module;
-    module.moduleName = QStringLiteral("Suite");
+    module.moduleName = u"Suite"_s;
     module.applets << AppletWithId(0x10001000);
-    module.targets.insert(QStringLiteral("t"), Target(package));
-    EXPECT_EQ(module.ModuleName(), QStringLiteral("0X10001000"));
+    module.targets.insert(u"t"_s, Target(package));
+    EXPECT_EQ(module.ModuleName(), u"0X10001000"_s);
     RunModule(module);
 
     ASSERT_EQ(module.desktopLogFiles.size(), 1);
-    EXPECT_TRUE(QFileInfo(module.desktopLogFiles[0]).fileName().contains(QRegularExpression(QStringLiteral("^suite") + kStamp + QStringLiteral("log$"))));
-    ExpectHeaderBefore(Lines(module.desktopLogFiles[0]), QStringLiteral("Test: t1 with words"), module);
+    EXPECT_TRUE(QFileInfo(module.desktopLogFiles[0]).fileName().contains(QRegularExpression(u"^suite"_s + kStamp + u"log$"_s)));
+    ExpectHeaderBefore(Lines(module.desktopLogFiles[0]), u"Test: t1 with words"_s, module);
     TestResults results;
     ASSERT_TRUE(module.ParseLog(results));
-    EXPECT_EQ(results.manifestName, QStringLiteral("Suite"));
+    EXPECT_EQ(results.manifestName, u"Suite"_s);
     EXPECT_EQ(PairsOf(results), (Pairs{{"t1", "pass"}}));
-    EXPECT_FALSE(OnHandset(QStringLiteral("fs:/usermods/suite")));
+    EXPECT_FALSE(OnHandset(u"fs:/usermods/suite"_s));
 }
 
 TEST_F(EndToEnd, OatModuleRunsInTheFrameworkAndIsPostProcessed)
 {
-    if (!testutil::HaveProgram(QStringLiteral("perl")))
+    if (!testutil::HaveProgram(u"perl"_s))
         GTEST_SKIP() << "perl is not installed";
 
     // The framework applet runs the suite named in its arguments.
     testutil::ModuleSpec frameworkSpec;
-    frameworkSpec.directory = QStringLiteral("oat");
+    frameworkSpec.directory = u"oat"_s;
     frameworkSpec.appletIds = {0x01010001};
     frameworkSpec.behaviour = "[ -f usermods/oat/testdata.kar ] || exit 5\n"
                               "mkdir -p shared/pek/log\n"
@@ -181,83 +181,82 @@ TEST_F(EndToEnd, OatModuleRunsInTheFrameworkAndIsPostProcessed)
                               "  echo \"@1: t1\"; echo \"Status: Success\"; echo \"@2: t2\"; echo \"@3: t3\";\n"
                               "  echo \"Status: Failed\"; echo \"RESULT: done\"; } > shared/pek/log/timer_u.oat\n";
     _OatFramework framework;
-    framework.name = QStringLiteral("oat");
-    framework.variants.insert(QStringLiteral("oat"),
-                              Target(fixture.MakePackage(QStringLiteral("oat_Win32_Release.kestix"), frameworkSpec)));
+    framework.name = u"oat"_s;
+    framework.variants.insert(u"oat"_s, Target(fixture.MakePackage(u"oat_Win32_Release.kestix"_s, frameworkSpec)));
 
     testutil::ModuleSpec layout;
-    layout.directory = QStringLiteral("oattimer");
+    layout.directory = u"oattimer"_s;
     layout.classIds = {0x10002000};
-    layout.suitePrograms = {QStringLiteral("Kesto:Timer:OatSuite1")};
-    QDir().mkpath(fixture.WorkFolder() + QStringLiteral("/package"));
-    const QString package = fixture.MakePackage(QStringLiteral("package/OatTimer_Win32_Release.kestix"), layout);
+    layout.suitePrograms = {u"Kesto:Timer:OatSuite1"_s};
+    QDir().mkpath(fixture.WorkFolder() + u"/package"_s);
+    const QString package = fixture.MakePackage(u"package/OatTimer_Win32_Release.kestix"_s, layout);
 
     OatTestModule module;
-    module.moduleName = QStringLiteral("OatTimer");
+    module.moduleName = u"OatTimer"_s;
     module.ProcessPackage(QFileInfo(package).absolutePath());
-    EXPECT_EQ(module.mifname, QStringLiteral("oattimer.mif"));
-    ASSERT_EQ(module.ModuleName(), QStringLiteral("OatSuite1"));
+    EXPECT_EQ(module.mifname, u"oattimer.mif"_s);
+    ASSERT_EQ(module.ModuleName(), u"OatSuite1"_s);
     module.classids << 0x10002000;
-    module.targets.insert(QStringLiteral("t"), Target(package));
-    module.SetTestCases({QStringLiteral("t1"), QStringLiteral("t3")});
+    module.targets.insert(u"t"_s, Target(package));
+    module.SetTestCases({u"t1"_s, u"t3"_s});
 
-    testutil::WriteFile(fixture.WorkFolder() + QStringLiteral("/td.kar"), "test data");
-    env.insert(QStringLiteral("TestDataCachePath"), fixture.WorkFolder() + QStringLiteral("/td.kar"));
+    testutil::WriteFile(fixture.WorkFolder() + u"/td.kar"_s, "test data");
+    env.insert(u"TestDataCachePath"_s, fixture.WorkFolder() + u"/td.kar"_s);
     ASSERT_FALSE(framework.IsLoaded(device.get()));
     ASSERT_TRUE(framework.Load(device.get(), env));
     ASSERT_TRUE(framework.IsLoaded(device.get()));
 
-    const QString perlCache = fixture.WorkFolder() + QStringLiteral("/perl");
-    testutil::WriteFile(perlCache + QStringLiteral("/PostProcess3.pl"),
+    const QString perlCache = fixture.WorkFolder() + u"/perl"_s;
+    testutil::WriteFile(perlCache + u"/PostProcess3.pl"_s,
                         "my ($source, $temp) = @ARGV;\n"
                         "opendir(my $dh, $source) or die;\n"
                         "for my $n (grep { /\\.oat$/ } readdir($dh)) {\n"
                         "  open(my $i, '<', \"$source/$n\") or die; open(my $o, '>', \"$temp/pp-$n\") or die;\n"
                         "  print {$o} <$i>; print \"processed $n\\n\";\n"
                         "}\n");
-    env.insert(QStringLiteral("PerlCache"), perlCache);
-    env.insert(QStringLiteral("DevicePack"), QStringLiteral("/kit/deviceref.dso"));
-    env.insert(QStringLiteral("DSOCacheFilePath"), QStringLiteral("/cache/dso"));
-    env.insert(QStringLiteral("Platform"), QStringLiteral("/sdk/pvs/platform"));
+    env.insert(u"PerlCache"_s, perlCache);
+    env.insert(u"DevicePack"_s, u"/kit/deviceref.dso"_s);
+    env.insert(u"DSOCacheFilePath"_s, u"/cache/dso"_s);
+    env.insert(u"Platform"_s, u"/sdk/pvs/platform"_s);
 
     module.SetLogger(&log);
     ASSERT_TRUE(module.Run(device.get(), env));
-    EXPECT_TRUE(OnHandset(QStringLiteral("fs:/mif/oattimer.mif")));
+    EXPECT_TRUE(OnHandset(u"fs:/mif/oattimer.mif"_s));
     ASSERT_TRUE(module.IsLogComplete(device.get()));
     ASSERT_TRUE(module.CopyLog(device.get(), env));
-    EXPECT_EQ(env.value(QStringLiteral("OatRawLogPath")), logs + QStringLiteral("/oatRawLogs"));
+    EXPECT_EQ(env.value(u"OatRawLogPath"_s), logs + u"/oatRawLogs"_s);
     ASSERT_EQ(module.desktopLogFiles.size(), 1);
     const QString raw = module.desktopLogFiles.first();
-    EXPECT_TRUE(QFileInfo(raw).fileName().contains(QRegularExpression(QStringLiteral("^timer_u") + kStamp + QStringLiteral("oat$"))));
+    EXPECT_TRUE(QFileInfo(raw).fileName().contains(QRegularExpression(u"^timer_u"_s + kStamp + u"oat$"_s)));
     module.RemoveTest(device.get());
     module.PostProcess(env);
 
-    ExpectHeaderBefore(Lines(raw), QStringLiteral("ModuleVer: 1.0"), module);
-    EXPECT_TRUE(Lines(raw).contains(QStringLiteral("Args: -dk -rs OatSuite1,t1,t3")));
+    ExpectHeaderBefore(Lines(raw), u"ModuleVer: 1.0"_s, module);
+    EXPECT_TRUE(Lines(raw).contains(u"Args: -dk -rs OatSuite1,t1,t3"_s));
     ASSERT_EQ(module.desktopLogFiles.size(), 1);
     EXPECT_EQ(QFileInfo(module.desktopLogFiles[0]).absolutePath(), logs);
-    EXPECT_TRUE(QFileInfo(module.desktopLogFiles[0]).fileName().startsWith(QStringLiteral("pp-timer_u")));
-    EXPECT_TRUE(testutil::ReadFile(fixture.WorkFolder() + QStringLiteral("/log.txt")).contains("processed timer_u"));
+    EXPECT_TRUE(QFileInfo(module.desktopLogFiles[0]).fileName().startsWith(u"pp-timer_u"_s));
+    EXPECT_TRUE(testutil::ReadFile(fixture.WorkFolder() + u"/log.txt"_s).contains("processed timer_u"));
 
     TestResults results;
     ASSERT_TRUE(module.ParseLog(results));
-    EXPECT_EQ(results.manifestName, QStringLiteral("OatTimer"));
+    EXPECT_EQ(results.manifestName, u"OatTimer"_s);
     EXPECT_TRUE(results.complete);
     EXPECT_EQ(PairsOf(results), (Pairs{{"t1", "pass"}, {"t2", "unexecuted"}, {"t3", "fail"}}));
 
-    EXPECT_FALSE(OnHandset(QStringLiteral("fs:/usermods/oattimer")));
-    EXPECT_FALSE(OnHandset(QStringLiteral("fs:/shared/pek/log/timer_u.oat")));
-    EXPECT_FALSE(OnHandset(QStringLiteral("fs:/mif/oattimer.mif")));
-    EXPECT_TRUE(OnHandset(QStringLiteral("fs:/usermods/oat/testdata.kar")));
+    EXPECT_FALSE(OnHandset(u"fs:/usermods/oattimer"_s));
+    EXPECT_FALSE(OnHandset(u"fs:/shared/pek/log/timer_u.oat"_s));
+    EXPECT_FALSE(OnHandset(u"fs:/mif/oattimer.mif"_s));
+    EXPECT_TRUE(OnHandset(u"fs:/usermods/oat/testdata.kar"_s));
     framework.Unload(device.get(), env);
-    EXPECT_FALSE(OnHandset(QStringLiteral("fs:/usermods/oat")));
+    EXPECT_FALSE(OnHandset(u"fs:/usermods/oat"_s));
     EXPECT_FALSE(framework.IsLoaded(device.get()));
 }
 
 TEST_F(EndToEnd, UtModuleReadsItsConfigurationAndWritesBothLogs)
 {
     testutil::ModuleSpec layout;
-    layout.directory = QStringLiteral("uttimer");
+    layout.directory = u"uttimer"_s;
     layout.appletIds = {0x20002000};
     layout.behaviour = "allow=$(sed -n 's/^Allow=//p' mod/ututtimer/utconfig.dat)\n"
                      "mkdir -p usermods/uttimer/log\n"
@@ -265,77 +264,74 @@ TEST_F(EndToEnd, UtModuleReadsItsConfigurationAndWritesBothLogs)
                      "  echo \"------------\"; for t in $(echo $allow | tr , ' '); do echo \"$t PASSED 12 ms\"; done;\n"
                      "  echo \"t9 Failed\"; echo \"------------\"; echo \"Elapsed Time: 1s\"; } > usermods/uttimer/log/run.txt\n"
                      "echo '<TestRunLog cases=\"'$allow'\"></TestRunLog>' > usermods/uttimer/log/run.xml\n";
-    const QString package = fixture.MakePackage(QStringLiteral("UTTimer_Win32_Release.kestix"), layout);
-    const QString source = fixture.WorkFolder() + QStringLiteral("/src");
-    testutil::WriteFile(source + QStringLiteral("/utconfig.dat"), "[Defaults]\nLevel=2");
+    const QString package = fixture.MakePackage(u"UTTimer_Win32_Release.kestix"_s, layout);
+    const QString source = fixture.WorkFolder() + u"/src"_s;
+    testutil::WriteFile(source + u"/utconfig.dat"_s, "[Defaults]\nLevel=2");
 
     UTTestModule module;
-    module.moduleName = QStringLiteral("UTTimer");
+    module.moduleName = u"UTTimer"_s;
     module.sourcePath = source;
     module.applets << AppletWithId(0x20002000);
-    module.targets.insert(QStringLiteral("t"), Target(package));
-    module.SetTestCases({QStringLiteral("t1"), QStringLiteral("t2")});
-    const auto scratch = [] { return QDir::temp().entryList({QStringLiteral("test_*.dat")}, QDir::Files); };
+    module.targets.insert(u"t"_s, Target(package));
+    module.SetTestCases({u"t1"_s, u"t2"_s});
+    const auto scratch = [] { return QDir::temp().entryList({u"test_*.dat"_s}, QDir::Files); };
     const QStringList before = scratch();
     RunModule(module);
     EXPECT_EQ(scratch(), before);  // the configuration's way to the handset leaves nothing behind
 
-    EXPECT_EQ(testutil::ReadFile(fixture.HostPath(QStringLiteral("phone"), QStringLiteral("fs:/mod/ututtimer/utconfig.dat"))),
+    EXPECT_EQ(testutil::ReadFile(fixture.HostPath(u"phone"_s, u"fs:/mod/ututtimer/utconfig.dat"_s)),
               QByteArray("[Defaults]\nLevel=2\n[TestFramework]\nSkipIfNoGolden=1\nLogSkippedGoldens=0\nSkipKnown=1\nAllow=t1,t2\n"));
     ASSERT_EQ(module.desktopLogFiles.size(), 2);
-    QString text;
-    QString xml;
-    for (const QString &path : std::as_const(module.desktopLogFiles))
-        (path.endsWith(QLatin1String(".txt")) ? text : xml) = path;
-    ASSERT_FALSE(text.isEmpty());
-    ASSERT_FALSE(xml.isEmpty());
+    const QString text = module.desktopLogFiles.filter(QRegularExpression(u"\\.txt$"_s)).value(0);
+    const QString xml = module.desktopLogFiles.filter(QRegularExpression(u"\\.xml$"_s)).value(0);
+    ASSERT_FALSE(text.isEmpty() || xml.isEmpty());
     const QStringList lines = Lines(text);
-    EXPECT_EQ(lines.at(0), QStringLiteral("Unit test run"));
-    ExpectHeaderBefore(lines, QStringLiteral("SuiteName: UTTimer 14:05:09 03-Dec-2026"), module);
+    EXPECT_EQ(lines.at(0), u"Unit test run"_s);
+    ExpectHeaderBefore(lines, u"SuiteName: UTTimer 14:05:09 03-Dec-2026"_s, module);
 
     QDomDocument document;
     ASSERT_TRUE(document.setContent(testutil::ReadFile(xml)));
-    EXPECT_EQ(document.documentElement().attribute(QStringLiteral("guid")), env.value(QStringLiteral("TestRunID")));
-    EXPECT_EQ(document.documentElement().attribute(QStringLiteral("manifest_name")), QStringLiteral("UTTimer"));
-    EXPECT_EQ(document.documentElement().attribute(QStringLiteral("cases")), QStringLiteral("t1,t2"));
-    if (testutil::HaveProgram(QStringLiteral("xmllint"))) {
-        EXPECT_EQ(testutil::RunProgram(QStringLiteral("xmllint"), {QStringLiteral("--noout"), xml}), 0);
+    EXPECT_EQ(document.documentElement().attribute(u"guid"_s), env.value(u"TestRunID"_s));
+    EXPECT_EQ(document.documentElement().attribute(u"manifest_name"_s), u"UTTimer"_s);
+    EXPECT_EQ(document.documentElement().attribute(u"cases"_s), u"t1,t2"_s);
+    if (testutil::HaveProgram(u"xmllint"_s)) {
+        EXPECT_EQ(testutil::RunProgram(u"xmllint"_s, {u"--noout"_s, xml}), 0);
     }
 
     TestResults results;
     ASSERT_TRUE(module.ParseLog(results));
-    EXPECT_EQ(results.manifestName, QStringLiteral("Timer"));
+    EXPECT_EQ(results.manifestName, u"Timer"_s);
     EXPECT_TRUE(results.complete);
     EXPECT_EQ(results.timeStamp, QDateTime(QDate(2026, 12, 3), QTime(14, 5, 9)));
     EXPECT_EQ(PairsOf(results), (Pairs{{"t1", "pass"}, {"t2", "pass"}}));
-    EXPECT_FALSE(OnHandset(QStringLiteral("fs:/usermods/uttimer")));
+    EXPECT_FALSE(OnHandset(u"fs:/usermods/uttimer"_s));
 }
 
 TEST_F(EndToEnd, SecondaryModulesAreInstalledAndRemovedWithTheirUser)
 {
     testutil::ModuleSpec helperSpec;
-    helperSpec.directory = QStringLiteral("helper");
-    helperSpec.files = {{QStringLiteral("data.bin"), "x"}};
+    helperSpec.directory = u"helper"_s;
+    helperSpec.files = {{u"data.bin"_s, "x"}};
     SecondaryModule helper;
-    helper.moduleName = QStringLiteral("helper");
-    helper.targets.insert(QStringLiteral("t"), Target(fixture.MakePackage(QStringLiteral("helper_Win32_Release.kestix"), helperSpec)));
+    helper.moduleName = u"helper"_s;
+    helper.targets.insert(u"t"_s, Target(fixture.MakePackage(u"helper_Win32_Release.kestix"_s, helperSpec)));
     ASSERT_TRUE(helper.InstallTest(device.get()));
-    EXPECT_TRUE(OnHandset(QStringLiteral("fs:/usermods/helper/data.bin")));
+    EXPECT_TRUE(OnHandset(u"fs:/usermods/helper/data.bin"_s));
     EXPECT_FALSE(helper.Run(device.get(), env));
 
     testutil::ModuleSpec layout;
-    layout.directory = QStringLiteral("user");
+    layout.directory = u"user"_s;
     layout.appletIds = {0x30003000};
     CtfAppletTestModule user;
-    user.moduleName = QStringLiteral("user");
+    user.moduleName = u"user"_s;
     user.applets << AppletWithId(0x30003000);
-    user.secondaryModules << QStringLiteral("helper");
-    user.targets.insert(QStringLiteral("t"), Target(fixture.MakePackage(QStringLiteral("user_Win32_Release.kestix"), layout)));
+    user.secondaryModules << u"helper"_s;
+    user.targets.insert(u"t"_s, Target(fixture.MakePackage(u"user_Win32_Release.kestix"_s, layout)));
     ASSERT_TRUE(user.InstallTest(device.get()));
-    EXPECT_EQ(user.deviceDirectory, QStringLiteral("fs:/usermods/user/"));
+    EXPECT_EQ(user.deviceDirectory, u"fs:/usermods/user/"_s);
     EXPECT_TRUE(user.RemoveTest(device.get()));
-    EXPECT_FALSE(OnHandset(QStringLiteral("fs:/usermods/user")));
-    EXPECT_FALSE(OnHandset(QStringLiteral("fs:/usermods/helper")));
+    EXPECT_FALSE(OnHandset(u"fs:/usermods/user"_s));
+    EXPECT_FALSE(OnHandset(u"fs:/usermods/helper"_s));
 }
 
 TEST_F(EndToEnd, PackagesAreFoundUnderEveryNameTheKitUses)
@@ -343,52 +339,51 @@ TEST_F(EndToEnd, PackagesAreFoundUnderEveryNameTheKitUses)
     // A CTF package named with the "ctf" prefix, holding another module's
     // information file first.
     testutil::ModuleSpec other;
-    other.directory = QStringLiteral("other");
-    other.programs = {{QStringLiteral("Other_k"), QString(), 0x0102FAF7}};
+    other.directory = u"other"_s;
+    other.programs = {{u"Other_k"_s, QString(), 0x0102FAF7}};
     testutil::ModuleSpec layout;
-    layout.directory = QStringLiteral("ITimer");
-    layout.mifName = QStringLiteral("itimer.MIF");
-    layout.programs = {{QStringLiteral("ITimer_k"), QStringLiteral("-a"), 0x0102FAF7},
-                     {QStringLiteral("NotAProgram"), QString(), 0x0102C305}};
+    layout.directory = u"ITimer"_s;
+    layout.mifName = u"itimer.MIF"_s;
+    layout.programs = {{u"ITimer_k"_s, u"-a"_s, 0x0102FAF7}, {u"NotAProgram"_s, QString(), 0x0102C305}};
     testutil::Members members = testutil::ModuleMembers(other) + testutil::ModuleMembers(layout);
-    const QString folder = fixture.WorkFolder() + QStringLiteral("/package");
+    const QString folder = fixture.WorkFolder() + u"/package"_s;
     QDir().mkpath(folder);
-    fixture.MakePackage(QStringLiteral("package/ctfITimerRVCT22arm9_Release.kestix"), members);
+    fixture.MakePackage(u"package/ctfITimerRVCT22arm9_Release.kestix"_s, members);
 
     CtfTestModule ctf;
-    ctf.moduleName = QStringLiteral("ITimer");
+    ctf.moduleName = u"ITimer"_s;
     EXPECT_FALSE(ctf.ProcessPackage(folder));
     ASSERT_EQ(ctf.programs.size(), 1);
-    EXPECT_EQ(ctf.ModuleName(), QStringLiteral("ITimer_k"));
+    EXPECT_EQ(ctf.ModuleName(), u"ITimer_k"_s);
 
     CtfTestModule missing;
-    missing.moduleName = QStringLiteral("Absent");
+    missing.moduleName = u"Absent"_s;
     EXPECT_FALSE(missing.ProcessPackage(folder));
     EXPECT_TRUE(missing.programs.isEmpty());
 
     // An OAT package takes the name of its information file and the suite
     // program records only.
     testutil::ModuleSpec oatSpec;
-    oatSpec.directory = QStringLiteral("oat/suites");
-    oatSpec.mifName = QStringLiteral("suites_oatnet.mif");
-    oatSpec.suitePrograms = {QStringLiteral("Kesto:Net:NetSuite"), QStringLiteral("two:parts")};
-    oatSpec.programs = {{QStringLiteral("OatNet_k"), QString(), 0x0102FAF7}};
-    fixture.MakePackage(QStringLiteral("package/oatOatNet_Win32_Debug.kestix"), oatSpec);
+    oatSpec.directory = u"oat/suites"_s;
+    oatSpec.mifName = u"suites_oatnet.mif"_s;
+    oatSpec.suitePrograms = {u"Kesto:Net:NetSuite"_s, u"two:parts"_s};
+    oatSpec.programs = {{u"OatNet_k"_s, QString(), 0x0102FAF7}};
+    fixture.MakePackage(u"package/oatOatNet_Win32_Debug.kestix"_s, oatSpec);
     OatTestModule oat;
-    oat.moduleName = QStringLiteral("OatNet");
+    oat.moduleName = u"OatNet"_s;
     EXPECT_FALSE(oat.ProcessPackage(folder));
-    EXPECT_EQ(oat.mifname, QStringLiteral("suites_oatnet.mif"));
+    EXPECT_EQ(oat.mifname, u"suites_oatnet.mif"_s);
     ASSERT_EQ(oat.programs.size(), 2);
-    EXPECT_EQ(oat.ModuleName(), QStringLiteral("NetSuite"));
+    EXPECT_EQ(oat.ModuleName(), u"NetSuite"_s);
 
     QDomDocument document;
-    QDomElement entry = document.createElement(QStringLiteral("testmodule"));
+    QDomElement entry = document.createElement(u"testmodule"_s);
     oat.WriteToManifest(entry);
     OatTestModule back;
     EXPECT_TRUE(back.ReadFromManifest(entry));
     EXPECT_EQ(back.mifname, oat.mifname);
-    EXPECT_EQ(back.ModuleName(), QStringLiteral("NetSuite"));
+    EXPECT_EQ(back.ModuleName(), u"NetSuite"_s);
     OatTestModule none;
-    entry.removeChild(entry.firstChildElement(QStringLiteral("programs")));
+    entry.removeChild(entry.firstChildElement(u"programs"_s));
     EXPECT_FALSE(none.ReadFromManifest(entry));
 }

@@ -15,22 +15,14 @@
 
 #include <gtest/gtest.h>
 
+using namespace Qt::StringLiterals;
+
 namespace {
 
 using moduletest::Pairs;
 using moduletest::PairsOf;
 
-class LogFiles : public ::testing::Test
-{
-protected:
-    QString Write(const QString &name, const QByteArray &bytes)
-    {
-        const QString path = dir.filePath(name);
-        testutil::WriteFile(path, bytes);
-        return path;
-    }
-    QTemporaryDir dir;
-};
+using LogFiles = moduletest::ModuleFolder;
 
 } // namespace
 
@@ -38,7 +30,7 @@ TEST_F(LogFiles, CtfPairsResultsWithTestNamesInEitherOrder)
 {
     CtfTestModule module;
     TestResults results;
-    const QString path = Write(QStringLiteral("a.LOG"),
+    const QString path = Write(u"a.LOG"_s,
         "Suite: A\r\n"
         "Time: 2026/12/03 14:05:09\r\n"
         "Result: PASS\r\n"
@@ -50,51 +42,59 @@ TEST_F(LogFiles, CtfPairsResultsWithTestNamesInEitherOrder)
         "ID Hash: #123\r\n"
         "[/verbose]\r\n");
     ASSERT_TRUE(module.ParseLog(path, results));
-    EXPECT_EQ(results.manifestName, QStringLiteral("B"));
-    EXPECT_EQ(results.idHash, QStringLiteral("#123"));
+    EXPECT_EQ(results.manifestName, u"B"_s);
+    EXPECT_EQ(results.idHash, u"#123"_s);
     EXPECT_TRUE(results.complete);
     EXPECT_EQ(results.timeStamp, QDateTime(QDate(2026, 12, 3), QTime(14, 5, 9)));
     EXPECT_EQ(PairsOf(results), (Pairs{{"t1", "pass"}, {"t2 with words", "failed"}}));
-    EXPECT_EQ(module.moduleName, QStringLiteral("A")); // named by the first suite line
+    EXPECT_EQ(module.moduleName, u"A"_s); // named by the first suite line
 }
 
 TEST_F(LogFiles, CtfLogWithoutSuiteOrManifestNameIsNotRecognised)
 {
     CtfTestModule module;
     TestResults results;
-    results.caseResults.append(TestCaseResult(QStringLiteral("old"), QStringLiteral("pass")));
-    EXPECT_FALSE(module.ParseLog(Write(QStringLiteral("x.log"), "Test: t1\nResult: pass\n"), results));
+    results.caseResults.append(TestCaseResult(u"old"_s, u"pass"_s));
+    EXPECT_FALSE(module.ParseLog(Write(u"x.log"_s, "Test: t1\nResult: pass\n"), results));
     EXPECT_EQ(results.caseResults.size(), 1); // this log's own entry only
-    EXPECT_FALSE(module.ParseLog(Write(QStringLiteral("x.txt"), "Suite: A\n"), results));
-    EXPECT_FALSE(module.ParseLog(dir.filePath(QStringLiteral("missing.log")), results));
-    ASSERT_TRUE(QDir().mkpath(dir.filePath(QStringLiteral("folder.log"))));
-    EXPECT_FALSE(module.ParseLog(dir.filePath(QStringLiteral("folder.log")), results));
+    EXPECT_FALSE(module.ParseLog(Write(u"x.txt"_s, "Suite: A\n"), results));
+    EXPECT_FALSE(module.ParseLog(dir.filePath(u"missing.log"_s), results));
+    ASSERT_TRUE(QDir().mkpath(dir.filePath(u"folder.log"_s)));
+    EXPECT_FALSE(module.ParseLog(dir.filePath(u"folder.log"_s), results));
     // A link to an endless device is no log.
-    const QString zero = dir.filePath(QStringLiteral("zero.oat"));
-    if (QFile::link(QStringLiteral("/dev/zero"), zero)) {
+    const QString zero = dir.filePath(u"zero.oat"_s);
+    if (QFile::link(u"/dev/zero"_s, zero)) {
         OatTestModule oat;
         EXPECT_FALSE(oat.ParseLog(zero, results));
     }
+}
+
+TEST_F(LogFiles, LastLineWithoutLineEndIsReadWhole)
+{
+    CtfTestModule module;
+    TestResults results;
+    ASSERT_TRUE(module.ParseLog(Write(u"a.log"_s, "Suite: A\r\nTest: t1\nResult: pass"), results));
+    EXPECT_EQ(PairsOf(results), (Pairs{{"t1", "pass"}}));
 }
 
 TEST_F(LogFiles, AppletTakesTheFirstWordAndDropsKFromSuiteNames)
 {
     CtfAppletTestModule module;
     TestResults results;
-    ASSERT_TRUE(module.ParseLog(Write(QStringLiteral("s.log"),
+    ASSERT_TRUE(module.ParseLog(Write(u"s.log"_s,
         "Suite: foo_K\nTest: t1 extra words\nResult: Pass\nTest:\nResult: x\n"), results));
-    EXPECT_EQ(results.manifestName, QStringLiteral("foo"));
+    EXPECT_EQ(results.manifestName, u"foo"_s);
     EXPECT_EQ(PairsOf(results), (Pairs{{"t1", "pass"}}));
 
-    ASSERT_TRUE(module.ParseLog(Write(QStringLiteral("m.log"), "Suite: foo_k\nManifest Name: foo_k\n"), results));
-    EXPECT_EQ(results.manifestName, QStringLiteral("foo_k"));
+    ASSERT_TRUE(module.ParseLog(Write(u"m.log"_s, "Suite: foo_k\nManifest Name: foo_k\n"), results));
+    EXPECT_EQ(results.manifestName, u"foo_k"_s);
 }
 
 TEST_F(LogFiles, OatMapsStatusWordsAndMarksUnfinishedCasesUnexecuted)
 {
     OatTestModule module;
     TestResults results;
-    ASSERT_TRUE(module.ParseLog(Write(QStringLiteral("timer_u.OAT"),
+    ASSERT_TRUE(module.ParseLog(Write(u"timer_u.OAT"_s,
         "@#OatTimer#\n"
         "@Another\n"
         "TimeStamp: 14:05:09 12-03-2026\n"
@@ -110,29 +110,25 @@ TEST_F(LogFiles, OatMapsStatusWordsAndMarksUnfinishedCasesUnexecuted)
         "@6: t6\n"
         "ID Hash: #9\n"
         "TEST RESULT: done\n"), results));
-    EXPECT_EQ(results.manifestName, QStringLiteral("OatTimer"));
-    EXPECT_EQ(module.moduleName, QStringLiteral("OatTimer"));
-    EXPECT_EQ(results.idHash, QStringLiteral("#9"));
+    EXPECT_EQ(results.manifestName, u"OatTimer"_s);
+    EXPECT_EQ(module.moduleName, u"OatTimer"_s);
+    EXPECT_EQ(results.idHash, u"#9"_s);
     EXPECT_TRUE(results.complete);
     EXPECT_EQ(results.timeStamp, QDateTime(QDate(2026, 12, 3), QTime(14, 5, 9)));
     EXPECT_EQ(PairsOf(results), (Pairs{{"t1", "unexecuted"}, {"t2", "pass"}, {"t3", "fail"},
                                        {"t4", "unsupported"}, {"t5", "unexecuted"}}));
-}
 
-TEST_F(LogFiles, OatStampedManifestNameReplacesTheSuiteLine)
-{
-    OatTestModule module;
-    TestResults results;
-    ASSERT_TRUE(module.ParseLog(Write(QStringLiteral("a.oat"), "@suite\nManifest Name: Timer\n"), results));
-    EXPECT_EQ(results.manifestName, QStringLiteral("Timer"));
-    EXPECT_FALSE(module.ParseLog(Write(QStringLiteral("a.log"), "@suite\n"), results));
+    // A stamped manifest name replaces the suite line; a log of another kind is not read.
+    ASSERT_TRUE(module.ParseLog(Write(u"a.oat"_s, "@suite\nManifest Name: Timer\n"), results));
+    EXPECT_EQ(results.manifestName, u"Timer"_s);
+    EXPECT_FALSE(module.ParseLog(Write(u"a.log"_s, "@suite\n"), results));
 }
 
 TEST_F(LogFiles, UtReadsTheResultTableAndDropsTheUtPrefix)
 {
     UTTestModule module;
     TestResults results;
-    ASSERT_TRUE(module.ParseLog(Write(QStringLiteral("ut.TXT"),
+    ASSERT_TRUE(module.ParseLog(Write(u"ut.TXT"_s,
         "SuiteName: UTTimer 14:05:09 03-Dec-2026 extra\n"
         "ID Hash: #77\n"
         "---- results\n"
@@ -144,34 +140,30 @@ TEST_F(LogFiles, UtReadsTheResultTableAndDropsTheUtPrefix)
         "----------\n"
         "t6 PASSED 1 ms\n"
         "Elapsed Time: 12s\n"), results));
-    EXPECT_EQ(results.manifestName, QStringLiteral("Timer"));
-    EXPECT_EQ(results.idHash, QStringLiteral("#77"));
+    EXPECT_EQ(results.manifestName, u"Timer"_s);
+    EXPECT_EQ(results.idHash, u"#77"_s);
     EXPECT_TRUE(results.complete);
     EXPECT_EQ(results.timeStamp, QDateTime(QDate(2026, 12, 3), QTime(14, 5, 9)));
     EXPECT_EQ(PairsOf(results), (Pairs{{"t1", "pass"}, {"t3", "fail"}, {"t4", "unsupported"}, {"t5", "unexecuted"}}));
-    EXPECT_FALSE(module.ParseLog(Write(QStringLiteral("ut.xml"), "<TestRunLog/>"), results));
+    EXPECT_FALSE(module.ParseLog(Write(u"ut.xml"_s, "<TestRunLog/>"), results));
 }
 
-TEST_F(LogFiles, SecondaryModulesParseNothing)
-{
-    SecondaryModule module;
-    TestResults results;
-    module.AddDesktopLogFile(Write(QStringLiteral("a.log"), "Suite: x\n"));
-    EXPECT_FALSE(module.ParseLog(results));
-    EXPECT_FALSE(module.selectable);
-}
-
-TEST_F(LogFiles, BaseParseStopsAtTheFirstRecognisedLog)
+TEST_F(LogFiles, BaseParseStopsAtTheFirstRecognisedLogAndSecondaryModulesParseNothing)
 {
     CtfTestModule module;
     TestResults results;
     EXPECT_FALSE(module.ParseLog(results));
     EXPECT_TRUE(results.manifestName.isEmpty());
-    module.AddDesktopLogFile(Write(QStringLiteral("a.txt"), "Suite: wrong kind\n"));
-    module.AddDesktopLogFile(Write(QStringLiteral("b.log"), "Suite: first\n"));
-    module.AddDesktopLogFile(Write(QStringLiteral("c.log"), "Suite: second\n"));
+    module.AddDesktopLogFile(Write(u"a.txt"_s, "Suite: wrong kind\n"));
+    module.AddDesktopLogFile(Write(u"b.log"_s, "Suite: first\n"));
+    module.AddDesktopLogFile(Write(u"c.log"_s, "Suite: second\n"));
     ASSERT_TRUE(module.ParseLog(results));
-    EXPECT_EQ(results.manifestName, QStringLiteral("first"));
+    EXPECT_EQ(results.manifestName, u"first"_s);
+
+    SecondaryModule secondary;
+    secondary.AddDesktopLogFile(Write(u"a.log"_s, "Suite: x\n"));
+    EXPECT_FALSE(secondary.ParseLog(results));
+    EXPECT_FALSE(secondary.selectable);
 }
 
 // Whatever a handset leaves in a log file, the parsers return and keep what
@@ -189,14 +181,14 @@ TEST_P(HostileLog, EveryParserSurvives)
     UTTestModule ut;
     TestResults results;
     const QByteArray named = "Suite: S\nSuiteName: S\n@S\n" + bytes + "\nTest: t\nResult: pass\n";
-    EXPECT_TRUE(ctf.ParseLog(Write(QStringLiteral("h.log"), named), results));
-    EXPECT_EQ(results.caseResults.last().testCase, QStringLiteral("t"));
-    EXPECT_TRUE(applet.ParseLog(Write(QStringLiteral("h.log"), named), results));
-    EXPECT_TRUE(oat.ParseLog(Write(QStringLiteral("h.oat"), named), results));
-    EXPECT_TRUE(ut.ParseLog(Write(QStringLiteral("h.txt"), named), results));
-    ctf.ParseLog(Write(QStringLiteral("raw.log"), bytes), results);
-    oat.ParseLog(Write(QStringLiteral("raw.oat"), bytes), results);
-    ut.ParseLog(Write(QStringLiteral("raw.txt"), bytes), results);
+    EXPECT_TRUE(ctf.ParseLog(Write(u"h.log"_s, named), results));
+    EXPECT_EQ(results.caseResults.last().testCase, u"t"_s);
+    EXPECT_TRUE(applet.ParseLog(Write(u"h.log"_s, named), results));
+    EXPECT_TRUE(oat.ParseLog(Write(u"h.oat"_s, named), results));
+    EXPECT_TRUE(ut.ParseLog(Write(u"h.txt"_s, named), results));
+    ctf.ParseLog(Write(u"raw.log"_s, bytes), results);
+    oat.ParseLog(Write(u"raw.oat"_s, bytes), results);
+    ut.ParseLog(Write(u"raw.txt"_s, bytes), results);
 }
 
 INSTANTIATE_TEST_SUITE_P(

@@ -3,14 +3,19 @@
 // Helpers shared by the module kind tests.
 
 #include "catalogue/compilervariant.h"
+#include "log/log.h"
 #include "modules/testresults.h"
 #include "resources/mif.h"
+#include "support/testutil.h"
 
 #include <QFileInfo>
 #include <QList>
 #include <QPair>
 #include <QSharedPointer>
 #include <QString>
+#include <QTemporaryDir>
+
+#include <gtest/gtest.h>
 
 namespace moduletest {
 
@@ -36,6 +41,24 @@ inline QSharedPointer<_CompilerVariant> Target(const QString &package,
     variant->packagePath = package;
     return variant;
 }
+
+// A temporary folder for a test's files, with a log ("log.txt") in it.
+class ModuleFolder : public ::testing::Test
+{
+protected:
+    ModuleFolder() { log.SetLogPath(dir.filePath(QStringLiteral("log.txt"))); }
+    // Writes bytes to name in the folder; the file's path.
+    QString Write(const QString &name, const QByteArray &bytes)
+    {
+        const QString path = dir.filePath(name);
+        testutil::WriteFile(path, bytes);
+        return path;
+    }
+    QString LogText() const { return QString::fromLatin1(testutil::ReadFile(dir.filePath(QStringLiteral("log.txt")))); }
+
+    QTemporaryDir dir;
+    Log log;
+};
 
 inline Applet AppletWithId(unsigned int id)
 {

@@ -1,6 +1,8 @@
 // OAT modules and the OAT framework: derived names, run options, the
 // framework's data files and the Perl post-processing.
 
+#include "moduletest.h"
+
 #include "log/log.h"
 #include "modules/oatframework.h"
 #include "modules/oattestmodule.h"
@@ -12,11 +14,14 @@
 
 #include <gtest/gtest.h>
 
+using namespace Qt::StringLiterals;
+
 using ::testing::_;
 using ::testing::DoAll;
 using ::testing::NiceMock;
 using ::testing::Return;
 using ::testing::SetArgReferee;
+using moduletest::Target;
 
 namespace {
 
@@ -26,16 +31,6 @@ SysResource Program(const QByteArray &name)
     program.type = 0x01010100;
     program.SetProperty("Program Name", name);
     return program;
-}
-
-QSharedPointer<_CompilerVariant> Variant(const QString &package)
-{
-    QSharedPointer<_CompilerVariant> variant(new _CompilerVariant);
-    variant->name = QStringLiteral("v");
-    variant->arch = IKestoDevice::PLATFORM_WIN32;
-    variant->build = QStringLiteral("Release");
-    variant->packagePath = package;
-    return variant;
 }
 
 struct NameCase {
@@ -72,15 +67,14 @@ INSTANTIATE_TEST_SUITE_P(
 
 namespace {
 
-class OatRun : public ::testing::Test
+class OatRun : public moduletest::ModuleFolder
 {
 protected:
     void SetUp() override
     {
-        log.SetLogPath(dir.filePath(QStringLiteral("log.txt")));
         module.SetLogger(&log);
-        module.moduleName = QStringLiteral("OatTimer");
-        module.targets.insert(QStringLiteral("v"), Variant(QStringLiteral("/oattimer.kestix")));
+        module.moduleName = u"OatTimer"_s;
+        module.targets.insert(u"v"_s, Target(u"/oattimer.kestix"_s));
         device.platform = IKestoDevice::PLATFORM_WIN32;
         ON_CALL(device, InstallPackage(_)).WillByDefault(Return(0u));
         ON_CALL(device, StartApplet(_, _)).WillByDefault(Return(0u));
@@ -97,10 +91,7 @@ protected:
         EXPECT_TRUE(module.runOption.isEmpty());
         return arguments;
     }
-    QString LogText() { return QString::fromLatin1(testutil::ReadFile(dir.filePath(QStringLiteral("log.txt")))); }
 
-    QTemporaryDir dir;
-    Log log;
     OatTestModule module;
     NiceMock<MockDevice> device;
     QMap<QString, QString> env;
@@ -111,57 +102,54 @@ protected:
 TEST_F(OatRun, ArgumentsNameTheModeTheProgramAndTheCases)
 {
     module.programs << Program("OatSuite1");
-    EXPECT_EQ(module.ModuleName(), QStringLiteral("OatSuite1"));
-    EXPECT_EQ(ArgumentsFor(QString(), {}), QStringLiteral("-dk -ra OatSuite1"));
-    EXPECT_EQ(ArgumentsFor(QStringLiteral("Automated"), {}), QStringLiteral("-dk -ru OatSuite1"));
-    EXPECT_EQ(ArgumentsFor(QStringLiteral("inter"), {}), QStringLiteral("-dk -ri OatSuite1"));
-    EXPECT_EQ(ArgumentsFor(QStringLiteral("ALL"), {}), QStringLiteral("-dk -ra OatSuite1"));
-    EXPECT_EQ(ArgumentsFor(QStringLiteral("Interactive"), {QStringLiteral("t1"), QStringLiteral("t2")}),
-              QStringLiteral("-dk -rs OatSuite1,t1,t2"));
-    EXPECT_EQ(ArgumentsFor(QStringLiteral("Sometimes"), {}), QStringLiteral("-dk -ra OatSuite1"));
-    EXPECT_TRUE(LogText().contains(QStringLiteral("OatTestModule::Unknown Run Optionsometimes")));
+    EXPECT_EQ(module.ModuleName(), u"OatSuite1"_s);
+    EXPECT_EQ(ArgumentsFor(QString(), {}), u"-dk -ra OatSuite1"_s);
+    EXPECT_EQ(ArgumentsFor(u"Automated"_s, {}), u"-dk -ru OatSuite1"_s);
+    EXPECT_EQ(ArgumentsFor(u"inter"_s, {}), u"-dk -ri OatSuite1"_s);
+    EXPECT_EQ(ArgumentsFor(u"ALL"_s, {}), u"-dk -ra OatSuite1"_s);
+    EXPECT_EQ(ArgumentsFor(u"Interactive"_s, {u"t1"_s, u"t2"_s}), u"-dk -rs OatSuite1,t1,t2"_s);
+    EXPECT_EQ(ArgumentsFor(u"Sometimes"_s, {}), u"-dk -ra OatSuite1"_s);
+    EXPECT_TRUE(LogText().contains(u"OatTestModule::Unknown Run Optionsometimes"_s));
 }
 
 TEST_F(OatRun, PublishesTheModuleInformationFileBeforeStarting)
 {
     module.programs << Program("OatSuite1");
     ::testing::InSequence order;
-    EXPECT_CALL(device, InstallPackage(QStringLiteral("/oattimer.kestix"))).WillOnce(Return(0u));
-    EXPECT_CALL(device, CopyOnDevice(QStringLiteral("fs:/usermods/oattimer/oattimer.mif"),
-                                     QStringLiteral("fs:/mif/oattimer.mif"))).WillOnce(Return(true));
+    EXPECT_CALL(device, InstallPackage(u"/oattimer.kestix"_s)).WillOnce(Return(0u));
+    EXPECT_CALL(device, CopyOnDevice(u"fs:/usermods/oattimer/oattimer.mif"_s,
+                                     u"fs:/mif/oattimer.mif"_s)).WillOnce(Return(true));
     EXPECT_CALL(device, StartApplet(0x01010001u, _)).WillOnce(Return(0u));
     EXPECT_CALL(device, IsAppletRunning(0x01010001u)).WillOnce(Return(true)).WillOnce(Return(false));
     EXPECT_TRUE(module.Run(&device, env));
 }
 
-TEST_F(OatRun, WithoutAProgramNothingIsInstalled)
+TEST_F(OatRun, WithoutAProgramNothingIsInstalledAndStartFailuresAreReported)
 {
-    module.SetRunOption(QStringLiteral("auto"));
+    module.SetRunOption(u"auto"_s);
     EXPECT_CALL(device, InstallPackage(_)).Times(0);
     EXPECT_FALSE(module.Run(&device, env));
     EXPECT_TRUE(module.runOption.isEmpty());
-}
 
-TEST_F(OatRun, StartFailureIsReported)
-{
+    ::testing::Mock::VerifyAndClearExpectations(&device);
     module.programs << Program("OatSuite1");
     device.lastError = 0x80004005u;
     EXPECT_CALL(device, StartApplet(_, _)).WillOnce(Return(1u));
     EXPECT_FALSE(module.Run(&device, env));
-    EXPECT_TRUE(LogText().contains(QStringLiteral("OatTestModule::Run error: 2147500037(0x80004005)")));
+    EXPECT_TRUE(LogText().contains(u"OatTestModule::Run error: 2147500037(0x80004005)"_s));
 }
 
 TEST_F(OatRun, PrefersTheULogAndRemovesLogsAndPublishedFile)
 {
-    EXPECT_CALL(device, FileExists(QStringLiteral("fs:/shared/pek/log/timer_u.oat"))).WillRepeatedly(Return(true));
-    EXPECT_CALL(device, FileExists(QStringLiteral("fs:/shared/pek/log/timer.oat"))).Times(0);
-    QStringList paths{QStringLiteral("stale")};
+    EXPECT_CALL(device, FileExists(u"fs:/shared/pek/log/timer_u.oat"_s)).WillRepeatedly(Return(true));
+    EXPECT_CALL(device, FileExists(u"fs:/shared/pek/log/timer.oat"_s)).Times(0);
+    QStringList paths{u"stale"_s};
     ASSERT_TRUE(module.GetLogFilePaths(&device, paths));
-    EXPECT_EQ(paths, QStringList{QStringLiteral("fs:/shared/pek/log/timer_u.oat")});
+    EXPECT_EQ(paths, QStringList{u"fs:/shared/pek/log/timer_u.oat"_s});
 
-    EXPECT_CALL(device, RemoveDirectory(QStringLiteral("fs:/usermods/OatTimer"))).WillOnce(Return(0u));
-    EXPECT_CALL(device, DeleteFile(QStringLiteral("fs:/shared/pek/log/timer_u.oat"))).WillOnce(Return(0u));
-    EXPECT_CALL(device, DeleteFile(QStringLiteral("fs:/mif/oattimer.mif"))).WillOnce(Return(0u));
+    EXPECT_CALL(device, RemoveDirectory(u"fs:/usermods/OatTimer"_s)).WillOnce(Return(0u));
+    EXPECT_CALL(device, DeleteFile(u"fs:/shared/pek/log/timer_u.oat"_s)).WillOnce(Return(0u));
+    EXPECT_CALL(device, DeleteFile(u"fs:/mif/oattimer.mif"_s)).WillOnce(Return(0u));
     EXPECT_FALSE(module.RemoveTest(&device));
 }
 
@@ -170,25 +158,25 @@ TEST(OatFramework, LoadPushesBothCachesAndRestoresTheFlags)
     NiceMock<MockDevice> device;
     device.platform = IKestoDevice::PLATFORM_WIN32;
     _OatFramework framework;
-    QMap<QString, QString> env{{QStringLiteral("TestDataSpecified"), QStringLiteral("false")},
-                               {QStringLiteral("TestDataCachePath"), QStringLiteral("/cache/td.kar")},
-                               {QStringLiteral("DevicePackCachePath"), QStringLiteral("/cache/dp.kar")}};
+    QMap<QString, QString> env{{u"TestDataSpecified"_s, u"false"_s},
+                               {u"TestDataCachePath"_s, u"/cache/td.kar"_s},
+                               {u"DevicePackCachePath"_s, u"/cache/dp.kar"_s}};
     EXPECT_FALSE(framework.Load(&device, env));
 
-    framework.variants.insert(QStringLiteral("v"), Variant(QStringLiteral("/oat.kestix")));
-    EXPECT_CALL(device, InstallPackage(QStringLiteral("/oat.kestix"))).WillOnce(Return(0u));
+    framework.variants.insert(u"v"_s, Target(u"/oat.kestix"_s));
+    EXPECT_CALL(device, InstallPackage(u"/oat.kestix"_s)).WillOnce(Return(0u));
     EXPECT_CALL(device, FindModule(0x01010001u, _))
-        .WillRepeatedly(DoAll(SetArgReferee<1>(QStringLiteral("fs:/usermods/oat/")), Return(0u)));
-    EXPECT_CALL(device, CopyFileToDevice(QStringLiteral("/cache/td.kar"), QStringLiteral("fs:/usermods/oat/testdata.kar")));
-    EXPECT_CALL(device, CopyFileToDevice(QStringLiteral("/cache/dp.kar"), QStringLiteral("fs:/usermods/oat/testdata2.kar")));
+        .WillRepeatedly(DoAll(SetArgReferee<1>(u"fs:/usermods/oat/"_s), Return(0u)));
+    EXPECT_CALL(device, CopyFileToDevice(u"/cache/td.kar"_s, u"fs:/usermods/oat/testdata.kar"_s));
+    EXPECT_CALL(device, CopyFileToDevice(u"/cache/dp.kar"_s, u"fs:/usermods/oat/testdata2.kar"_s));
     ASSERT_TRUE(framework.Load(&device, env));
-    EXPECT_FALSE(env.contains(QStringLiteral("KeyDevicePackSpecified")));
-    EXPECT_EQ(env.value(QStringLiteral("TestDataSpecified")), QStringLiteral("false"));
+    EXPECT_FALSE(env.contains(u"KeyDevicePackSpecified"_s));
+    EXPECT_EQ(env.value(u"TestDataSpecified"_s), u"false"_s);
 
     // A later PostLoad pushes only what its flags ask for.
     ::testing::Mock::VerifyAndClearExpectations(&device);
-    env.insert(QStringLiteral("TestDataSpecified"), QStringLiteral("true"));
-    env.remove(QStringLiteral("TestDataCachePath"));
+    env.insert(u"TestDataSpecified"_s, u"true"_s);
+    env.remove(u"TestDataCachePath"_s);
     EXPECT_CALL(device, CopyFileToDevice(_, _)).Times(0);
     EXPECT_TRUE(framework.PostLoad(&device, env));
 }
@@ -199,15 +187,15 @@ TEST(OatFramework, IsLoadedUsesTheFixedClassIdAndUnloadRemovesEveryOatFolder)
     _OatFramework framework;
     framework.classId = 5;
     EXPECT_CALL(device, FindModule(0x01010001u, _)).WillRepeatedly(Return(1u));
-    EXPECT_CALL(device, ListDirectory(QStringLiteral("fs:/~0x01010001"), _))
-        .WillOnce(ListingOf({QStringLiteral("fs:/~0x01010001/oat.mif")}));
+    EXPECT_CALL(device, ListDirectory(u"fs:/~0x01010001"_s, _))
+        .WillOnce(ListingOf({u"fs:/~0x01010001/oat.mif"_s}));
     EXPECT_TRUE(framework.IsLoaded(&device));
 
     ::testing::InSequence order;
     QMap<QString, QString> env;
-    EXPECT_CALL(device, RemoveDirectory(QStringLiteral("fs:/usermods/oat/")));
-    EXPECT_CALL(device, RemoveDirectory(QStringLiteral("fs:/usermods/oatinterfaceext/")));
-    EXPECT_CALL(device, RemoveDirectory(QStringLiteral("fs:/usermods/oatresourceext/")));
+    EXPECT_CALL(device, RemoveDirectory(u"fs:/usermods/oat/"_s));
+    EXPECT_CALL(device, RemoveDirectory(u"fs:/usermods/oatinterfaceext/"_s));
+    EXPECT_CALL(device, RemoveDirectory(u"fs:/usermods/oatresourceext/"_s));
     framework.Unload(&device, env);
 }
 
@@ -230,35 +218,30 @@ for my $name (grep { /\.oat$/ } readdir($dh)) {
 }
 )perl";
 
-class OatPostProcess : public ::testing::Test
+class OatPostProcess : public moduletest::ModuleFolder
 {
 protected:
     void SetUp() override
     {
-        perlCache = dir.filePath(QStringLiteral("perl"));
-        logs = dir.filePath(QStringLiteral("logs"));
-        raw = logs + QStringLiteral("/oatRawLogs");
-        testutil::WriteFile(perlCache + QStringLiteral("/PostProcess3.pl"), kScript);
-        testutil::WriteFile(raw + QStringLiteral("/timer-2026.oat"), "@Timer\nModuleVer: 1\n");
-        log.SetLogPath(dir.filePath(QStringLiteral("log.txt")));
+        perlCache = dir.filePath(u"perl"_s);
+        logs = dir.filePath(u"logs"_s);
+        raw = logs + u"/oatRawLogs"_s;
+        testutil::WriteFile(perlCache + u"/PostProcess3.pl"_s, kScript);
+        testutil::WriteFile(raw + u"/timer-2026.oat"_s, "@Timer\nModuleVer: 1\n");
         module.SetLogger(&log);
-        module.moduleName = QStringLiteral("Timer");
-        module.AddDesktopLogFile(raw + QStringLiteral("/timer-2026.oat"));
-        env = {{QStringLiteral("PerlCache"), perlCache},
-               {QStringLiteral("TestRunID"), QStringLiteral("{r}")},
-               {QStringLiteral("OatRawLogPath"), raw},
-               {QStringLiteral("LogPath"), logs},
-               {QStringLiteral("DevicePack"), QStringLiteral("/kit/dp.xml")},
-               {QStringLiteral("DSOCacheFilePath"), QStringLiteral("/cache/dp.dso")},
-               {QStringLiteral("Platform"), QStringLiteral("/sdk/pvs/platform")}};
+        module.moduleName = u"Timer"_s;
+        module.AddDesktopLogFile(raw + u"/timer-2026.oat"_s);
+        env = {{u"PerlCache"_s, perlCache},
+               {u"TestRunID"_s, u"{r}"_s},
+               {u"OatRawLogPath"_s, raw},
+               {u"LogPath"_s, logs},
+               {u"DevicePack"_s, u"/kit/dp.xml"_s},
+               {u"DSOCacheFilePath"_s, u"/cache/dp.dso"_s},
+               {u"Platform"_s, u"/sdk/pvs/platform"_s}};
     }
-    QString LogText() { return QString::fromLatin1(testutil::ReadFile(dir.filePath(QStringLiteral("log.txt")))); }
-
-    QTemporaryDir dir;
     QString perlCache;
     QString logs;
     QString raw;
-    Log log;
     OatTestModule module;
     QMap<QString, QString> env;
 };
@@ -267,37 +250,36 @@ protected:
 
 TEST_F(OatPostProcess, RunsTheScriptAndCollectsItsOutput)
 {
-    if (!testutil::HaveProgram(QStringLiteral("perl")))
+    if (!testutil::HaveProgram(u"perl"_s))
         GTEST_SKIP() << "perl is not installed";
     module.PostProcess(env);
 
-    const QString output = logs + QStringLiteral("/timer-2026.oat.html");
+    const QString output = logs + u"/timer-2026.oat.html"_s;
     EXPECT_EQ(module.desktopLogFiles, QStringList{output});
     EXPECT_EQ(testutil::ReadFile(output),
               QByteArray("processed with /cache/dp.dso on /sdk/pvs/platform\n@Timer\n"
                          "GUID:{r}\nManifest Name:Timer\nID Hash:\nModuleVer: 1\n\n"));
-    EXPECT_FALSE(QFileInfo::exists(logs + QStringLiteral("/tempPPLogs")));
+    EXPECT_FALSE(QFileInfo::exists(logs + u"/tempPPLogs"_s));
     const QString text = LogText();
-    EXPECT_TRUE(text.contains(QStringLiteral("   Post Processing Oat")));
-    EXPECT_TRUE(text.contains(QStringLiteral("   Device Pack:/kit/dp.xml")));
-    EXPECT_TRUE(text.contains(QStringLiteral("args:") + raw + QStringLiteral("|") + logs
-                              + QStringLiteral("/tempPPLogs|/cache/dp.dso|/sdk/pvs/platform\n")));
-    EXPECT_TRUE(text.contains(QStringLiteral("cwd:") + QDir(perlCache).canonicalPath() + QStringLiteral("\n")));
-    EXPECT_TRUE(text.contains(QStringLiteral("   Copying temporary post process files to log directory.")));
+    EXPECT_TRUE(text.contains(u"   Post Processing Oat"_s));
+    EXPECT_TRUE(text.contains(u"   Device Pack:/kit/dp.xml"_s));
+    EXPECT_TRUE(text.contains(u"args:"_s + raw + u"|"_s + logs + u"/tempPPLogs|/cache/dp.dso|/sdk/pvs/platform\n"_s));
+    EXPECT_TRUE(text.contains(u"cwd:"_s + QDir(perlCache).canonicalPath() + u"\n"_s));
+    EXPECT_TRUE(text.contains(u"   Copying temporary post process files to log directory."_s));
 }
 
 TEST_F(OatPostProcess, FrameworkPostProcessCoversTheWholeRawFolder)
 {
-    if (!testutil::HaveProgram(QStringLiteral("perl")))
+    if (!testutil::HaveProgram(u"perl"_s))
         GTEST_SKIP() << "perl is not installed";
-    env.remove(QStringLiteral("OatRawLogPath"));
+    env.remove(u"OatRawLogPath"_s);
     _OatFramework framework;
     framework.SetLogger(&log);
     framework.PostProcess(env);
-    EXPECT_FALSE(env.contains(QStringLiteral("OatRawLogPath")));
-    EXPECT_TRUE(QFileInfo::exists(logs + QStringLiteral("/timer-2026.oat.html")));
+    EXPECT_FALSE(env.contains(u"OatRawLogPath"_s));
+    EXPECT_TRUE(QFileInfo::exists(logs + u"/timer-2026.oat.html"_s));
     // Reprocessing stamps nothing: the raw log is as it was.
-    EXPECT_EQ(testutil::ReadFile(raw + QStringLiteral("/timer-2026.oat")), QByteArray("@Timer\nModuleVer: 1\n"));
+    EXPECT_EQ(testutil::ReadFile(raw + u"/timer-2026.oat"_s), QByteArray("@Timer\nModuleVer: 1\n"));
 }
 
 struct MissingEntry {
@@ -311,14 +293,14 @@ class OatPostProcessMissing : public OatPostProcess, public ::testing::WithParam
 
 TEST_P(OatPostProcessMissing, StopsWithItsMessageAndKeepsTheRawLogs)
 {
-    if (!testutil::HaveProgram(QStringLiteral("perl")))
+    if (!testutil::HaveProgram(u"perl"_s))
         GTEST_SKIP() << "perl is not installed";
     env.remove(QLatin1String(GetParam().key));
     module.PostProcess(env);
     EXPECT_TRUE(LogText().contains(QLatin1String(GetParam().message))) << LogText().toStdString();
-    EXPECT_EQ(module.desktopLogFiles, QStringList{raw + QStringLiteral("/timer-2026.oat")});
-    EXPECT_FALSE(LogText().contains(QStringLiteral("args:")));
-    EXPECT_FALSE(QFileInfo::exists(logs + QStringLiteral("/tempPPLogs")));
+    EXPECT_EQ(module.desktopLogFiles, QStringList{raw + u"/timer-2026.oat"_s});
+    EXPECT_FALSE(LogText().contains(u"args:"_s));
+    EXPECT_FALSE(QFileInfo::exists(logs + u"/tempPPLogs"_s));
 }
 
 INSTANTIATE_TEST_SUITE_P(
@@ -330,13 +312,13 @@ INSTANTIATE_TEST_SUITE_P(
 
 TEST_F(OatPostProcess, WithoutScriptOrPerlOnlyStamps)
 {
-    env.insert(QStringLiteral("PerlCache"), dir.filePath(QStringLiteral("nowhere")));
+    env.insert(u"PerlCache"_s, dir.filePath(u"nowhere"_s));
     module.PostProcess(env);
     EXPECT_TRUE(LogText().isEmpty());
-    EXPECT_TRUE(testutil::ReadFile(raw + QStringLiteral("/timer-2026.oat")).contains("GUID:{r}"));
+    EXPECT_TRUE(testutil::ReadFile(raw + u"/timer-2026.oat"_s).contains("GUID:{r}"));
 
-    env.insert(QStringLiteral("PerlCache"), perlCache);
-    testutil::EnvGuard path("PATH", dir.filePath(QStringLiteral("empty")));
+    env.insert(u"PerlCache"_s, perlCache);
+    testutil::EnvGuard path("PATH", dir.filePath(u"empty"_s));
     module.PostProcess(env);
-    EXPECT_TRUE(LogText().contains(QStringLiteral(" Post Processing Failed.  A Perl Instance can not be found.")));
+    EXPECT_TRUE(LogText().contains(u" Post Processing Failed.  A Perl Instance can not be found."_s));
 }

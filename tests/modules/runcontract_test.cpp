@@ -20,6 +20,8 @@
 
 #include <gtest/gtest.h>
 
+using namespace Qt::StringLiterals;
+
 using ::testing::_;
 using ::testing::AnyNumber;
 using ::testing::DoAll;
@@ -30,7 +32,7 @@ using ::testing::SetArgReferee;
 
 namespace {
 
-const QString kStamp = QStringLiteral("-\\d{4}-\\d\\d-\\d\\d-\\d\\d-\\d\\d-\\d\\d\\.");
+const QString kStamp = u"-\\d{4}-\\d\\d-\\d\\d-\\d\\d-\\d\\d-\\d\\d\\."_s;
 
 // A CopyFileFromDevice action that writes content to the host path.
 auto CopiesContent(const QByteArray &content)
@@ -47,28 +49,15 @@ auto CopiesContent(const QByteArray &content)
 using moduletest::AppletWithId;
 using moduletest::Target;
 
-class RunContract : public ::testing::Test
+class RunContract : public moduletest::ModuleFolder
 {
 protected:
     void SetUp() override
     {
-        logPath = dir.filePath(QStringLiteral("log.txt"));
-        log.SetLogPath(logPath);
-        env.insert(QStringLiteral("LogPath"), dir.filePath(QStringLiteral("logs")));
-        env.insert(QStringLiteral("TestRunID"), QStringLiteral("{run-1}"));
-        QDir().mkpath(env.value(QStringLiteral("LogPath")));
+        env.insert(u"LogPath"_s, dir.filePath(u"logs"_s));
+        env.insert(u"TestRunID"_s, u"{run-1}"_s);
+        QDir().mkpath(env.value(u"LogPath"_s));
     }
-    QString LogText() { return QString::fromLatin1(testutil::ReadFile(logPath)); }
-    QString Write(const QString &name, const QByteArray &bytes)
-    {
-        const QString path = dir.filePath(name);
-        testutil::WriteFile(path, bytes);
-        return path;
-    }
-
-    QTemporaryDir dir;
-    QString logPath;
-    Log log;
     QMap<QString, QString> env;
     NiceMock<MockDevice> device;
 };
@@ -80,68 +69,68 @@ TEST_F(RunContract, CopyLogSkipsMalformedPathsAndStampsEveryDot)
     UTTestModule module;
     module.SetLogger(&log);
     module.applets << AppletWithId(0x10);
-    module.deviceDirectory = QStringLiteral("fs:/usermods/ut/");
-    module.desktopLogFiles << QStringLiteral("stale");
-    EXPECT_CALL(device, ListDirectory(QStringLiteral("fs:/usermods/ut/log"), _))
-        .WillRepeatedly(ListingOf({QStringLiteral("nodirectory.txt"), QStringLiteral("fs:/usermods/ut/log/run.1.xml"),
-                                   QStringLiteral("fs:/usermods/ut/log/broken.txt")}));
-    EXPECT_CALL(device, CopyFileFromDevice(QStringLiteral("fs:/usermods/ut/log/run.1.xml"), _))
+    module.deviceDirectory = u"fs:/usermods/ut/"_s;
+    module.desktopLogFiles << u"stale"_s;
+    EXPECT_CALL(device, ListDirectory(u"fs:/usermods/ut/log"_s, _))
+        .WillRepeatedly(ListingOf({u"nodirectory.txt"_s, u"fs:/usermods/ut/log/run.1.xml"_s,
+                                   u"fs:/usermods/ut/log/broken.txt"_s}));
+    EXPECT_CALL(device, CopyFileFromDevice(u"fs:/usermods/ut/log/run.1.xml"_s, _))
         .WillOnce(Invoke(CopiesContent("<TestRunLog/>")));
-    EXPECT_CALL(device, CopyFileFromDevice(QStringLiteral("fs:/usermods/ut/log/broken.txt"), _)).WillOnce(Return(5u));
+    EXPECT_CALL(device, CopyFileFromDevice(u"fs:/usermods/ut/log/broken.txt"_s, _)).WillOnce(Return(5u));
 
     ASSERT_TRUE(module.CopyLog(&device, env));
     ASSERT_EQ(module.desktopLogFiles.size(), 1);
     const QString copied = module.desktopLogFiles.first();
-    EXPECT_TRUE(QFileInfo(copied).fileName().contains(QRegularExpression(QStringLiteral("^run") + kStamp + QStringLiteral("1")
-                                                                         + kStamp + QStringLiteral("xml$"))))
+    EXPECT_TRUE(QFileInfo(copied).fileName().contains(QRegularExpression(u"^run"_s + kStamp + u"1"_s
+                                                                         + kStamp + u"xml$"_s)))
         << copied.toStdString();
-    EXPECT_EQ(QFileInfo(copied).absolutePath(), env.value(QStringLiteral("LogPath")));
+    EXPECT_EQ(QFileInfo(copied).absolutePath(), env.value(u"LogPath"_s));
     const QString text = LogText();
-    EXPECT_TRUE(text.contains(QStringLiteral("   Malformed source path nodirectory.txt\n")));
-    EXPECT_TRUE(text.contains(QStringLiteral("   Log fs:/usermods/ut/log/run.1.xml copied to ") + copied + QStringLiteral("\n")));
-    EXPECT_TRUE(text.contains(QStringLiteral("   Log fs:/usermods/ut/log/broken.txt not copied to ")));
+    EXPECT_TRUE(text.contains(u"   Malformed source path nodirectory.txt\n"_s));
+    EXPECT_TRUE(text.contains(u"   Log fs:/usermods/ut/log/run.1.xml copied to "_s + copied + u"\n"_s));
+    EXPECT_TRUE(text.contains(u"   Log fs:/usermods/ut/log/broken.txt not copied to "_s));
 }
 
 TEST_F(RunContract, KindsRenameTheirLogsOnTheHost)
 {
     CtfTestModule ctf;
-    ctf.moduleName = QStringLiteral("ITimer");
-    ctf.logPaths << QStringLiteral("fs:/usermods/CTF/CTF.log") << QStringLiteral("fs:/usermods/ctf/ctf.log");
+    ctf.moduleName = u"ITimer"_s;
+    ctf.logPaths << u"fs:/usermods/CTF/CTF.log"_s << u"fs:/usermods/ctf/ctf.log"_s;
     EXPECT_CALL(device, CopyFileFromDevice(_, _)).WillRepeatedly(Invoke(CopiesContent("x")));
     ASSERT_TRUE(ctf.CopyLog(&device, env));
     ASSERT_EQ(ctf.desktopLogFiles.size(), 2);
-    EXPECT_TRUE(QFileInfo(ctf.desktopLogFiles[0]).fileName().contains(QRegularExpression(QStringLiteral("^ITimer-CTF") + kStamp + QStringLiteral("log$"))));
-    EXPECT_TRUE(QFileInfo(ctf.desktopLogFiles[1]).fileName().contains(QRegularExpression(QStringLiteral("^ctf") + kStamp + QStringLiteral("log$"))));
+    EXPECT_TRUE(QFileInfo(ctf.desktopLogFiles[0]).fileName().contains(QRegularExpression(u"^ITimer-CTF"_s + kStamp + u"log$"_s)));
+    EXPECT_TRUE(QFileInfo(ctf.desktopLogFiles[1]).fileName().contains(QRegularExpression(u"^ctf"_s + kStamp + u"log$"_s)));
 
     CtfAppletTestModule applet;
     applet.applets << AppletWithId(0x20);
     EXPECT_CALL(device, FindModule(0x20u, _))
-        .WillRepeatedly(DoAll(SetArgReferee<1>(QStringLiteral("fs:/usermods/a/")), Return(0u)));
-    EXPECT_CALL(device, ListDirectory(QStringLiteral("fs:/usermods/a/"), _))
-        .WillRepeatedly(ListingOf({QStringLiteral("fs:/usermods/a/suite_K.LOG"), QStringLiteral("fs:/usermods/a/other_k.log"),
-                                   QStringLiteral("fs:/usermods/a/notes.txt")}));
+        .WillRepeatedly(DoAll(SetArgReferee<1>(u"fs:/usermods/a/"_s), Return(0u)));
+    EXPECT_CALL(device, ListDirectory(u"fs:/usermods/a/"_s, _))
+        .WillRepeatedly(ListingOf({u"fs:/usermods/a/suite_K.LOG"_s, u"fs:/usermods/a/other_k.log"_s,
+                                   u"fs:/usermods/a/notes.txt"_s}));
     ASSERT_TRUE(applet.CopyLog(&device, env));
     ASSERT_EQ(applet.desktopLogFiles.size(), 2);
     // "_K." passes the test but only the exact "_k." is replaced.
-    EXPECT_TRUE(QFileInfo(applet.desktopLogFiles[0]).fileName().startsWith(QStringLiteral("suite_K-")));
-    EXPECT_TRUE(QFileInfo(applet.desktopLogFiles[1]).fileName().contains(QRegularExpression(QStringLiteral("^other") + kStamp + QStringLiteral("log$"))));
+    EXPECT_TRUE(QFileInfo(applet.desktopLogFiles[0]).fileName().startsWith(u"suite_K-"_s));
+    EXPECT_TRUE(QFileInfo(applet.desktopLogFiles[1]).fileName().contains(QRegularExpression(u"^other"_s + kStamp + u"log$"_s)));
 }
 
 TEST_F(RunContract, RemoveTestFallsBackToTheNamedDirectory)
 {
     SecondaryModule module;
-    module.moduleName = QStringLiteral("helper");
-    module.secondaryModules << QStringLiteral("dep");
-    EXPECT_CALL(device, RemoveDirectory(QStringLiteral("fs:/usermods/helper"))).WillOnce(Return(0u));
-    EXPECT_CALL(device, RemoveDirectory(QStringLiteral("fs:/usermods/dep"))).WillOnce(Return(0u));
+    module.moduleName = u"helper"_s;
+    module.secondaryModules << u"dep"_s;
+    EXPECT_CALL(device, RemoveDirectory(u"fs:/usermods/helper"_s)).WillOnce(Return(0u));
+    EXPECT_CALL(device, RemoveDirectory(u"fs:/usermods/dep"_s)).WillOnce(Return(0u));
     EXPECT_FALSE(module.RemoveTest(&device));
 
     SecondaryModule byClass;
     byClass.classids << 7u;
     byClass.applets << AppletWithId(9);
     EXPECT_CALL(device, FindModule(7u, _)).WillOnce(Return(1u));
-    EXPECT_CALL(device, FindModule(9u, _)).WillOnce(DoAll(SetArgReferee<1>(QStringLiteral("fs:/usermods/nine/")), Return(0u)));
-    EXPECT_CALL(device, RemoveDirectory(QStringLiteral("fs:/usermods/nine/"))).WillOnce(Return(0u));
+    EXPECT_CALL(device, FindModule(9u, _)).WillOnce(DoAll(SetArgReferee<1>(u"fs:/usermods/nine/"_s), Return(0u)));
+    EXPECT_CALL(device, RemoveDirectory(u"fs:/usermods/nine/"_s)).WillOnce(Return(0u));
     EXPECT_TRUE(byClass.RemoveTest(&device));
 }
 
@@ -149,16 +138,16 @@ TEST_F(RunContract, InstallTestNeedsATargetForThePlatform)
 {
     SecondaryModule module;
     device.platform = IKestoDevice::PLATFORM_ARM;
-    module.targets.insert(QStringLiteral("t"), Target(QStringLiteral("/p.kestix"), IKestoDevice::PLATFORM_WIN32));
+    module.targets.insert(u"t"_s, Target(u"/p.kestix"_s, IKestoDevice::PLATFORM_WIN32));
     EXPECT_CALL(device, InstallPackage(_)).Times(0);
     EXPECT_FALSE(module.InstallTest(&device));
 
-    module.targets.insert(QStringLiteral("t"), Target(QStringLiteral("/p.kestix"), IKestoDevice::PLATFORM_ARM));
+    module.targets.insert(u"t"_s, Target(u"/p.kestix"_s, IKestoDevice::PLATFORM_ARM));
     ::testing::Mock::VerifyAndClearExpectations(&device);
-    EXPECT_CALL(device, InstallPackage(QStringLiteral("/p.kestix"))).WillOnce(Return(0u));
-    EXPECT_CALL(device, FindModule(0u, _)).WillOnce(DoAll(SetArgReferee<1>(QStringLiteral("fs:/usermods/h/")), Return(0u)));
+    EXPECT_CALL(device, InstallPackage(u"/p.kestix"_s)).WillOnce(Return(0u));
+    EXPECT_CALL(device, FindModule(0u, _)).WillOnce(DoAll(SetArgReferee<1>(u"fs:/usermods/h/"_s), Return(0u)));
     EXPECT_TRUE(module.InstallTest(&device));
-    EXPECT_EQ(module.deviceDirectory, QStringLiteral("fs:/usermods/h/"));
+    EXPECT_EQ(module.deviceDirectory, u"fs:/usermods/h/"_s);
     EXPECT_FALSE(module.Run(&device, env));
     EXPECT_TRUE(module.IsLogComplete(&device));
 }
@@ -166,11 +155,11 @@ TEST_F(RunContract, InstallTestNeedsATargetForThePlatform)
 TEST_F(RunContract, StampingPutsTheHeaderBeforeTheAnchorAndKeepsTheBytes)
 {
     CtfTestModule ctf;
-    ctf.moduleName = QStringLiteral("ITimer");
-    ctf.idHash = QStringLiteral("#42");
+    ctf.moduleName = u"ITimer"_s;
+    ctf.idHash = u"#42"_s;
     const QByteArray latin = "Suite: caf\xe9\r\n";
-    ctf.AddDesktopLogFile(Write(QStringLiteral("a.log"), latin + "Test: t1\nResult: pass\nTest: t2\n"));
-    ctf.AddDesktopLogFile(Write(QStringLiteral("b.log"), "no anchor"));
+    ctf.AddDesktopLogFile(Write(u"a.log"_s, latin + "Test: t1\nResult: pass\nTest: t2\n"));
+    ctf.AddDesktopLogFile(Write(u"b.log"_s, "no anchor"));
     ctf.PostProcess(env);
     EXPECT_EQ(testutil::ReadFile(ctf.desktopLogFiles[0]),
               latin + "GUID:{run-1}\nManifest Name:ITimer\nID Hash:#42\nTest: t1\nResult: pass\nTest: t2\n\n");
@@ -184,15 +173,15 @@ TEST_F(RunContract, StampingPutsTheHeaderBeforeTheAnchorAndKeepsTheBytes)
     EXPECT_TRUE(twice.endsWith("Test: t2\n\n\nGUID:{run-1}\nManifest Name:ITimer\nID Hash:#42\n"));
     TestResults results;
     ASSERT_TRUE(ctf.ParseLog(ctf.desktopLogFiles[0], results));
-    EXPECT_EQ(results.manifestName, QStringLiteral("ITimer"));
-    EXPECT_EQ(results.idHash, QStringLiteral("#42"));
+    EXPECT_EQ(results.manifestName, u"ITimer"_s);
+    EXPECT_EQ(results.idHash, u"#42"_s);
 }
 
 TEST_F(RunContract, OatStampsBeforeTheLastModuleVerLine)
 {
     OatTestModule oat;
-    oat.moduleName = QStringLiteral("Timer");
-    oat.AddDesktopLogFile(Write(QStringLiteral("t.oat"), "@Timer\nModuleVer: 1\nModuleVer: 2\nGUID:old\nModuleVer: 3\n"));
+    oat.moduleName = u"Timer"_s;
+    oat.AddDesktopLogFile(Write(u"t.oat"_s, "@Timer\nModuleVer: 1\nModuleVer: 2\nGUID:old\nModuleVer: 3\n"));
     oat.PostProcess(env); // no Perl cache: stamping only
     EXPECT_EQ(testutil::ReadFile(oat.desktopLogFiles[0]),
               QByteArray("@Timer\nModuleVer: 1\nGUID:{run-1}\nManifest Name:Timer\nID Hash:\nModuleVer: 2\nGUID:old\nModuleVer: 3\n\n"));
@@ -201,21 +190,21 @@ TEST_F(RunContract, OatStampsBeforeTheLastModuleVerLine)
 TEST_F(RunContract, UtStampsTextAfterTheFirstLineAndXmlOnTheRoot)
 {
     UTTestModule ut;
-    ut.moduleName = QStringLiteral("UTTimer");
-    ut.idHash = QStringLiteral("#5");
-    ut.AddDesktopLogFile(Write(QStringLiteral("r.TXT"), "first\nsecond\n"));
-    ut.AddDesktopLogFile(Write(QStringLiteral("r.xml"), "<TestRunLog guid='old'><case name='t1'/></TestRunLog>"));
-    ut.AddDesktopLogFile(Write(QStringLiteral("bad.xml"), "<TestRunLog>"));
+    ut.moduleName = u"UTTimer"_s;
+    ut.idHash = u"#5"_s;
+    ut.AddDesktopLogFile(Write(u"r.TXT"_s, "first\nsecond\n"));
+    ut.AddDesktopLogFile(Write(u"r.xml"_s, "<TestRunLog guid='old'><case name='t1'/></TestRunLog>"));
+    ut.AddDesktopLogFile(Write(u"bad.xml"_s, "<TestRunLog>"));
     ut.PostProcess(env);
     EXPECT_EQ(testutil::ReadFile(ut.desktopLogFiles[0]),
               QByteArray("first\nGUID:{run-1}\nManifest Name:UTTimer\nID Hash:#5\nsecond\n\n"));
     QDomDocument document;
     ASSERT_TRUE(document.setContent(testutil::ReadFile(ut.desktopLogFiles[1])));
     const QDomElement root = document.documentElement();
-    EXPECT_EQ(root.attribute(QStringLiteral("guid")), QStringLiteral("{run-1}"));
-    EXPECT_EQ(root.attribute(QStringLiteral("manifest_name")), QStringLiteral("UTTimer"));
-    EXPECT_EQ(root.attribute(QStringLiteral("id_hash")), QStringLiteral("#5"));
-    EXPECT_EQ(root.firstChildElement().attribute(QStringLiteral("name")), QStringLiteral("t1"));
+    EXPECT_EQ(root.attribute(u"guid"_s), u"{run-1}"_s);
+    EXPECT_EQ(root.attribute(u"manifest_name"_s), u"UTTimer"_s);
+    EXPECT_EQ(root.attribute(u"id_hash"_s), u"#5"_s);
+    EXPECT_EQ(root.firstChildElement().attribute(u"name"_s), u"t1"_s);
     EXPECT_EQ(testutil::ReadFile(ut.desktopLogFiles[2]), QByteArray("<TestRunLog>"));
 }
 
@@ -223,9 +212,9 @@ TEST_F(RunContract, LogWaitsGiveUpWhenTheEndMarkerNeverComes)
 {
     CtfTestModule ctf;
     ctf.SetLogger(&log);
-    ctf.logPaths << QStringLiteral("fs:/usermods/CTF/CTF.log");
+    ctf.logPaths << u"fs:/usermods/CTF/CTF.log"_s;
     int copies = 0;
-    EXPECT_CALL(device, CopyFileFromDevice(QStringLiteral("fs:/usermods/CTF/CTF.log"), _))
+    EXPECT_CALL(device, CopyFileFromDevice(u"fs:/usermods/CTF/CTF.log"_s, _))
         .WillRepeatedly(Invoke([&copies](const QString &, const QString &host) -> unsigned int {
             ++copies;
             return CopiesContent(QByteArray(copies, 'x'))(QString(), host);
@@ -236,9 +225,9 @@ TEST_F(RunContract, LogWaitsGiveUpWhenTheEndMarkerNeverComes)
     EXPECT_LT(copies, 330);
 
     OatTestModule oat;
-    oat.moduleName = QStringLiteral("OatTimer");
-    EXPECT_CALL(device, FileExists(QStringLiteral("fs:/shared/pek/log/timer_u.oat"))).WillRepeatedly(Return(true));
-    EXPECT_CALL(device, CopyFileFromDevice(QStringLiteral("fs:/shared/pek/log/timer_u.oat"), _))
+    oat.moduleName = u"OatTimer"_s;
+    EXPECT_CALL(device, FileExists(u"fs:/shared/pek/log/timer_u.oat"_s)).WillRepeatedly(Return(true));
+    EXPECT_CALL(device, CopyFileFromDevice(u"fs:/shared/pek/log/timer_u.oat"_s, _))
         .WillOnce(Return(1u))
         .WillOnce(Invoke(CopiesContent("@Timer\n")))
         .WillOnce(Invoke(CopiesContent("@Timer\nRESULT: done\n")));
@@ -248,7 +237,7 @@ TEST_F(RunContract, LogWaitsGiveUpWhenTheEndMarkerNeverComes)
 TEST_F(RunContract, ScratchCopiesArePrivateAndRemoved)
 {
     CtfTestModule ctf;
-    ctf.logPaths << QStringLiteral("fs:/usermods/CTF/CTF.log");
+    ctf.logPaths << u"fs:/usermods/CTF/CTF.log"_s;
     QStringList scratch;
     EXPECT_CALL(device, CopyFileFromDevice(_, _))
         .WillRepeatedly(Invoke([&scratch](const QString &, const QString &host) -> unsigned int {
@@ -260,7 +249,7 @@ TEST_F(RunContract, ScratchCopiesArePrivateAndRemoved)
     EXPECT_NE(scratch[0], scratch[1]);
     for (const QString &path : scratch) {
         EXPECT_FALSE(QFile::exists(path));
-        EXPECT_NE(QFileInfo(path).fileName(), QStringLiteral("foobar.txt"));
+        EXPECT_NE(QFileInfo(path).fileName(), u"foobar.txt"_s);
     }
 }
 
@@ -268,14 +257,14 @@ TEST_F(RunContract, UtCompletionNeedsBothMarkers)
 {
     UTTestModule ut;
     ut.applets << AppletWithId(0x30);
-    ut.deviceDirectory = QStringLiteral("fs:/usermods/ut/");
+    ut.deviceDirectory = u"fs:/usermods/ut/"_s;
     EXPECT_CALL(device, ListDirectory(_, _))
-        .WillRepeatedly(ListingOf({QStringLiteral("fs:/usermods/ut/log/r.txt"), QStringLiteral("fs:/usermods/ut/log/r.xml")}));
+        .WillRepeatedly(ListingOf({u"fs:/usermods/ut/log/r.txt"_s, u"fs:/usermods/ut/log/r.xml"_s}));
     int textCopies = 0;
-    EXPECT_CALL(device, CopyFileFromDevice(QStringLiteral("fs:/usermods/ut/log/r.xml"), _))
+    EXPECT_CALL(device, CopyFileFromDevice(u"fs:/usermods/ut/log/r.xml"_s, _))
         .WillOnce(Invoke(CopiesContent("<TestRunLog>")))
         .WillOnce(Invoke(CopiesContent("<TestRunLog></TestRunLog>")));
-    EXPECT_CALL(device, CopyFileFromDevice(QStringLiteral("fs:/usermods/ut/log/r.txt"), _))
+    EXPECT_CALL(device, CopyFileFromDevice(u"fs:/usermods/ut/log/r.txt"_s, _))
         .WillRepeatedly(Invoke([&textCopies](const QString &, const QString &host) {
             return CopiesContent(++textCopies < 4 ? "elapsed time: lower case\n" : "Elapsed Time: 1s\n")(QString(), host);
         }));
@@ -285,9 +274,9 @@ TEST_F(RunContract, UtCompletionNeedsBothMarkers)
     // A single log listed: nothing to wait for.
     UTTestModule single;
     single.applets << AppletWithId(0x31);
-    single.deviceDirectory = QStringLiteral("fs:/usermods/s/");
-    EXPECT_CALL(device, ListDirectory(QStringLiteral("fs:/usermods/s/log"), _))
-        .WillRepeatedly(ListingOf({QStringLiteral("fs:/usermods/s/log/r.txt"), QStringLiteral("fs:/usermods/s/log/core.bin")}));
+    single.deviceDirectory = u"fs:/usermods/s/"_s;
+    EXPECT_CALL(device, ListDirectory(u"fs:/usermods/s/log"_s, _))
+        .WillRepeatedly(ListingOf({u"fs:/usermods/s/log/r.txt"_s, u"fs:/usermods/s/log/core.bin"_s}));
     QStringList paths;
     EXPECT_TRUE(single.GetLogFilePaths(&device, paths));
     EXPECT_TRUE(paths.isEmpty());
@@ -300,7 +289,7 @@ TEST_F(RunContract, AppletsThatNeverStopTimeOut)
     applet.SetLogger(&log);
     EXPECT_FALSE(applet.Run(&device, env)); // no applets: nothing installed
     applet.applets << AppletWithId(0xff);
-    applet.targets.insert(QStringLiteral("t"), Target(QStringLiteral("/a.kestix"), IKestoDevice::PLATFORM_UNKNOWN));
+    applet.targets.insert(u"t"_s, Target(u"/a.kestix"_s, IKestoDevice::PLATFORM_UNKNOWN));
     EXPECT_CALL(device, InstallPackage(_)).WillRepeatedly(Return(0u));
     EXPECT_CALL(device, StartApplet(0xffu, QString())).WillOnce(Return(0u)).WillOnce(Return(3u));
     int polls = 0;
@@ -313,14 +302,14 @@ TEST_F(RunContract, AppletsThatNeverStopTimeOut)
 
     device.lastError = 255;
     EXPECT_FALSE(applet.Run(&device, env));
-    EXPECT_TRUE(LogText().contains(QStringLiteral("CtfAppletTestModule::Run error: 255(0x      ff)")));
+    EXPECT_TRUE(LogText().contains(u"CtfAppletTestModule::Run error: 255(0x      ff)"_s));
 }
 
 TEST_F(RunContract, CtfRunResetsTheLogAndStartsThePreferredProgram)
 {
     CtfTestModule ctf;
     ctf.SetLogger(&log);
-    ctf.moduleName = QStringLiteral("foo");
+    ctf.moduleName = u"foo"_s;
     for (const char *key : {"Bar", "Foo_k_main", "Baz"}) {
         SysResource program;
         program.type = 0x0102FAF7;
@@ -328,23 +317,23 @@ TEST_F(RunContract, CtfRunResetsTheLogAndStartsThePreferredProgram)
         program.SetProperty("Arguments", QByteArray("-v"));
         ctf.programs << program;
     }
-    EXPECT_EQ(ctf.ModuleName(), QStringLiteral("Foo_k_main"));
-    ctf.targets.insert(QStringLiteral("t"), Target(QStringLiteral("/c.kestix"), IKestoDevice::PLATFORM_UNKNOWN));
-    env.insert(QStringLiteral("DataCachePath"), dir.path());
+    EXPECT_EQ(ctf.ModuleName(), u"Foo_k_main"_s);
+    ctf.targets.insert(u"t"_s, Target(u"/c.kestix"_s, IKestoDevice::PLATFORM_UNKNOWN));
+    env.insert(u"DataCachePath"_s, dir.path());
 
-    EXPECT_CALL(device, CopyFileToDevice(QDir::cleanPath(dir.path()) + QStringLiteral("/CTF.log"),
-                                         QStringLiteral("fs:/usermods/CTF/CTF.log"))).WillRepeatedly(Return(0u));
+    EXPECT_CALL(device, CopyFileToDevice(QDir::cleanPath(dir.path()) + u"/CTF.log"_s,
+                                         u"fs:/usermods/CTF/CTF.log"_s)).WillRepeatedly(Return(0u));
     EXPECT_CALL(device, InstallPackage(_)).WillRepeatedly(Return(0u));
-    EXPECT_CALL(device, StartProgram(QStringLiteral("Foo_k_main"), QStringLiteral("-v")))
+    EXPECT_CALL(device, StartProgram(u"Foo_k_main"_s, u"-v"_s))
         .WillOnce(Return(0u))
         .WillOnce(Return(2u));
     EXPECT_CALL(device, IsProgramRunning(_)).WillRepeatedly(Return(true));
     EXPECT_TRUE(ctf.Run(&device, env)); // still running at the limit: true all the same
-    EXPECT_TRUE(QFile::exists(dir.filePath(QStringLiteral("CTF.log"))));
+    EXPECT_TRUE(QFile::exists(dir.filePath(u"CTF.log"_s)));
     device.lastError = 2;
     EXPECT_FALSE(ctf.Run(&device, env));
-    EXPECT_TRUE(LogText().contains(QStringLiteral("CtfTestModule::Run error: Foo_k_main 2(0x       2)")));
+    EXPECT_TRUE(LogText().contains(u"CtfTestModule::Run error: Foo_k_main 2(0x       2)"_s));
 
     ctf.programs.removeAt(1);
-    EXPECT_EQ(ctf.ModuleName(), QStringLiteral("Bar"));
+    EXPECT_EQ(ctf.ModuleName(), u"Bar"_s);
 }

@@ -8,6 +8,8 @@
 
 #include <gtest/gtest.h>
 
+using namespace Qt::StringLiterals;
+
 namespace {
 
 using resourcebytes::Hex;
@@ -22,68 +24,64 @@ bool HasConverter(quint16 format)
     return created;
 }
 
-TEST(KestoResources, NamesTheKnownTypesAndFormatsOthers)
+TEST(KestoResources, NamesTheKnownTypesAndFormats)
 {
     KestoResources resources;
-    EXPECT_EQ(resources.GetResourceTypeName(0x0001), QStringLiteral("Strings"));
-    EXPECT_EQ(resources.GetResourceTypeName(0x0006), QStringLiteral("Objects"));
-    EXPECT_EQ(resources.GetResourceTypeName(0x5000), QStringLiteral("Binaries"));
-    EXPECT_EQ(resources.GetResourceTypeName(0x6000), QStringLiteral("Sys Resource"));
-    EXPECT_EQ(resources.GetResourceTypeName(0x6001), QStringLiteral("Granted Priviledges"));
-    EXPECT_EQ(resources.GetResourceTypeName(0x6002), QStringLiteral("Required Priviledges"));
-    EXPECT_EQ(resources.GetResourceTypeName(0x6011), QStringLiteral("Priviledge Data"));
-    EXPECT_EQ(resources.GetResourceTypeName(7), QStringLiteral("Type: 7 (0x0007)"));
-    EXPECT_EQ(resources.GetResourceTypeName(4096), QStringLiteral("Type: 4096 (0x1000)"));
-    EXPECT_EQ(resources.GetResourceTypeName(0xBEEF), QStringLiteral("Type: 48879 (0xbeef)"));
-}
+    EXPECT_EQ(resources.GetResourceTypeName(0x0001), u"Strings"_s);
+    EXPECT_EQ(resources.GetResourceTypeName(0x0006), u"Objects"_s);
+    EXPECT_EQ(resources.GetResourceTypeName(0x5000), u"Binaries"_s);
+    EXPECT_EQ(resources.GetResourceTypeName(0x6000), u"Sys Resource"_s);
+    EXPECT_EQ(resources.GetResourceTypeName(0x6001), u"Granted Priviledges"_s);
+    EXPECT_EQ(resources.GetResourceTypeName(0x6002), u"Required Priviledges"_s);
+    EXPECT_EQ(resources.GetResourceTypeName(0x6011), u"Priviledge Data"_s);
+    EXPECT_EQ(resources.GetResourceTypeName(7), u"Type: 7 (0x0007)"_s);
+    EXPECT_EQ(resources.GetResourceTypeName(4096), u"Type: 4096 (0x1000)"_s);
+    EXPECT_EQ(resources.GetResourceTypeName(0xBEEF), u"Type: 48879 (0xbeef)"_s);
 
-TEST(KestoResources, ListsTheSevenFormats)
-{
-    KestoResources resources;
+    // The seven formats, as the encoding converters name them.
     QList<QPair<unsigned int, QString>> formats;
     ASSERT_EQ(resources.GetFormats(formats), 7u);
-    const char *names[] = {"Unicode", "ISOLATIN1", "KSC5601", "S-JIS", "GB2312", "CP949", "UTF-8"};
     for (int i = 0; i < 7; ++i) {
         EXPECT_EQ(formats[i].first, unsigned(i));
-        EXPECT_EQ(formats[i].second, QLatin1String(names[i]));
+        EXPECT_EQ(formats[i].second, QEncoding::Format2Name(static_cast<KestoEncodingFormat>(i)));
     }
-    EXPECT_EQ(resources.GetFormatName(6), QStringLiteral("UTF-8"));
+    EXPECT_EQ(resources.GetFormatName(6), u"UTF-8"_s);
     EXPECT_TRUE(resources.GetFormatName(7).isEmpty());
 }
 
 TEST(KestoResources, StoresStringsWithTheirMark)
 {
     KestoResources resources;
-    ASSERT_TRUE(resources.AddString(1, 6, 0, QStringLiteral("AB")));
+    ASSERT_TRUE(resources.AddString(1, 6, 0, u"AB"_s));
     QByteArray block;
     ASSERT_TRUE(resources.GetBinary(1, 6, block));
     EXPECT_EQ(block, Hex("FFFE41004200"));
-    EXPECT_EQ(resources.GetCompanyName(), QStringLiteral("AB"));
+    EXPECT_EQ(resources.GetCompanyName(), u"AB"_s);
 
-    ASSERT_TRUE(resources.AddString(1, 8, 6, QStringLiteral("1.0")));
+    ASSERT_TRUE(resources.AddString(1, 8, 6, u"1.0"_s));
     ASSERT_TRUE(resources.GetBinary(1, 8, block));
     EXPECT_EQ(block, Hex("02312E30"));
     quint16 format = 99;
     QString text;
     ASSERT_TRUE(resources.GetString(1, 8, &format, text));
     EXPECT_EQ(format, 6);
-    EXPECT_EQ(text, QStringLiteral("1.0"));
-    EXPECT_EQ(resources.GetApplicationVersion(), QStringLiteral("1.0"));
+    EXPECT_EQ(text, u"1.0"_s);
+    EXPECT_EQ(resources.GetApplicationVersion(), u"1.0"_s);
 
-    ASSERT_TRUE(resources.AddString(1, 7, 1, QStringLiteral("\u00a9 K")));
+    ASSERT_TRUE(resources.AddString(1, 7, 1, u"\u00a9 K"_s));
     ASSERT_TRUE(resources.GetBinary(1, 7, block));
     EXPECT_EQ(block, Hex("03A9204B"));
-    EXPECT_EQ(resources.GetCopyright(), QStringLiteral("\u00a9 K"));
+    EXPECT_EQ(resources.GetCopyright(), u"\u00a9 K"_s);
 
     // No converter for the format: an empty block, which reads as absent.
-    ASSERT_TRUE(resources.AddString(1, 9, 999, QStringLiteral("x")));
+    ASSERT_TRUE(resources.AddString(1, 9, 999, u"x"_s));
     EXPECT_FALSE(resources.GetBinary(1, 9, block));
     format = 42;
-    text = QStringLiteral("untouched");
+    text = u"untouched"_s;
     EXPECT_FALSE(resources.GetString(1, 9, &format, text));
     EXPECT_FALSE(resources.GetString(1, 99, &format, text));
     EXPECT_EQ(format, 42);
-    EXPECT_EQ(text, QStringLiteral("untouched"));
+    EXPECT_EQ(text, u"untouched"_s);
     EXPECT_TRUE(KestoResources().GetCompanyName().isEmpty());
     EXPECT_TRUE(resources.LastError().isEmpty());
 }
@@ -145,14 +143,14 @@ TEST_P(KestoStringFromIconv, DecodesTextEncodedElsewhere)
 {
     const IconvCase &c = GetParam();
     ASSERT_TRUE(HasConverter(c.format)) << "no converter for format " << c.format;
-    if (!testutil::HaveProgram(QStringLiteral("iconv")))
+    if (!testutil::HaveProgram(u"iconv"_s))
         GTEST_SKIP() << "iconv is not installed";
     const QString text = QString::fromUtf16(c.text);
     QTemporaryDir dir;
     testutil::WriteFile(dir.filePath("in.txt"), text.toUtf8());
     QByteArray encoded;
-    ASSERT_EQ(testutil::RunProgram(QStringLiteral("iconv"),
-                                   {QStringLiteral("-f"), QStringLiteral("UTF-8"), QStringLiteral("-t"),
+    ASSERT_EQ(testutil::RunProgram(u"iconv"_s,
+                                   {u"-f"_s, u"UTF-8"_s, u"-t"_s,
                                     QLatin1String(c.charset), dir.filePath("in.txt")},
                                    &encoded),
               0);
@@ -176,14 +174,14 @@ INSTANTIATE_TEST_SUITE_P(KestoResources, KestoStringFromIconv,
 TEST(KestoResources, MimeObjectsReadBackAndCorruptBlocksAreRefused)
 {
     KestoResources resources;
-    ASSERT_TRUE(resources.AddMimeObject(6, 1, QStringLiteral("image/png"), Hex("89504E47")));
+    ASSERT_TRUE(resources.AddMimeObject(6, 1, u"image/png"_s, Hex("89504E47")));
     QByteArray block;
     resources.GetBinary(6, 1, block);
     EXPECT_EQ(block, QByteArray("\x0a\x00image/png\x00\x00", 13) + Hex("89504E47"));
     QString mimeType;
     QByteArray data;
     ASSERT_TRUE(resources.GetMimeObject(6, 1, mimeType, data));
-    EXPECT_EQ(mimeType, QStringLiteral("image/png"));
+    EXPECT_EQ(mimeType, u"image/png"_s);
     EXPECT_EQ(data, Hex("89504E47"));
 
     const QString longest(128, QLatin1Char('m'));
@@ -197,9 +195,9 @@ TEST(KestoResources, MimeObjectsReadBackAndCorruptBlocksAreRefused)
     // A count byte larger than the block, and blocks too short to hold one.
     for (const QByteArray &corrupt : {Hex("FF00616263"), Hex("05"), Hex("0300616200")}) {
         resources.AddBinary(6, 4, corrupt);
-        mimeType = QStringLiteral("kept");
+        mimeType = u"kept"_s;
         EXPECT_FALSE(resources.GetMimeObject(6, 4, mimeType, data)) << corrupt.toHex().constData();
-        EXPECT_EQ(mimeType, QStringLiteral("kept"));
+        EXPECT_EQ(mimeType, u"kept"_s);
     }
     EXPECT_FALSE(resources.GetMimeObject(6, 99, mimeType, data));
 }
@@ -241,7 +239,7 @@ TEST(KestoResources, ReportsTheHeaderAndCopiesOwnTheirStream)
     EXPECT_EQ(offsetToEntries, 40u);
     EXPECT_EQ(offsetToResources, 48u);
     EXPECT_EQ(length, 5u);
-    EXPECT_TRUE(resources.Dump().startsWith(QStringLiteral("=== Header ===\n")));
+    EXPECT_TRUE(resources.Dump().startsWith(u"=== Header ===\n"_s));
 
     KestoResources copy(resources);
     copy.AddBinary(1, 2, "x");

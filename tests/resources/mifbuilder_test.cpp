@@ -3,6 +3,8 @@
 
 #include <gtest/gtest.h>
 
+using namespace Qt::StringLiterals;
+
 namespace {
 
 TEST(MifBuilder, WritesWhatTheModuleInformationQueriesReadBack)
@@ -11,9 +13,9 @@ TEST(MifBuilder, WritesWhatTheModuleInformationQueriesReadBack)
     mif.AddClass(0x0102F2AA);
     mif.AddClass(0x10203040);
     mif.AddApplet(0x0A0B0C0D, 3, 1200);
-    mif.AddProgram(QStringLiteral("ITimer_k"), QStringLiteral("-v -n 3"));
-    mif.AddProgram(QStringLiteral("abc"), QString(), SysResource::kTypeProgram);  // a key of four bytes with its NUL
-    mif.AddSuiteProgram(QStringLiteral("oat:suite:AudioSuite"));
+    mif.AddProgram(u"ITimer_k"_s, u"-v -n 3"_s);
+    mif.AddProgram(u"abc"_s, QString(), SysResource::kTypeProgram);  // a key of four bytes with its NUL
+    mif.AddSuiteProgram(u"oat:suite:AudioSuite"_s);
 
     KestoResources resources;
     ASSERT_TRUE(resources.LoadFrom(mif.Build()));
@@ -30,15 +32,15 @@ TEST(MifBuilder, WritesWhatTheModuleInformationQueriesReadBack)
     SysResource program;
     ASSERT_TRUE(resources.GetSysResource(1, program));
     EXPECT_TRUE(program.IsProgram());
-    EXPECT_EQ(program.Property("Key").toString(), QStringLiteral("ITimer_k"));
-    EXPECT_EQ(program.Property("Arguments").toString(), QStringLiteral("-v -n 3"));
+    EXPECT_EQ(program.Property("Key").toString(), u"ITimer_k"_s);
+    EXPECT_EQ(program.Property("Arguments").toString(), u"-v -n 3"_s);
     SysResource shortKey;
     ASSERT_TRUE(resources.GetSysResource(2, shortKey));
     EXPECT_EQ(shortKey.type, SysResource::kTypeProgram);
-    EXPECT_EQ(shortKey.Property("Key").toString(), QStringLiteral("abc"));
+    EXPECT_EQ(shortKey.Property("Key").toString(), u"abc"_s);
     SysResource suite;
     ASSERT_TRUE(resources.GetSysResource(3, suite));
-    EXPECT_EQ(suite.Property("Program Name").toString(), QStringLiteral("AudioSuite"));
+    EXPECT_EQ(suite.Property("Program Name").toString(), u"AudioSuite"_s);
 }
 
 TEST(MifBuilder, AnEmptyModuleStillHasItsHeader)

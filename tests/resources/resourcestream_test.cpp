@@ -13,6 +13,8 @@
 #include <algorithm>
 #include <initializer_list>
 
+using namespace Qt::StringLiterals;
+
 namespace {
 
 using testutil::ReadFile;
@@ -54,6 +56,29 @@ QByteArray RichFile()
                    "abc" "wxyz" "!", 5);
 }
 
+// 20 map entries of 20 IDs each over 20 blocks, the last of `tail` bytes:
+// 400 IDs in 276 + tail bytes, every range inside the blocks.
+QByteArray ManyRanges(int tail)
+{
+    constexpr int kEntries = 20;
+    const quint32 data = 32 + 8 * kEntries + 4 * (kEntries + 1);
+    QByteArray out;
+    out.append(char(17)).append(char(0));
+    U16(out, 1);
+    U16(out, 1);
+    U16(out, kEntries);
+    for (quint32 field : {32u, 8u * kEntries, 32u + 8 * kEntries, quint32(kEntries), data, quint32(tail)})
+        U32(out, field);
+    for (quint16 type = 1; type <= kEntries; ++type) {
+        for (quint16 field : {type, quint16(0), quint16(kEntries - 1), quint16(0)})
+            U16(out, field);
+    }
+    for (int i = 0; i < kEntries; ++i)
+        U32(out, data);
+    U32(out, data + quint32(tail));
+    return out + QByteArray(tail, 'z');
+}
+
 QByteArray Save(ResourceStream &stream)
 {
     QByteArray bytes;
@@ -81,8 +106,7 @@ TEST(ResourceStream, DumpShowsTheStructuresAsWritten)
     ResourceStream stream;
     stream.AddResource(1, 1, "hello");
     Save(stream);
-    const QString expected = QStringLiteral(
-        "=== Header ===\n"
+    const QString expected = u"=== Header ===\n"
         "   FileType:             17(0x      11)\n"
         "   Version:              1(0x       1)\n"
         "   Oldest Code Version:  1(0x       1)\n"
@@ -107,7 +131,7 @@ TEST(ResourceStream, DumpShowsTheStructuresAsWritten)
         "      Offset: 53 (0x      35)\n"
         "=== Resources ===\n"
         "   Number of: 1\n"
-        "    Resource: 5\n");
+        "    Resource: 5\n"_s;
     EXPECT_EQ(stream.Dump(), expected);
 }
 
@@ -215,7 +239,7 @@ TEST(ResourceStream, EmptiedTypeStaysListedAndIsNotWritten)
     EXPECT_TRUE(stream.GetResource(4, 1).isNull());
 }
 
-TEST(ResourceStream, SaveWithoutPathWritesBackToTheLoadedFile)
+TEST(ResourceStream, SaveWithoutPathWritesBackToTheLoadedFileAndFailuresLeaveFilesAlone)
 {
     QTemporaryDir dir;
     const QString path = dir.filePath("back.kar");
@@ -232,22 +256,17 @@ TEST(ResourceStream, SaveWithoutPathWritesBackToTheLoadedFile)
     ResourceStream check;
     ASSERT_TRUE(check.Load(path));
     EXPECT_EQ(check.GetResource(1, 2), QByteArray("two"));
-}
 
-TEST(ResourceStream, SaveFailuresLeaveTheFileAlone)
-{
-    QTemporaryDir dir;
-    const QString path = dir.filePath("keep.kar");
-    testutil::WriteFile(path, "old");
+    // Failures leave the file alone.
+    const QString keep = dir.filePath(u"keep.kar"_s);
+    testutil::WriteFile(keep, "old");
     ResourceStream empty;
-    EXPECT_FALSE(empty.Save(path));
+    EXPECT_FALSE(empty.Save(keep));
     QByteArray bytes("untouched");
     EXPECT_FALSE(empty.SaveTo(bytes));
     EXPECT_EQ(bytes, QByteArray("untouched"));
-    ResourceStream stream;
-    stream.AddResource(1, 1, "x");
     EXPECT_FALSE(stream.Save(dir.filePath("no/such/dir/x.kar")));
-    EXPECT_EQ(ReadFile(path), QByteArray("old"));
+    EXPECT_EQ(ReadFile(keep), QByteArray("old"));
     EXPECT_FALSE(stream.Load(dir.filePath("missing.kar")));
     EXPECT_FALSE(stream.Load(QString()));
 }
@@ -269,24 +288,6 @@ TEST(ResourceStream, At65535PairsSavesAndOneMoreIsRefused)
     QByteArray more("keep");
     EXPECT_FALSE(stream.SaveTo(more));
     EXPECT_EQ(more, QByteArray("keep"));
-}
-
-TEST(ResourceStream, CopiesAreIndependent)
-{
-    ResourceStream original;
-    original.AddResource(1, 1, "a");
-    Save(original);
-    ResourceStream copy(original);
-    copy.AddResource(1, 2, "b");
-    Save(copy);
-    EXPECT_TRUE(original.GetResource(1, 2).isNull());
-    EXPECT_EQ(original.GetResourceHeader()->resourceCount, 1u);
-    EXPECT_EQ(copy.GetResourceHeader()->resourceCount, 2u);
-    original = copy;
-    copy.Clear();
-    EXPECT_EQ(original.GetResource(1, 2), QByteArray("b"));
-    EXPECT_EQ(copy.GetResourceHeader()->offsetToMap, 32u);
-    EXPECT_EQ(copy.GetResourceHeader()->resourceCount, 0u);
 }
 
 // Corrupt inputs: each must load or fail without crashing, a failure must
@@ -320,9 +321,27 @@ INSTANTIATE_TEST_SUITE_P(
         CorruptCase{"OffsetPastInput", Compose({{1, 1, 0, 0}}, {48, 4000}, "x", 1)},
         CorruptCase{"OffsetIndexPastBlocks", Compose({{1, 1, 0, 1}}, {48, 49}, "x", 1)},
         CorruptCase{"RangePastBlocks", Compose({{5, 10, 3, 0}}, {52, 53, 55, 58}, "ABBCCC", 3)},
-        CorruptCase{"RangesCoverMoreIdsThanInputBytes",
-                    Compose({{1, 0, 65535, 0}, {2, 0, 65535, 0}}, {48, 49}, "x", 1)}),
+        CorruptCase{"RangesCoverMoreIdsThanInputBytes", ManyRanges(123)}),
     [](const ::testing::TestParamInfo<CorruptCase> &info) { return std::string(info.param.name); });
+
+TEST(ResourceStream, LoadsAsManyIdsAsInputBytesAndNoMore)
+{
+    ResourceStream stream;
+    ASSERT_TRUE(stream.LoadFrom(ManyRanges(124)));
+    QVector<ResourceEntry> entries;
+    EXPECT_EQ(stream.GetResources(entries), 400u);
+    EXPECT_EQ(stream.GetResource(20, 19), QByteArray(124, 'z'));
+}
+
+TEST(ResourceStream, ClearedStreamReadsAsNew)
+{
+    ResourceStream stream;
+    ASSERT_TRUE(stream.LoadFrom(RichFile()));
+    stream.Clear();
+    QVector<ResourceEntry> entries;
+    EXPECT_EQ(stream.GetResources(entries), 0u);
+    EXPECT_EQ(stream.Dump(), ResourceStream().Dump());
+}
 
 TEST(ResourceStream, EveryPrefixOfAValidFileFailsCleanly)
 {
