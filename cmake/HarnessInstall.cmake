@@ -1,5 +1,6 @@
 # Installation: the library with its SONAME links, the public headers, the
-# harness tool, the CMake package (Harness::Harness) and harness.pc.
+# harness tool, the CMake package (Harness::Harness) and harness.pc; and the
+# Debian package made from the same files (cpack, see ./run package).
 include(CMakePackageConfigHelpers)
 
 set(HARNESS_CMAKE_DIR ${CMAKE_INSTALL_LIBDIR}/cmake/Harness)
@@ -34,3 +35,29 @@ file(RELATIVE_PATH HARNESS_PC_TO_PREFIX /${CMAKE_INSTALL_LIBDIR}/pkgconfig /)
 string(REGEX REPLACE "/$" "" HARNESS_PC_TO_PREFIX "${HARNESS_PC_TO_PREFIX}")
 configure_file(${CMAKE_SOURCE_DIR}/cmake/harness.pc.in ${CMAKE_BINARY_DIR}/harness.pc @ONLY)
 install(FILES ${CMAKE_BINARY_DIR}/harness.pc DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig)
+
+set(CPACK_GENERATOR DEB)
+set(CPACK_PACKAGE_NAME harness)
+set(CPACK_PACKAGE_VENDOR "Harness")
+set(CPACK_PACKAGE_CONTACT "Harness developers <harness@localhost>")
+set(CPACK_PACKAGE_DESCRIPTION_SUMMARY
+    "Test runs on Kesto handsets: library, headers and the harness tool")
+set(CPACK_PACKAGE_DESCRIPTION
+    "Harness drives automated test runs of applications on (emulated) handsets of the Kesto
+mobile platform. This package holds the shared library, its headers, the CMake and
+pkg-config files to build against it, and the harness command-line tool.")
+set(CPACK_PACKAGING_INSTALL_PREFIX /usr)
+set(CPACK_DEBIAN_FILE_NAME DEB-DEFAULT)
+set(CPACK_DEBIAN_PACKAGE_SECTION devel)
+set(CPACK_STRIP_FILES ON)
+# The run-time dependencies (libqt6core6, libqt6xml6, the C++ run time) come
+# from the binaries; building against the headers needs Qt's own.
+set(CPACK_DEBIAN_PACKAGE_SHLIBDEPS ON)
+# A shlibs file for the library it ships, and ldconfig run on installation.
+set(CPACK_DEBIAN_PACKAGE_GENERATE_SHLIBS ON)
+set(CPACK_DEBIAN_PACKAGE_GENERATE_SHLIBS_POLICY ">=")
+configure_file(${CMAKE_SOURCE_DIR}/cmake/debian-triggers ${CMAKE_BINARY_DIR}/debian/triggers COPYONLY)
+set(CPACK_DEBIAN_PACKAGE_CONTROL_EXTRA ${CMAKE_BINARY_DIR}/debian/triggers)
+set(CPACK_DEBIAN_PACKAGE_RECOMMENDS "qt6-base-dev")
+set(CPACK_DEBIAN_PACKAGE_SUGGESTS "cmake, pkg-config")
+include(CPack)
