@@ -89,9 +89,12 @@ class HARNESS_EXPORT Tar
 public:
     Tar();
     ~Tar();
+    // Copies the file name, the entry list and the members added for
+    // writing; the copy starts closed.
     Tar(const Tar &other);
     Tar &operator=(const Tar &other);
 
+    // The archive's path, used by the next Open.
     void SetFileName(const QString &name);
     QString FileName() const;
 
@@ -109,8 +112,10 @@ public:
     QString ErrorString() const;
     // Closes the open file; the entry list stays.
     void Close();
+    // True while the archive file is open.
     bool IsOpen() const;
 
+    // The number of entries listed by the last successful Open.
     unsigned int EntryCount() const;
     // A copy of entry index, or a default entry when index is out of range.
     TarFileEntry Entry(unsigned int index) const;

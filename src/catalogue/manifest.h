@@ -31,16 +31,20 @@ public:
     // cache folder is created at once.
     Manifest(const QString &path, bool isPlatform);
     ~Manifest();
+    // Copies share the modules and frameworks of other.
     Manifest(const Manifest &other);
     Manifest &operator=(const Manifest &other);
 
+    // The message sink (not owned; null silences).
     void SetLogger(Log *logger);
+    // Writes message to the logger, echoed when flag is set.
     void LogMessage(const QString &message, bool flag);
 
     // "#" + the decimal string hash of the cleaned absolute kit path.
     QString RootHash();
     // Both give the full path of the cached "Manifest.xml".
     QString ManifestFilePath();
+    // See ManifestFilePath().
     QString ManifestCachePath();
 
     // Whether the cache file exists and carries format version 5 or later.
@@ -77,11 +81,17 @@ public:
     // "oat" OAT; any other suffix a null pointer.
     static QSharedPointer<_TestModule> CreateTestModuleFromLog(const QString &logPath);
 
+    // True for a platform's catalogue, false for a test kit's.
     bool isPlatform = false;
+    // The message sink; not owned.
     Log *logger = nullptr;
+    // The cleaned absolute path of the kit or platform.
     QString kitPath;
+    // The folder of the cached catalogue.
     QString cacheDirectory;
+    // The cached "Manifest.xml".
     QString cacheFile;
+    // See RootHash().
     QString rootHash;
     // Keyed by lower-cased module name.
     QMap<QString, QSharedPointer<_TestModule>> testModules;

@@ -31,14 +31,22 @@ public:
     _TestModule(const _TestModule &) = delete;
     _TestModule &operator=(const _TestModule &) = delete;
 
+    // The message sink (not owned; null silences).
     void SetLogger(Log *logger);
+    // Writes text to the logger, echoed when flag is set.
     void LogMessage(const QString &text, bool flag);
 
+    // The module's ID hash ("#" and its decimal value), as last computed or read.
     QString IDHash();
+    // The catalogue the module comes from: "KVK" (test kit) or "PVS" (platform).
     void SetSource(const QString &source);
+    // See SetSource().
     QString Source();
+    // The run option of the next run.
     void SetRunOption(const QString &option);
+    // The test cases the next run is limited to; empty runs all.
     void SetTestCases(const QStringList &testCases);
+    // Records a host copy of one of the module's logs.
     void AddDesktopLogFile(const QString &path);
 
     // Among the targets built for platform (in name order): the first whose
@@ -61,48 +69,74 @@ public:
     virtual bool RemoveTest(IKestoDevice *device);
     // Fills paths with the handset paths of the module's logs.
     virtual bool GetLogFilePaths(IKestoDevice *device, QStringList &paths) = 0;
+    // True once the module's log on the handset shows that the run has ended.
     virtual bool IsLogComplete(IKestoDevice *device) = 0;
     // Parses the copied logs in order and stops at the first one recognised;
     // false when none is.
     virtual bool ParseLog(TestResults &results);
+    // Parses one copied log into results; false when it is not a log of this kind.
     virtual bool ParseLog(const QString &hostPath, TestResults &results) = 0;
     // Copies the handset logs into env["LogPath"] under time-stamped names and
     // records them in desktopLogFiles; true when at least one was copied.
     virtual bool CopyLog(IKestoDevice *device, QMap<QString, QString> &env);
+    // Works on the copied logs before they are parsed (stamping them; OAT: its Perl script).
     virtual void PostProcess(QMap<QString, QString> &env) = 0;
     // Reads run-time facts from the module's package directory while a kit
     // is scanned.
     virtual bool ProcessPackage(const QString &directory);
+    // The name the module is started by on the handset.
     virtual QString ModuleName() = 0;
+    // The kind's description file name in a kit ("ctfmodule.xml", ...).
     virtual QString ModuleXMLName() = 0;
     // Reads a module description file of the kit. On failure the reason is in
     // errorText.
     virtual bool ProcessModuleXML(const QString &path);
+    // Reads the class IDs and applets of a module-information file.
     virtual bool ProcessModuleMIF(const QString &path) = 0;
     // Reads the module's manifest entry; true when it names the module.
     virtual bool ReadFromManifest(const QDomElement &element);
     // Writes the module's manifest entry (recomputing the ID hash first).
     virtual void WriteToManifest(QDomElement &element);
 
+    // False for modules that only come with others (secondary modules).
     bool selectable = true;
+    // The message sink; not owned.
     Log *logger = nullptr;
+    // The ID hash; see IDHash().
     QString idHash;
+    // "KVK" or "PVS"; see SetSource().
     QString source;
+    // The module's name in the catalogue.
     QString moduleName;
+    // The family and sub-family the module belongs to.
     QString family;
+    // See family.
     QString subFamily;
+    // Why reading the description file failed.
     QString errorText;
+    // The lowest platform version the module supports, as its description states it.
     QString minKestoVersion;
+    // See SetRunOption().
     QString runOption;
+    // The class IDs the module provides.
     QVector<unsigned int> classids;
+    // The applets the module provides.
     QVector<Applet> applets;
+    // The host copies of the module's logs from the last run.
     QStringList desktopLogFiles;
+    // The kit's base-line file of an OAT module; empty for other kinds.
     QString baseLineFile;
+    // The module's folder in the kit when it comes with its sources.
     QString sourcePath;
+    // The module's handset directory once installed.
     QString deviceDirectory;
+    // The test cases the module holds.
     QList<TestCase> testCases;
+    // See SetTestCases().
     QStringList selectedTestCases;
+    // The module's builds keyed by target name.
     QMap<QString, QSharedPointer<_CompilerVariant>> targets;
+    // Names of the secondary modules installed with it.
     QStringList secondaryModules;
 
 protected:
@@ -135,9 +169,10 @@ private:
     virtual unsigned int KestoID() = 0;
 
 public:
-    // The same entry as a light tree, as the catalogue cache is written and
-    // read. Declared after every other virtual operation, so that theirs
-    // keep their places in the table.
+    // WriteToManifest and ReadFromManifest on the same entry as a light tree,
+    // as the catalogue cache is written and read. Declared after every other
+    // virtual operation, so that theirs keep their places in the table.
     virtual void WriteToManifest(XmlNode &element);
+    // See WriteToManifest(XmlNode &).
     virtual bool ReadFromManifest(const XmlNode &element);
 };

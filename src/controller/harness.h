@@ -39,16 +39,20 @@ public:
     // Process-wide start and stop of the device library; they bracket all use
     // of every Harness.
     static bool Initialize();
+    // Ends what Initialize() started; no Harness may be used afterwards.
     static void Uninitialize();
     // Fill the list (cleared first) and return the number of entries.
     static unsigned int ListTargets(QList<ConnectTarget> &targets);
+    // The installed platforms (KESTIX_PLATFORMS_ALL).
     static unsigned int ListPlatforms(QList<Platform> &platforms);
+    // The installed test kits (KESTIX_TESTSETS_ALL).
     static unsigned int ListTestKits(QList<TestKit> &kits);
 
     // ---- Configuration ----
 
     // The message sink; not owned, null silences every message.
     void SetLogger(Log *logger);
+    // Writes message to the log, and to the console when echo is set.
     void LogMessage(const QString &message, bool echo);
 
     // When set, modules stay installed on the handset after the run.
@@ -57,6 +61,7 @@ public:
     // with the verdicts recorded for it in this run; not owned, null for
     // none.
     void SetRunObserver(RunObserver *observer);
+    // The run option handed to every module the run starts.
     void SetRunOption(const QString &option);
     // Milliseconds paused before copying a module's logs; text that is not an
     // unsigned 32-bit decimal number stores 0.
@@ -66,10 +71,12 @@ public:
     // A test kit path, part of a kit name, "*" for the default kit. Ignored
     // when empty or unchanged; a change drops the kit catalogue.
     void SetTestkit(const QString &testkit);
+    // The test kit: the setting, or the kit that set-up chose.
     QString GetTestkit() const;
     // A platform path, part of a platform name, "*" for the default platform.
     // Ignored when empty or unchanged; a change drops the platform catalogue.
     void SetPlatform(const QString &platform);
+    // The platform: the setting, or the platform that set-up chose.
     QString GetPlatform() const;
     // Host folder for copied logs; overrides the per-handset default.
     void SetLogOutputPath(const QString &path);
@@ -80,6 +87,8 @@ public:
     // once connected, else the one Process chose below the log folder;
     // empty before any of these.
     QString GetProcessedResultsPath() const;
+    // Restricts the next module the run starts to these test cases (the list
+    // is then dropped); empty runs every test case.
     void SetTestCases(const QStringList &testCases);
 
     // Takes a device pack: compiles it (once per source file and change) with
@@ -96,6 +105,7 @@ public:
     // Selects the handset by full or partial name. A new name drops an open
     // connection, so the next operation connects to the new handset.
     void SetTarget(const QString &name);
+    // The handset name as given to SetTarget.
     QString GetTarget() const;
     // True when at least one handset is reachable.
     bool IsTargetAvailable();
@@ -104,7 +114,9 @@ public:
     // empty target takes the first handset that connects). True at once
     // while connected. Failures are logged.
     bool ConnectToTarget(const QString &name);
+    // Connects to that handset; true at once while connected.
     bool ConnectToTarget(const ConnectTarget &target);
+    // Closes the handset connection, if any.
     void DisconnectTarget();
     // The name of the connected handset; empty while disconnected.
     QString ConnectedTarget() const;

@@ -48,6 +48,7 @@ public:
     // has no encoding.
     virtual bool UnicodeToChar(unsigned int unit, char *bytes) = 0;
 
+    // The most and the fewest bytes one character takes in the encoding.
     virtual unsigned int MaxCharSize() = 0;
     virtual unsigned int MinCharSize() = 0;
 

@@ -16,6 +16,7 @@ class HARNESS_EXPORT Platform
 {
 public:
     Platform();
+    // Records copy member by member.
     Platform(const Platform &other);
     Platform &operator=(const Platform &other);
 
@@ -29,9 +30,11 @@ public:
 class HARNESS_EXPORT TestKit
 {
 public:
+    // The kind of a test kit.
     enum KitType { USER_KIT = 0, TEST_KIT = 1, PVS_KIT = 2 };
 
     TestKit();
+    // Records copy member by member.
     TestKit(const TestKit &other);
     TestKit &operator=(const TestKit &other);
     ~TestKit();
@@ -41,7 +44,9 @@ public:
 
     QString name;             // the kit directory's name
     QString path;             // the cleaned path of the kit directory
+    // The kit's kind.
     KitType type = USER_KIT;
+    // Not used by the library; always false.
     bool reserved = false;
 };
 

@@ -19,15 +19,20 @@
 class HARNESS_EXPORT TestDirectories
 {
 public:
+    // The cache folder of the manifest named name.
     static QString GetManifestDirectory(const QString &name);
+    // The folder of compiled test data and device packs.
     static QString GetTestDataPath();
-    // Create the cache folder, not the file.
+    // The compiled test data name, as <name>.kar. Create the cache folder,
+    // not the file.
     static QString GetTestDataCacheFilePath(const QString &name);
+    // The flattened device pack name, as <name>.dso; creates its folder.
     static QString GetDSOCacheFilePath(const QString &name);
 
     // The handset's folder; the target name is percent-encoded into one safe
     // folder name ("My Phone:1" gives "My%20Phone%3A1").
     static QString GetTargetDirectory(const QString &target);
+    // The handset's log folder.
     static QString GetLogDirectory(const QString &target);
     // <log directory>/ProcessedResults/ProcessedResults.xml; creates the
     // folders, never the file.

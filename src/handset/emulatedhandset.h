@@ -65,11 +65,13 @@ public:
     EmulatedHandset(const ConnectTarget &target, const QString &folder);
     ~EmulatedHandset() override;
 
+    // Real time a behaviour script may run unless SetBehaviourTimeout says otherwise.
     static constexpr int kDefaultBehaviourTimeoutMs = 60000;
 
     // The settings file of the handset in folder.
     static QString SettingsPath(const QString &folder);
 
+    // The handset's host folder.
     const QString &Folder() const { return m_folder; }
     // True while the folder exists and holds no "offline" file; sets
     // connectionLost (for good) otherwise. Every operation and the check made
@@ -84,10 +86,16 @@ public:
     // Real time a behaviour script may run before it is killed.
     void SetBehaviourTimeout(int milliseconds) { m_behaviourTimeoutMs = milliseconds; }
 
+    // The "version" key of handset.ini.
     unsigned int GetPlatformVersion(QString &version) override;
+    // Runs the behaviour of the installed module holding a program record
+    // keyed program; HANDSET_ERROR_NOT_FOUND when no module has one.
     unsigned int StartProgram(const QString &program, const QString &arguments) override;
+    // Always false: a start call returns once its behaviour has ended.
     bool IsProgramRunning(const QString &program) override;
+    // Runs the behaviour of the installed module providing classId.
     unsigned int StartApplet(unsigned int classId, const QString &arguments) override;
+    // Always false, as IsProgramRunning.
     bool IsAppletRunning(unsigned int classId) override;
     // Lists the plain files (no links, no folders) of a directory, sorted by
     // name; each entry's fileName is its full handset path. On failure info
@@ -96,6 +104,7 @@ public:
                                QSharedPointer<_DirectoryInfo> &info) override;
     // Removes a directory and everything below it.
     unsigned int RemoveDirectory(const QString &directory) override;
+    // Removes a file of the handset.
     unsigned int DeleteFile(const QString &path) override;
     // Writes every regular member of a tar package below "fs:/usermods/"
     // (directory members become folders; links and other special members are

@@ -23,17 +23,20 @@ public:
     Log(const Log &) = delete;
     Log &operator=(const Log &) = delete;
 
+    // When set, every message is echoed to the console.
     void SetVerbose(bool verbose);
 
     // A non-empty path names the log file; an empty one "log.txt" in the
     // current directory. Does not open the file.
     void SetLogPath(const QString &path);
 
+    // Appends message to the log file; with echo (or verbose) prints it too.
     void LogMessage(const QString &message, bool echo);
 
     // Progress characters on the console while waiting for a handset: with
     // newLine, a line end and `indent` blanks first.
     void EchoDot(bool newLine, unsigned int indent);
+    // A "-" as EchoDot writes a ".".
     void EchoDash(bool newLine, unsigned int indent);
 
 private:

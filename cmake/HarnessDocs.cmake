@@ -1,0 +1,40 @@
+# The HTML reference of the public headers (target "docs", see ./run docs).
+# The headers are commented with "//"; a filter hands those comments to
+# Doxygen as documentation. Every undocumented public class or member is a
+# warning, collected in docs/warnings.txt of the build folder.
+find_package(Doxygen QUIET)
+if(NOT DOXYGEN_FOUND)
+  return()
+endif()
+
+set(DOXYGEN_PROJECT_NAME Harness)
+set(DOXYGEN_PROJECT_BRIEF "Test runs on Kesto handsets")
+set(DOXYGEN_OUTPUT_DIRECTORY ${CMAKE_BINARY_DIR}/docs)
+set(DOXYGEN_GENERATE_HTML YES)
+set(DOXYGEN_GENERATE_LATEX NO)
+set(DOXYGEN_GENERATE_MAN NO)
+set(DOXYGEN_EXTRACT_ALL NO)
+set(DOXYGEN_EXTRACT_PRIVATE NO)
+set(DOXYGEN_HIDE_UNDOC_MEMBERS NO)
+set(DOXYGEN_WARN_IF_UNDOCUMENTED YES)
+set(DOXYGEN_WARN_NO_PARAMDOC NO)
+set(DOXYGEN_WARN_LOGFILE ${CMAKE_BINARY_DIR}/docs/warnings.txt)
+set(DOXYGEN_QUIET YES)
+set(DOXYGEN_FULL_PATH_NAMES YES)
+set(DOXYGEN_STRIP_FROM_PATH ${CMAKE_SOURCE_DIR}/src)
+set(DOXYGEN_STRIP_FROM_INC_PATH ${CMAKE_SOURCE_DIR}/src)
+set(DOXYGEN_JAVADOC_AUTOBRIEF YES)
+set(DOXYGEN_MARKDOWN_SUPPORT YES)
+set(DOXYGEN_ENABLE_PREPROCESSING YES)
+set(DOXYGEN_MACRO_EXPANSION YES)
+set(DOXYGEN_EXPAND_ONLY_PREDEF YES)
+set(DOXYGEN_PREDEFINED HARNESS_EXPORT=)
+set(DOXYGEN_FILTER_PATTERNS "*.h=${CMAKE_SOURCE_DIR}/tools/doxygen-comments")
+set(DOXYGEN_USE_MDFILE_AS_MAINPAGE ${CMAKE_SOURCE_DIR}/docs/mainpage.md)
+
+set(HARNESS_DOC_INPUTS ${CMAKE_SOURCE_DIR}/docs/mainpage.md)
+foreach(header ${HARNESS_PUBLIC_HEADERS})
+  list(APPEND HARNESS_DOC_INPUTS ${CMAKE_SOURCE_DIR}/src/${header})
+endforeach()
+doxygen_add_docs(docs ${HARNESS_DOC_INPUTS}
+                 COMMENT "Writing the API reference into ${CMAKE_BINARY_DIR}/docs/html")
