@@ -35,3 +35,7 @@ QList<Command> DemoCommands();
 // Writes to standard output / standard error as UTF-8.
 void Out(const QString &text);
 void Err(const QString &text);
+
+// One line "command: message" on standard error; false, or ExitUsage.
+bool Fail(const QString &command, const QString &message);
+int Refuse(const QString &command, const QString &message);

@@ -20,6 +20,18 @@ void Err(const QString &text)
     std::fflush(stderr);
 }
 
+bool Fail(const QString &command, const QString &message)
+{
+    Err(command + QStringLiteral(": ") + message + QLatin1Char('\n'));
+    return false;
+}
+
+int Refuse(const QString &command, const QString &message)
+{
+    Fail(command, message);
+    return ExitUsage;
+}
+
 namespace {
 
 QList<Command> AllCommands()

@@ -38,18 +38,15 @@ int ProcessCommand(const QStringList &arguments)
     if (!ParseArguments(parser, arguments, status, 0, 0))
         return status;
     if (!parser.isSet(logDir) || !QFileInfo(parser.value(logDir)).isDir()) {
-        Err(command + QStringLiteral(": --log-dir must name a folder of saved logs\n"));
-        return ExitUsage;
+        return Refuse(command, QStringLiteral("--log-dir must name a folder of saved logs"));
     }
     const QString logs = QFileInfo(parser.value(logDir)).absoluteFilePath();
     if (!HasLogs(logs)) {
-        Err(command + QStringLiteral(": no logs (*.log, *.txt, *.oat) below %1\n").arg(logs));
-        return ExitUsage;
+        return Refuse(command, QStringLiteral("no logs (*.log, *.txt, *.oat) below %1").arg(logs));
     }
     QString error;
     if (parser.isSet(results) && !CheckOutputPath(parser.value(results), &error)) {
-        Err(command + QStringLiteral(": cannot write --results %1: %2\n").arg(parser.value(results), error));
-        return ExitUsage;
+        return Refuse(command, QStringLiteral("cannot write --results %1: %2").arg(parser.value(results), error));
     }
     if (!setup.Check(parser, command) || !CheckReportOutputs(parser, command))
         return ExitUsage;
@@ -70,8 +67,7 @@ int ProcessCommand(const QStringList &arguments)
     const QString resultsPath = harness.GetProcessedResultsPath();
     RunReport report;
     if (!report.Read(resultsPath, &error)) {
-        Err(command + QStringLiteral(": no log below %1 was recognised (%2)\n").arg(logs, error));
-        return ExitUsage;
+        return Refuse(command, QStringLiteral("no log below %1 was recognised (%2)").arg(logs, error));
     }
     report.DropNotExecuted();
     status = PublishReport(report, parser, false);

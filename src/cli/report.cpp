@@ -4,6 +4,12 @@
 
 #include "cli/commands.h"
 #include "cli/options.h"
+#include "cli/setup.h"
+
+#include "controller/harness.h"
+#include "controller/moduletimings.h"
+#include "controller/resultsmerge.h"
+#include "log/log.h"
 
 #include "common/xmlwriter.h"
 
@@ -414,35 +420,124 @@ int PublishReport(const RunReport &report, const QCommandLineParser &parser, boo
 
 namespace {
 
+// The rows of several processed-results files merged into one report; with
+// the selection given, its modules that no file shows run are listed too.
+bool MergeReport(const QStringList &paths, const QList<QSharedPointer<_TestModule>> *selection,
+                 const QString &saveTimings, const QString &command, RunReport &report)
+{
+    ResultsMerge merge;
+    for (const QString &path : paths) {
+        if (!merge.Add(path)) {
+            return Fail(command, merge.ErrorString());
+        }
+    }
+    if (selection)
+        merge.Expect(ResultsMerge::ExpectedOf(*selection));
+    QStringList handsets;
+    for (const ResultsMerge::Row &row : merge.Rows()) {
+        ModuleReport module;
+        module.name = row.name;
+        module.source = row.source;
+        module.family = row.family;
+        module.subFamily = row.subFamily;
+        module.host = row.host;
+        module.handset = row.handset;
+        if (!row.ran)
+            module.reason = QStringLiteral("not run by any shard");
+        for (const auto &testCase : row.testCases)
+            module.testCases.append({testCase.first, testCase.second, QString()});
+        if (!row.handset.isEmpty() && !handsets.contains(row.handset))
+            handsets.append(row.handset);
+        report.modules.append(module);
+    }
+    report.handsets = handsets;
+    if (!saveTimings.isEmpty()) {
+        ModuleTimings timings = merge.Timings();
+        if (!timings.Save(saveTimings)) {
+            return Fail(command, timings.ErrorString());
+        }
+    }
+    return true;
+}
+
 int ReportCommand(const QStringList &arguments)
 {
+    const QString command = arguments.at(0);
     QCommandLineParser parser;
     parser.setApplicationDescription(QStringLiteral(
         "Prints the summary of a processed-results file, the verdicts gathered there over every run, "
         "and exports it as JUnit XML or JSON.\n"
         "Modules without any executed test case are left out unless --all is given.\n"
-        "Exit status 1 when a test case failed."));
-    parser.addPositionalArgument(QStringLiteral("RESULTS.xml"), QStringLiteral("The processed-results file."));
+        "With --merge, merges the processed results of several hosts and handsets (each ran a shard of "
+        "one selection) into one row per module; with --expect-all, the modules of the selection that "
+        "no shard ran are listed as not run.\n"
+        "Exit status 1 when a test case failed or an expected module did not run."));
+    parser.addPositionalArgument(QStringLiteral("RESULTS.xml"), QStringLiteral("The processed-results file (with --merge, several)."),
+                                 QStringLiteral("RESULTS.xml..."));
     const QCommandLineOption all(QStringLiteral("all"), QStringLiteral("Include modules that never ran."));
-    parser.addOptions({JUnitOption(), JsonOption(), all});
+    const QCommandLineOption merge(QStringLiteral("merge"), QStringLiteral("Merge several processed-results files."));
+    const QCommandLineOption expectAll(QStringLiteral("expect-all"),
+                                       QStringLiteral("With --merge: list the selection's modules no file shows run "
+                                                      "(the selection of --kit, --platform, --family, --features and --pattern)."));
+    const QCommandLineOption pattern(QStringLiteral("pattern"), QStringLiteral("With --expect-all: a module name pattern of the selection."),
+                                     QStringLiteral("P"));
+    const QCommandLineOption saveTimings(QStringLiteral("save-timings"),
+                                         QStringLiteral("With --merge: write the recorded module times found beside the files to FILE."),
+                                         QStringLiteral("FILE"));
+    SetupOptions setup;
+    SelectionOptions selection;
+    setup.AddTo(parser);
+    selection.AddTo(parser);
+    parser.addOptions({JUnitOption(), JsonOption(), all, merge, expectAll, pattern, saveTimings});
     int status = ExitSuccess;
-    if (!ParseArguments(parser, arguments, status, 1, 1))
+    if (!ParseArguments(parser, arguments, status, 1, -1))
         return status;
-    if (!CheckReportOutputs(parser, arguments.at(0)))
+    if (!parser.isSet(merge)) {
+        for (const QCommandLineOption *option : {&expectAll, &pattern, &saveTimings}) {
+            if (parser.isSet(*option))
+                return Refuse(command, QStringLiteral("--%1 needs --merge").arg(option->names().constFirst()));
+        }
+        if (parser.positionalArguments().size() > 1)
+            return Refuse(command, QStringLiteral("one processed-results file, or several with --merge"));
+    }
+    if (!CheckReportOutputs(parser, command))
         return ExitUsage;
+    if (parser.isSet(saveTimings)) {
+        QString error;
+        if (!CheckOutputPath(parser.value(saveTimings), &error))
+            return Refuse(command, error);
+    }
 
     RunReport report;
-    QString error;
-    if (!report.Read(parser.positionalArguments().at(0), &error)) {
-        Err(QStringLiteral("%1: %2\n").arg(arguments.at(0), error));
-        return ExitUsage;
+    if (parser.isSet(merge)) {
+        QList<QSharedPointer<_TestModule>> modules;
+        if (parser.isSet(expectAll)) {
+            if (!setup.Check(parser, command) || !selection.Check(parser, command))
+                return ExitUsage;
+            Harness harness;
+            Log log;
+            setup.Apply(parser, harness, log);
+            const QStringList patterns = parser.values(pattern);
+            const EchoToStandardError quiet(true);
+            if (!selection.Select(harness, parser, command, modules, &patterns))
+                return ExitUsage;
+        }
+        if (!MergeReport(parser.positionalArguments(), parser.isSet(expectAll) ? &modules : nullptr,
+                         parser.value(saveTimings), command, report))
+            return ExitUsage;
+    } else {
+        QString error;
+        if (!report.Read(parser.positionalArguments().at(0), &error)) {
+            Err(QStringLiteral("%1: %2\n").arg(command, error));
+            return ExitUsage;
+        }
+        if (!parser.isSet(all))
+            report.DropNotExecuted();
     }
-    if (!parser.isSet(all))
-        report.DropNotExecuted();
-    const int published = PublishReport(report, parser, false);
+    const int published = PublishReport(report, parser, parser.isSet(merge));
     if (published != ExitSuccess)
         return published;
-    return report.Total(kFail) > 0 ? ExitTestFailed : ExitSuccess;
+    return report.Total(kFail) > 0 || report.NotFinished() > 0 ? ExitTestFailed : ExitSuccess;
 }
 
 } // namespace

@@ -6,6 +6,7 @@
 #include "cli/options.h"
 #include "cli/report.h"
 #include "cli/setup.h"
+#include "cli/shardoptions.h"
 
 #include "catalogue/testcase.h"
 #include "catalogue/testmodule.h"
@@ -75,18 +76,6 @@ private:
     struct sigaction m_savedInt = {};
     struct sigaction m_savedTerm = {};
 };
-
-bool Fail(const QString &command, const QString &message)
-{
-    Err(command + QStringLiteral(": ") + message + QLatin1Char('\n'));
-    return false;
-}
-
-int Refuse(const QString &command, const QString &message)
-{
-    Fail(command, message);
-    return ExitUsage;
-}
 
 // The handsets the options name, by full name. An exact name wins; a text
 // that is part of several names or descriptions is an error listing them.
@@ -242,8 +231,10 @@ int RunCommand(const QStringList &arguments)
         "2 bad usage or a set-up failure (found before anything runs), 130 stopped by a signal."));
     SetupOptions setup;
     SelectionOptions selection;
+    ShardOptions shard;
     setup.AddTo(parser);
     selection.AddTo(parser);
+    shard.AddTo(parser);
     const QCommandLineOption target(QStringLiteral("target"), QStringLiteral("The handset: its name, or a part of one handset's name or description; several times to share the run."), QStringLiteral("T"));
     const QCommandLineOption testData(QStringLiteral("test-data"), QStringLiteral("Resource source of the test data to push."), QStringLiteral("FILE"));
     const QCommandLineOption dpk(QStringLiteral("dpk"), QStringLiteral("Device pack (default: the platform's)."), QStringLiteral("FILE"));
@@ -281,6 +272,26 @@ int RunCommand(const QStringList &arguments)
     if (parser.isSet(logDir) && !QDir().mkpath(parser.value(logDir)))
         return Refuse(command, QStringLiteral("cannot create the log folder %1").arg(parser.value(logDir)));
 
+    // The selection comes first: it needs the catalogues, not a handset, so
+    // a shard plan is printed without touching one. The Harness that makes
+    // it runs on the first handset.
+    Log log;
+    const EchoToStandardError echo;
+    std::vector<std::unique_ptr<Harness>> harnesses;
+    harnesses.push_back(std::make_unique<Harness>());
+    setup.Apply(parser, *harnesses.front(), log);
+    QList<QSharedPointer<_TestModule>> modules;
+    {
+        const EchoToStandardError quiet(true);
+        if (!selection.Select(*harnesses.front(), parser, command, modules))
+            return ExitUsage;
+    }
+    if (modules.isEmpty())
+        return Refuse(command, QStringLiteral("no test module selected (see 'harness modules')"));
+    // This host's shard of the selection, or the plan of every shard.
+    if (const int shardStatus = shard.Apply(parser, command, modules); shardStatus >= 0)
+        return shardStatus;
+
     QStringList names;
     if (!ResolveTargets(parser.values(target), parser.isSet(allTargets), command, names))
         return ExitUsage;
@@ -297,14 +308,13 @@ int RunCommand(const QStringList &arguments)
             return ExitUsage;
     }
 
-    Log log;
-    const EchoToStandardError echo;
-    std::vector<std::unique_ptr<Harness>> harnesses;
     QMap<QString, QString> logFolders;
     for (const QString &name : std::as_const(names)) {
-        harnesses.push_back(std::make_unique<Harness>());
+        if (name != names.constFirst()) {
+            harnesses.push_back(std::make_unique<Harness>());
+            setup.Apply(parser, *harnesses.back(), log);
+        }
         Harness &harness = *harnesses.back();
-        setup.Apply(parser, harness, log);
         harness.SetTarget(name);
         QString folder = TestDirectories::GetLogDirectory(name);
         if (parser.isSet(logDir)) {
@@ -323,14 +333,6 @@ int RunCommand(const QStringList &arguments)
             harness.SetCopyDelay(parser.value(copyDelay));
     }
 
-    QList<QSharedPointer<_TestModule>> modules;
-    {
-        const EchoToStandardError quiet(true);
-        if (!selection.Select(*harnesses.front(), parser, command, modules))
-            return ExitUsage;
-    }
-    if (modules.isEmpty())
-        return Refuse(command, QStringLiteral("no test module selected (see 'harness modules')"));
 
     // The history of each handset: needed by --retry, and a damaged one is
     // said out loud.

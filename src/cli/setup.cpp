@@ -20,12 +20,6 @@
 
 namespace {
 
-bool Fail(const QString &command, const QString &message)
-{
-    Err(command + QStringLiteral(": ") + message + QLatin1Char('\n'));
-    return false;
-}
-
 // A path, or part of the name of one of the entries.
 template<typename Record>
 bool Names(const QString &request, const QList<Record> &records)
@@ -111,7 +105,7 @@ bool SelectionOptions::Check(const QCommandLineParser &parser, const QString &co
 }
 
 bool SelectionOptions::Select(Harness &harness, const QCommandLineParser &parser, const QString &command,
-                              QList<QSharedPointer<_TestModule>> &modules) const
+                              QList<QSharedPointer<_TestModule>> &modules, const QStringList *givenPatterns) const
 {
     modules.clear();
     if (parser.isSet(features)) {
@@ -131,7 +125,7 @@ bool SelectionOptions::Select(Harness &harness, const QCommandLineParser &parser
         where = QStringLiteral(" in family '%1'").arg(wantedFamily)
                 + (parser.isSet(subFamily) ? QStringLiteral(", sub-family '%1'").arg(wantedSubFamily) : QString());
 
-    QStringList patterns = parser.positionalArguments();
+    QStringList patterns = givenPatterns ? *givenPatterns : parser.positionalArguments();
     if (patterns.isEmpty())
         patterns.append(QString());
     QSet<QString> seen;

@@ -44,9 +44,10 @@ struct SelectionOptions
     bool Check(const QCommandLineParser &parser, const QString &command) const;
     // The selected modules. Every pattern must match a module of the
     // family asked for, and a feature list or a family alone must select
-    // one; false after one line on standard error otherwise.
+    // one; false after one line on standard error otherwise. The patterns
+    // are the positional arguments unless given.
     bool Select(Harness &harness, const QCommandLineParser &parser, const QString &command,
-                QList<QSharedPointer<_TestModule>> &modules) const;
+                QList<QSharedPointer<_TestModule>> &modules, const QStringList *patterns = nullptr) const;
 };
 
 // While alive, the library's console echo goes to standard error, so that

@@ -15,8 +15,7 @@ int ShardOptions::Apply(const QCommandLineParser &parser, const QString &command
     QString error;
     const bool planOnly = parser.isSet(plan);
     if (!ShardSetting::Resolve(parser.value(index), parser.value(count), environment, !planOnly, &setting, &error)) {
-        Err(command + QStringLiteral(": ") + error + QLatin1Char('\n'));
-        return ExitUsage;
+        return Refuse(command, error);
     }
     if (!setting.sharded && !planOnly)
         return -1;
@@ -26,8 +25,7 @@ int ShardOptions::Apply(const QCommandLineParser &parser, const QString &command
     ModuleTimings recorded;
     for (const QString &path : parser.values(timings)) {
         if (!recorded.Merge(path)) {
-            Err(command + QStringLiteral(": ") + recorded.ErrorString() + QLatin1Char('\n'));
-            return ExitUsage;
+            return Refuse(command, recorded.ErrorString());
         }
     }
     QList<ShardPlan::Module> selection;
@@ -41,8 +39,7 @@ int ShardOptions::Apply(const QCommandLineParser &parser, const QString &command
     }
 
     if (!setting.TouchStatusFile(&error)) {
-        Err(command + QStringLiteral(": ") + error + QLatin1Char('\n'));
-        return ExitUsage;
+        return Refuse(command, error);
     }
     QSet<QString> mine;
     for (const ShardPlan::Entry &entry : shards.Shard(setting.index))

@@ -33,8 +33,12 @@ QString Stamp(const QDateTime &at)
 
 QString ModuleTimings::PathFor(const QString &target)
 {
-    return QFileInfo(TestDirectories::GetProcessResultsPath(target)).absolutePath()
-        + QStringLiteral("/Timings.json");
+    return PathBeside(TestDirectories::GetProcessResultsPath(target));
+}
+
+QString ModuleTimings::PathBeside(const QString &resultsPath)
+{
+    return QFileInfo(resultsPath).absolutePath() + QStringLiteral("/Timings.json");
 }
 
 QString ModuleTimings::Key(const QString &name, const QString &source)

@@ -40,6 +40,8 @@ public:
 
     // "Timings.json" in the folder of the handset's processed results.
     static QString PathFor(const QString &target);
+    // "Timings.json" beside a processed-results file.
+    static QString PathBeside(const QString &resultsPath);
 
     // Replaces the content with the file's. A file that cannot be read, is
     // not JSON or is not a timings file (another format, a newer version, a

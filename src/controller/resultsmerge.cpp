@@ -128,7 +128,7 @@ bool ResultsMerge::Add(const QString &path, const QString &handset, const QStrin
     }
 
     ModuleTimings timings;
-    const QString timingsPath = QFileInfo(path).absolutePath() + QStringLiteral("/Timings.json");
+    const QString timingsPath = ModuleTimings::PathBeside(path);
     if (QFileInfo::exists(timingsPath) && !timings.Read(timingsPath)) {
         m_error = timings.ErrorString();
         return false;

@@ -6,9 +6,11 @@
 #include "catalogue/testmodule.h"
 #include "common/clock.h"
 #include "controller/harness.h"
+#include "controller/moduletimings.h"
 #include "log/log.h"
 
 #include <QHash>
+#include <QSysInfo>
 #include <QSet>
 
 #include <condition_variable>
@@ -169,7 +171,21 @@ public:
         m_record = ModuleRecord();
     }
 
-    void ModuleEnded(const ModuleRecord &record) override { m_record = record; }
+    void ModuleEnded(const ModuleRecord &record) override
+    {
+        m_record = record;
+        // The wall time of every module that ran to its verdicts is kept
+        // beside the handset's processed results, to balance later shards.
+        if (record.outcome != ModuleSource::Recorded)
+            return;
+        const QString path = ModuleTimings::PathBeside(m_harness.GetProcessedResultsPath());
+        QString error;
+        if (!ModuleTimings::Record(path, record.name, record.source,
+                                   {record.durationMs, record.handset, QSysInfo::machineHostName(),
+                                    QDateTime::currentDateTimeUtc()},
+                                   &error))
+            m_run.LogMessage(QStringLiteral("Warning: the time of %1 could not be recorded: %2\n").arg(record.name, error));
+    }
 
     bool KeepFrameworks() const override { return true; }
 

@@ -20,6 +20,8 @@
 
 #include <csignal>
 
+using namespace Qt::StringLiterals;
+
 namespace {
 
 // A fresh demo environment per test, and the tool run against it.
@@ -405,6 +407,52 @@ TEST_F(DemoRun, SharedRunsNameTheHandsetOfEachModule)
     EXPECT_EQ(rows.size(), 6);
     EXPECT_TRUE(r.out.contains("Handset demo-phone2 dropped out at ")) << r.out.constData();
     EXPECT_TRUE(r.out.contains("Handset demo-phone3 could not be connected"));
+}
+
+TEST_F(DemoRun, ShardsOfOneSelectionMergeIntoTheVerdictsOfOneRun)
+{
+    // The plan touches no handset.
+    const ToolResult plan = Tool({u"run"_s, u"--plan"_s, u"--shard-count"_s, u"2"_s});
+    EXPECT_EQ(plan.status, 0) << plan.err.constData();
+    EXPECT_TRUE(plan.out.contains("Shard 0 of 2") && plan.out.contains("Shard 1 of 2")) << plan.out.constData();
+    EXPECT_FALSE(QFile::exists(results));
+    EXPECT_EQ(Tool({u"run"_s, u"--shard-index"_s, u"2"_s, u"--shard-count"_s, u"2"_s}).status, 2);
+
+    // Shard 0 as Bazel starts it, shard 1 by option on another handset.
+    AddHandset(u"other-phone"_s);
+    const QString status = dir.filePath(u"shard-status"_s);
+    QProcessEnvironment bazel = env;
+    bazel.insert(u"TEST_SHARD_INDEX"_s, u"0"_s);
+    bazel.insert(u"TEST_TOTAL_SHARDS"_s, u"2"_s);
+    bazel.insert(u"TEST_SHARD_STATUS_FILE"_s, status);
+    const ToolResult first = RunTool(WithLog({u"run"_s, u"--target"_s, u"demo-phone"_s, u"--test-data"_s, testData}), bazel, dir.path());
+    EXPECT_LE(first.status, 1) << first.err.constData();
+    EXPECT_TRUE(QFile::exists(status));
+    const ToolResult second = Tool({u"run"_s, u"--target"_s, u"other-phone"_s, u"--test-data"_s, testData,
+                                    u"--shard-index"_s, u"1"_s, u"--shard-count"_s, u"2"_s});
+    EXPECT_LE(second.status, 1) << second.err.constData();
+    EXPECT_EQ(Rows(first.out).size() + Rows(second.out).size(), 6);
+
+    const QString otherResults = targets + u"/other-phone/Logs/ProcessedResults/ProcessedResults.xml"_s;
+    const QString timings = dir.filePath(u"timings.json"_s);
+    const ToolResult merged = Tool({u"report"_s, u"--merge"_s, results, otherResults, u"--expect-all"_s,
+                                    u"--save-timings"_s, timings});
+    EXPECT_EQ(merged.status, 1) << merged.err.constData();  // the demo's failures
+    const QMap<QString, QString> rows = Rows(merged.out);
+    EXPECT_EQ(rows.size(), 6) << merged.out.constData();
+    EXPECT_EQ(rows.value(u"ITimer"_s).section(u' ', 1), u"3 1 1 0"_s);
+    EXPECT_EQ(rows.value(u"OatAudio"_s).section(u' ', 1), u"2 1 1 0"_s);
+    EXPECT_EQ(rows.value(u"PlatformVersion"_s).section(u' ', 1), u"2 0 0 0"_s);
+    // Each shard's module times came along, and plan the next split.
+    const ToolResult balanced = Tool({u"run"_s, u"--plan"_s, u"--shard-count"_s, u"2"_s, u"--timings"_s, timings});
+    EXPECT_EQ(balanced.status, 0) << balanced.err.constData();
+    EXPECT_TRUE(balanced.out.contains(" ms")) << balanced.out.constData();
+
+    // A shard that never reported leaves its modules not run.
+    const ToolResult half = Tool({u"report"_s, u"--merge"_s, results, u"--expect-all"_s});
+    EXPECT_EQ(half.status, 1);
+    EXPECT_EQ(Rows(half.out).size(), 6) << half.out.constData();
+    EXPECT_TRUE(half.out.contains("not run by any shard")) << half.out.constData();
 }
 
 } // namespace

@@ -3,6 +3,7 @@
 
 #include "controllertest.h"
 
+#include "controller/moduletimings.h"
 #include "controller/shardedrun.h"
 #include "environment/testdirectories.h"
 #include "support/handsetfixture.h"
@@ -159,6 +160,13 @@ TEST_F(ShardedRunTest, FourHandsetsShareTheQueueAndMatchAOneHandsetRun)
     }
     EXPECT_EQ(total, selection.size());
     EXPECT_TRUE(run.NotRun().isEmpty());
+    // Each module's wall time was recorded beside the results of its handset.
+    for (const ShardedRun::ModuleResult &module : modules) {
+        ModuleTimings timings;
+        ASSERT_TRUE(timings.Read(ModuleTimings::PathFor(module.handset))) << timings.ErrorString().toStdString();
+        EXPECT_EQ(timings.Runs(module.name, module.source).size(), 1) << module.name.toStdString();
+        EXPECT_EQ(timings.ExpectedMs(module.name, module.source), module.record.durationMs);
+    }
     // Every worker closed the connection it opened.
     for (const std::unique_ptr<Harness> &harness : m_harnesses)
         EXPECT_TRUE(harness->ConnectedTarget().isEmpty());
