@@ -3,7 +3,7 @@
 // Helpers shared by the module kind tests.
 
 #include "catalogue/compilervariant.h"
-#include "modules/testresults.h"
+#include "catalogue/testresults.h"
 #include "resources/mif.h"
 
 #include <QFileInfo>

@@ -3,6 +3,7 @@
 #include "archive/tar.h"
 #include "common/handsetpath.h"
 #include "device/device.h"
+#include "handset/connectfactory.h"
 #include "resources/mifbuilder.h"
 
 #include <QDir>

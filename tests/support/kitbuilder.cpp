@@ -1,6 +1,7 @@
 #include "support/kitbuilder.h"
 
 #include "common/xmlwriter.h"
+#include "catalogue/modulekind.h"
 
 #include <QDir>
 #include <QDomDocument>
@@ -13,33 +14,16 @@ namespace {
 
 unsigned int KnownFrameworkClassId(const QString &name)
 {
-    const QString lower = name.toLower();
-    if (lower == QLatin1String("ctf"))
-        return 0x0102F2AA;
-    if (lower == QLatin1String("ctfapplet"))
-        return 0x010C02E5;
-    if (lower == QLatin1String("uitf"))
-        return 0x010421E8;
-    if (lower == QLatin1String("oat"))
-        return 0x0107556B;
-    return 0;
+    const ModuleKind *kind = FindModuleKind(name.toLower());
+    return kind ? kind->frameworkClassId : 0u;
 }
 
 } // namespace
 
 QString DescriptionFileName(const QString &kind)
 {
-    if (kind == QLatin1String("ctf"))
-        return QStringLiteral("ctfmodule.xml");
-    if (kind == QLatin1String("ctfapplet"))
-        return QStringLiteral("ctfappletmodule.xml");
-    if (kind == QLatin1String("oat"))
-        return QStringLiteral("oatmodule.xml");
-    if (kind == QLatin1String("uitf"))
-        return QStringLiteral("utmodule.xml");
-    if (kind == QLatin1String("secondary"))
-        return QStringLiteral("secondarymodule.xml");
-    return QString();
+    const ModuleKind *found = FindModuleKind(kind);
+    return found ? found->descriptionFile : QString();
 }
 
 QByteArray MakeDescription(const Module &module)
