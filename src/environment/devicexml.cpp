@@ -1,3 +1,5 @@
+#include "environment/devicexml.h"
+
 #include "environment/testdirectories.h"
 
 #include "common/xmlwriter.h"
