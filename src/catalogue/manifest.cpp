@@ -1,12 +1,12 @@
 #include "catalogue/manifest.h"
 
 #include "catalogue/framework.h"
+#include "catalogue/modulekind.h"
 #include "catalogue/testmodule.h"
 #include "common/stringhash.h"
 #include "common/xmlnode.h"
 #include "common/xmlwriter.h"
 #include "environment/testdirectories.h"
-#include "catalogue/modulekind.h"
 #include "log/log.h"
 
 #include <QDir>

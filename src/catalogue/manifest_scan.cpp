@@ -4,9 +4,9 @@
 
 #include "archive/tar.h"
 #include "catalogue/framework.h"
+#include "catalogue/modulekind.h"
 #include "catalogue/testmodule.h"
 #include "common/xmlnode.h"
-#include "catalogue/modulekind.h"
 #include "environment/platforms.h"
 #include "resources/kestoresources.h"
 
