@@ -8,7 +8,7 @@
 #include "controller/harness.h"
 #include "controller/processedresults.h"
 #include "controller/resultssession.h"
-#include "modules/testresults.h"
+#include "catalogue/testresults.h"
 
 #include "support/benchkits.h"
 #include "support/benchutil.h"

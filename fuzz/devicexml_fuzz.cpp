@@ -1,6 +1,6 @@
 // Flattens arbitrary bytes as a device pack that may include two files lying
 // beside it: one well-formed, one not.
-#include "environment/testdirectories.h"
+#include "environment/devicexml.h"
 
 #include "fuzzutil.h"
 

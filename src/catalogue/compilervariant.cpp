@@ -12,25 +12,27 @@ QString _CompilerVariant::VariantPath()
     return packagePath.isEmpty() ? binPath : packagePath;
 }
 
-template <class Element>
-bool _CompilerVariant::ReadVariant(const Element &element)
+bool _CompilerVariant::ReadFromXML(const QDomElement &element)
 {
-    using namespace XmlRead;
+    return ReadFromXML(*XmlNode::FromDom(element));
+}
+
+bool _CompilerVariant::ReadFromXML(const XmlNode &element)
+{
     files.clear();
-    name = Attribute(element, QStringLiteral("name"));
-    variant = Attribute(element, QStringLiteral("variant"));
-    binPath = Attribute(element, QStringLiteral("binpath"));
-    packagePath = Attribute(element, QStringLiteral("packagepath"));
-    arch = IKestoDevice::StringToTarget(Attribute(element, QStringLiteral("arch")));
-    build = Attribute(element, QStringLiteral("build"));
+    name = element.Attribute(QStringLiteral("name"));
+    variant = element.Attribute(QStringLiteral("variant"));
+    binPath = element.Attribute(QStringLiteral("binpath"));
+    packagePath = element.Attribute(QStringLiteral("packagepath"));
+    arch = IKestoDevice::StringToTarget(element.Attribute(QStringLiteral("arch")));
+    build = element.Attribute(QStringLiteral("build"));
     if (name.isEmpty())
         return false;
-
-    ForEachChild(element, [this](const auto &child) {
-        if (TagName(child).toLower() != QLatin1String("files"))
+    element.ForEachChildElement([this](const XmlNode &child) {
+        if (child.Name().toLower() != QLatin1String("files"))
             return;
-        ForEachChild(child, [this](const auto &file) {
-            const QString path = Attribute(file, QStringLiteral("path"));
+        child.ForEachChildElement([this](const XmlNode &file) {
+            const QString path = file.Attribute(QStringLiteral("path"));
             if (!path.isEmpty())
                 files.append(path);
         });
@@ -38,47 +40,26 @@ bool _CompilerVariant::ReadVariant(const Element &element)
     return true;
 }
 
-bool _CompilerVariant::ReadFromXML(const QDomElement &element)
-{
-    return ReadVariant(element);
-}
-
-bool _CompilerVariant::ReadFromXML(const XmlNode &element)
-{
-    return ReadVariant(element);
-}
-
-namespace {
-
-template <class Element>
-void WriteVariant(const _CompilerVariant &variant, Element &element)
-{
-    using namespace XmlBuild;
-    SetAttribute(element, QStringLiteral("name"), variant.name);
-    SetAttribute(element, QStringLiteral("variant"), variant.variant);
-    SetAttribute(element, QStringLiteral("binpath"), variant.binPath);
-    SetAttribute(element, QStringLiteral("packagepath"), variant.packagePath);
-    SetAttribute(element, QStringLiteral("arch"), IKestoDevice::TargetToString(variant.arch));
-    SetAttribute(element, QStringLiteral("build"), variant.build);
-    if (variant.files.isEmpty())
-        return;
-    auto &&list = AppendElement(element, QStringLiteral("files"));
-    for (const QString &path : variant.files) {
-        auto &&file = AppendElement(list, QStringLiteral("File"));
-        SetAttribute(file, QStringLiteral("path"), path);
-    }
-}
-
-} // namespace
-
 void _CompilerVariant::WriteToXML(QDomElement &element)
 {
-    WriteVariant(*this, element);
+    XmlNode node(element.tagName());
+    WriteToXML(node);
+    node.CopyTo(element);
 }
 
 void _CompilerVariant::WriteToXML(XmlNode &element)
 {
-    WriteVariant(*this, element);
+    element.SetAttribute(QStringLiteral("name"), name);
+    element.SetAttribute(QStringLiteral("variant"), variant);
+    element.SetAttribute(QStringLiteral("binpath"), binPath);
+    element.SetAttribute(QStringLiteral("packagepath"), packagePath);
+    element.SetAttribute(QStringLiteral("arch"), IKestoDevice::TargetToString(arch));
+    element.SetAttribute(QStringLiteral("build"), build);
+    if (files.isEmpty())
+        return;
+    XmlNode &list = element.AppendElement(QStringLiteral("files"));
+    for (const QString &path : files)
+        list.AppendElement(QStringLiteral("File")).SetAttribute(QStringLiteral("path"), path);
 }
 
 unsigned int ToList(const QMap<QString, QSharedPointer<_CompilerVariant>> &map,

@@ -38,10 +38,6 @@ public:
     IKestoDevice::Platform arch = IKestoDevice::PLATFORM_UNKNOWN;
     QString build;
     QStringList files;
-
-private:
-    template <class Element>
-    bool ReadVariant(const Element &element);
 };
 
 // Replaces out by the variants of map sorted by name; returns their count.

@@ -36,62 +36,48 @@ QSharedPointer<_CompilerVariant> _Framework::GetVariant(IKestoDevice::Platform p
     return {};
 }
 
-template <class Element>
-bool _Framework::ReadEntry(const Element &element)
+bool _Framework::ReadFromManifest(const QDomElement &element)
 {
-    using namespace XmlRead;
-    name = Attribute(element, QStringLiteral("name"));
+    return ReadFromManifest(*XmlNode::FromDom(element));
+}
+
+bool _Framework::ReadFromManifest(const XmlNode &element)
+{
+    name = element.Attribute(QStringLiteral("name"));
     if (name.isEmpty())
         return false;
-    ForEachChild(element, [this](const auto &child) {
-        const QString tag = TagName(child).toLower();
+    element.ForEachChildElement([this](const XmlNode &child) {
+        const QString tag = child.Name().toLower();
         if (tag == QLatin1String("variant")) {
             QSharedPointer<_CompilerVariant> variant(new _CompilerVariant);
             if (variant->ReadFromXML(child))
                 variants.insert(variant->name, variant);
         } else if (tag == QLatin1String("classid")) {
             bool ok = false;
-            const unsigned int value = Attribute(child, QStringLiteral("value")).toUInt(&ok, 10);
+            const unsigned int value = child.Attribute(QStringLiteral("value")).toUInt(&ok, 10);
             classId = ok ? value : 0;
         }
     });
     return true;
 }
 
-bool _Framework::ReadFromManifest(const QDomElement &element)
-{
-    return ReadEntry(element);
-}
-
-bool _Framework::ReadFromManifest(const XmlNode &element)
-{
-    return ReadEntry(element);
-}
-
-template <class Element>
-void _Framework::WriteEntry(Element &element)
-{
-    using namespace XmlBuild;
-    SetAttribute(element, QStringLiteral("name"), name);
-    QList<QSharedPointer<_CompilerVariant>> sorted;
-    ToList(variants, sorted);
-    for (const auto &variant : std::as_const(sorted)) {
-        auto &&child = AppendElement(element, QStringLiteral("variant"));
-        variant->WriteToXML(child);
-    }
-    auto &&id = AppendElement(element, QStringLiteral("classid"));
-    SetAttribute(id, QStringLiteral("value"), QString::number(classId));
-    SetAttribute(id, QStringLiteral("valuehex"), HexClassId(classId));
-}
-
 void _Framework::WriteToManifest(QDomElement &element)
 {
-    WriteEntry(element);
+    XmlNode node(element.tagName());
+    WriteToManifest(node);
+    node.CopyTo(element);
 }
 
 void _Framework::WriteToManifest(XmlNode &element)
 {
-    WriteEntry(element);
+    element.SetAttribute(QStringLiteral("name"), name);
+    QList<QSharedPointer<_CompilerVariant>> sorted;
+    ToList(variants, sorted);
+    for (const auto &variant : std::as_const(sorted))
+        variant->WriteToXML(element.AppendElement(QStringLiteral("variant")));
+    XmlNode &id = element.AppendElement(QStringLiteral("classid"));
+    id.SetAttribute(QStringLiteral("value"), QString::number(classId));
+    id.SetAttribute(QStringLiteral("valuehex"), HexClassId(classId));
 }
 
 bool _Framework::IsLoaded(IKestoDevice *device)

@@ -49,12 +49,6 @@ public:
     QString name;
     unsigned int classId = 0;
     QMap<QString, QSharedPointer<_CompilerVariant>> variants;
-
-private:
-    template <class Element>
-    bool ReadEntry(const Element &element);
-    template <class Element>
-    void WriteEntry(Element &element);
 };
 
 // "fs:/~0x0000abcd": the handset directory of the module providing classId.

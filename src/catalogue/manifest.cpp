@@ -1,18 +1,13 @@
 #include "catalogue/manifest.h"
 
 #include "catalogue/framework.h"
+#include "catalogue/modulekind.h"
 #include "catalogue/testmodule.h"
 #include "common/stringhash.h"
 #include "common/xmlnode.h"
 #include "common/xmlwriter.h"
 #include "environment/testdirectories.h"
 #include "log/log.h"
-#include "modules/ctfapplettestmodule.h"
-#include "modules/ctftestmodule.h"
-#include "modules/oatframework.h"
-#include "modules/oattestmodule.h"
-#include "modules/secondarymodule.h"
-#include "modules/uttestmodule.h"
 
 #include <QDir>
 #include <QFile>
@@ -111,23 +106,15 @@ bool Manifest::IsCurrent(const XmlNode &root)
 
 QSharedPointer<_TestModule> Manifest::CreateModule(const QString &type)
 {
-    if (type == OatTestModule::Type())
-        return QSharedPointer<_TestModule>(new OatTestModule);
-    if (type == CtfTestModule::Type())
-        return QSharedPointer<_TestModule>(new CtfTestModule);
-    if (type == CtfAppletTestModule::Type())
-        return QSharedPointer<_TestModule>(new CtfAppletTestModule);
-    if (type == UTTestModule::Type())
-        return QSharedPointer<_TestModule>(new UTTestModule);
-    if (type == SecondaryModule::Type())
-        return QSharedPointer<_TestModule>(new SecondaryModule);
-    return {};
+    const ModuleKind *kind = FindModuleKind(type);
+    return kind ? kind->createModule() : QSharedPointer<_TestModule>();
 }
 
 QSharedPointer<_Framework> Manifest::CreateFramework(const QString &name)
 {
-    if (name == QLatin1String("oat"))
-        return QSharedPointer<_Framework>(new _OatFramework);
+    const ModuleKind *kind = FindModuleKind(name);
+    if (kind && kind->createFramework)
+        return kind->createFramework();
     return QSharedPointer<_Framework>(new _Framework);
 }
 

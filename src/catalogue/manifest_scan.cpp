@@ -4,14 +4,10 @@
 
 #include "archive/tar.h"
 #include "catalogue/framework.h"
+#include "catalogue/modulekind.h"
 #include "catalogue/testmodule.h"
 #include "common/xmlnode.h"
 #include "environment/platforms.h"
-#include "modules/ctfapplettestmodule.h"
-#include "modules/ctftestmodule.h"
-#include "modules/oattestmodule.h"
-#include "modules/secondarymodule.h"
-#include "modules/uttestmodule.h"
 #include "resources/kestoresources.h"
 
 #include <QDir>
@@ -86,12 +82,19 @@ const QSet<QString> &PathWordsToSkip()
     return words;
 }
 
-// Sub-folders of a "testframeworks" folder that stand for a framework.
-const QSet<QString> &ModuleKindWords()
+// Whether a sub-folder of a "testframeworks" folder stands for a framework:
+// its lower-cased name is the type word of a kind that has one.
+// An empty module of the kind that bare "package" folders give.
+QSharedPointer<_TestModule> PackageFolderModule()
 {
-    static const QSet<QString> words{OatTestModule::Type(), CtfTestModule::Type(),
-                                     CtfAppletTestModule::Type(), UTTestModule::Type()};
-    return words;
+    const ModuleKind *kind = FindModuleKind(&ModuleKind::fromPackageFolder);
+    return kind ? kind->createModule() : QSharedPointer<_TestModule>();
+}
+
+bool IsFrameworkWord(const QString &lowerName)
+{
+    const ModuleKind *kind = FindModuleKind(lowerName);
+    return kind && kind->frameworkClassId != 0;
 }
 
 // Handset architecture of a tool-chain, by lower-cased tool-chain name.
@@ -110,31 +113,20 @@ IKestoDevice::Platform ArchitectureOf(const QString &toolChain)
 // Class ID of a framework's main component, by lower-cased framework name.
 unsigned int FrameworkClassId(const QString &name)
 {
-    static const QHash<QString, unsigned int> table{
-        {QStringLiteral("ctf"), 0x0102F2AAu},
-        {QStringLiteral("ctfapplet"), 0x010C02E5u},
-        {QStringLiteral("uitf"), 0x010421E8u},
-        {QStringLiteral("oat"), 0x0107556Bu},
-    };
-    return table.value(name, 0u);
+    const ModuleKind *kind = FindModuleKind(name);
+    return kind ? kind->frameworkClassId : 0u;
 }
 
 // Module kind of a description file, by a case-insensitive look at its path;
-// empty when the file describes no module.
-QString DescriptionType(const QString &path)
+// null when the file describes no module.
+const ModuleKind *DescriptionKind(const QString &path)
 {
     const QString lower = path.toLower();
-    if (lower.contains(QLatin1String("oatmodule.xml")))
-        return OatTestModule::Type();
-    if (lower.contains(QLatin1String("ctfmodule.xml")))
-        return CtfTestModule::Type();
-    if (lower.contains(QLatin1String("ctfappletmodule.xml")))
-        return CtfAppletTestModule::Type();
-    if (lower.contains(QLatin1String("utmodule.xml")))
-        return UTTestModule::Type();
-    if (lower.contains(QLatin1String("secondarymodule.xml")))
-        return SecondaryModule::Type();
-    return QString();
+    for (const ModuleKind &kind : ModuleKinds()) {
+        if (lower.contains(kind.descriptionFile))
+            return &kind;
+    }
+    return nullptr;
 }
 
 QString JoinPath(const QString &dir, const QString &name)
@@ -279,7 +271,9 @@ void Manifest::ProcessTheSubDir(const QString &dir)
             if (base == QLatin1String("testframeworks") && !isPlatform) {
                 ProcessFrameworkDirectory(entry.path);
             } else if (base == QLatin1String("package")) {
-                QSharedPointer<_TestModule> module(new SecondaryModule);
+                QSharedPointer<_TestModule> module = PackageFolderModule();
+                if (!module)
+                    continue;
                 const QString path = entry.absolutePath;
                 ProcessPackageDir(module, path);
                 secondaryModules.insert(module->moduleName, module);
@@ -327,7 +321,7 @@ void Manifest::ProcessFrameworkDirectory(const QString &dir)
         if (!entry.isDir)
             continue;
         const QString lower = entry.name.toLower();
-        if (!ModuleKindWords().contains(lower))
+        if (!IsFrameworkWord(lower))
             continue;
         QSharedPointer<_Framework> framework(new _Framework);
         framework->name = lower;
@@ -337,9 +331,10 @@ void Manifest::ProcessFrameworkDirectory(const QString &dir)
 
 bool Manifest::ProcessXMLDocument(const QString &path)
 {
-    QSharedPointer<_TestModule> module = CreateModule(DescriptionType(path));
-    if (!module)
+    const ModuleKind *kind = DescriptionKind(path);
+    if (!kind)
         return false;
+    QSharedPointer<_TestModule> module = kind->createModule();
     module->SetSource(isPlatform ? QStringLiteral("PVS") : QStringLiteral("KVK"));
     if (!module->ProcessModuleXML(path))
         return false;
@@ -379,8 +374,9 @@ void Manifest::ProcessXMLDir(const QString &xmlPath, QSharedPointer<_TestModule>
     Kind kind = Kind::None;
     bool kindFound = false;
     bool packageDone = false;
-    // Only OAT modules come with a base-line file.
-    bool baseLineDone = module->TestType() != OatTestModule::Type();
+    // Only the OAT kind comes with a base-line file.
+    const ModuleKind *moduleKind = FindModuleKind(module->TestType());
+    bool baseLineDone = !moduleKind || !moduleKind->hasBaseLine;
 
     for (const DirEntry &entry : entries) {
         const QString name = entry.name.toLower();
@@ -527,15 +523,9 @@ void Manifest::ProcessSecondaryModules()
 
 QSharedPointer<_TestModule> Manifest::CreateTestModuleFromLog(const QString &logPath)
 {
-    const QString suffix = QFileInfo(logPath).suffix().toLower();
-    if (suffix == QLatin1String("txt") || suffix == QLatin1String("xml"))
-        return QSharedPointer<_TestModule>(new UTTestModule);
-    if (suffix == QLatin1String("log")) {
-        if (logPath.contains(QLatin1String("-ctf-"), Qt::CaseInsensitive))
-            return QSharedPointer<_TestModule>(new CtfTestModule);
-        return QSharedPointer<_TestModule>(new CtfAppletTestModule);
+    for (const ModuleKind &kind : ModuleKinds()) {
+        if (kind.readsLog && kind.readsLog(logPath))
+            return kind.createModule();
     }
-    if (suffix == QLatin1String("oat"))
-        return QSharedPointer<_TestModule>(new OatTestModule);
     return {};
 }

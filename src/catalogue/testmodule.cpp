@@ -19,39 +19,34 @@ QString EitherAttribute(const XmlNode &element, const char *upper, const char *l
 }
 
 // A decimal attribute; ok tells whether it parsed.
-template <class Element>
-unsigned int DecimalAttribute(const Element &element, const QString &name, bool *ok)
+unsigned int DecimalAttribute(const XmlNode &element, const QString &name, bool *ok)
 {
-    return XmlRead::Attribute(element, name).toUInt(ok, 10);
+    return element.Attribute(name).toUInt(ok, 10);
 }
 
-template <class Element>
-unsigned int DecimalAttribute(const Element &element, const QString &name, unsigned int fallback)
+unsigned int DecimalAttribute(const XmlNode &element, const QString &name, unsigned int fallback)
 {
     bool ok = false;
     const unsigned int value = DecimalAttribute(element, name, &ok);
     return ok ? value : fallback;
 }
 
-// The manifest entry of module, from a DOM element or a light one; true
-// when it names the module.
-template <class Element>
-bool ReadEntry(_TestModule &module, const Element &element)
+// The manifest entry of module; true when it names the module.
+bool ReadEntry(_TestModule &module, const XmlNode &element)
 {
-    using namespace XmlRead;
-    module.moduleName = Attribute(element, QStringLiteral("moduleName"));
-    module.idHash = Attribute(element, QStringLiteral("idhash"));
-    module.source = Attribute(element, QStringLiteral("source"));
-    module.baseLineFile = Attribute(element, QStringLiteral("baseLineFile"));
-    module.sourcePath = Attribute(element, QStringLiteral("sourcePath"));
-    module.family = Attribute(element, QStringLiteral("family"));
-    module.subFamily = Attribute(element, QStringLiteral("subFamily"));
-    module.minKestoVersion = Attribute(element, QStringLiteral("minKestoVersion"));
+    module.moduleName = element.Attribute(QStringLiteral("moduleName"));
+    module.idHash = element.Attribute(QStringLiteral("idhash"));
+    module.source = element.Attribute(QStringLiteral("source"));
+    module.baseLineFile = element.Attribute(QStringLiteral("baseLineFile"));
+    module.sourcePath = element.Attribute(QStringLiteral("sourcePath"));
+    module.family = element.Attribute(QStringLiteral("family"));
+    module.subFamily = element.Attribute(QStringLiteral("subFamily"));
+    module.minKestoVersion = element.Attribute(QStringLiteral("minKestoVersion"));
 
-    ForEachChild(element, [&module](const auto &child) {
-        const QString tag = TagName(child).toLower();
-        ForEachChild(child, [&module, &tag](const auto &item) {
-            const QString itemTag = TagName(item).toLower();
+    element.ForEachChildElement([&module](const XmlNode &child) {
+        const QString tag = child.Name().toLower();
+        child.ForEachChildElement([&module, &tag](const XmlNode &item) {
+            const QString itemTag = item.Name().toLower();
             if (tag == QLatin1String("targets") && itemTag == QLatin1String("target")) {
                 QSharedPointer<_CompilerVariant> variant(new _CompilerVariant);
                 if (variant->ReadFromXML(item))
@@ -78,7 +73,7 @@ bool ReadEntry(_TestModule &module, const Element &element)
                 module.testCases.append(testCase);
             } else if (tag == QLatin1String("secondary_modules")
                        && itemTag == QLatin1String("secondary_module")) {
-                const QString name = Attribute(item, QStringLiteral("name"));
+                const QString name = item.Attribute(QStringLiteral("name"));
                 if (!name.isEmpty())
                     module.secondaryModules.append(name);
             }
@@ -87,76 +82,74 @@ bool ReadEntry(_TestModule &module, const Element &element)
     return !module.moduleName.isEmpty();
 }
 
-// The manifest entry of module, into a DOM element or a light one.
-template <class Element>
-void WriteEntry(_TestModule &module, Element &element)
+// The manifest entry of module.
+void WriteEntry(_TestModule &module, XmlNode &element)
 {
-    using namespace XmlBuild;
     module.idHash =
         StringHashName(module.source + module.moduleName + module.family + module.subFamily);
 
-    SetAttribute(element, QStringLiteral("testtype"), module.TestType());
-    SetAttribute(element, QStringLiteral("idhash"), module.idHash);
-    SetAttribute(element, QStringLiteral("source"), module.source);
-    SetAttribute(element, QStringLiteral("moduleName"), module.moduleName);
-    SetAttribute(element, QStringLiteral("baseLineFile"), module.baseLineFile);
-    SetAttribute(element, QStringLiteral("sourcePath"), module.sourcePath);
-    SetAttribute(element, QStringLiteral("family"), module.family);
-    SetAttribute(element, QStringLiteral("subFamily"), module.subFamily);
-    SetAttribute(element, QStringLiteral("minKestoVersion"), module.minKestoVersion);
+    element.SetAttribute(QStringLiteral("testtype"), module.TestType());
+    element.SetAttribute(QStringLiteral("idhash"), module.idHash);
+    element.SetAttribute(QStringLiteral("source"), module.source);
+    element.SetAttribute(QStringLiteral("moduleName"), module.moduleName);
+    element.SetAttribute(QStringLiteral("baseLineFile"), module.baseLineFile);
+    element.SetAttribute(QStringLiteral("sourcePath"), module.sourcePath);
+    element.SetAttribute(QStringLiteral("family"), module.family);
+    element.SetAttribute(QStringLiteral("subFamily"), module.subFamily);
+    element.SetAttribute(QStringLiteral("minKestoVersion"), module.minKestoVersion);
 
     if (!module.targets.isEmpty()) {
-        auto &&list = AppendElement(element, QStringLiteral("targets"));
+        XmlNode &list = element.AppendElement(QStringLiteral("targets"));
         QList<QSharedPointer<_CompilerVariant>> sorted;
         ToList(module.targets, sorted);
         for (const auto &variant : std::as_const(sorted)) {
-            auto &&target = AppendElement(list, QStringLiteral("target"));
+            XmlNode &target = list.AppendElement(QStringLiteral("target"));
             variant->WriteToXML(target);
         }
     }
 
     if (!module.testCases.isEmpty()) {
-        auto &&list = AppendElement(element, QStringLiteral("testcases"));
+        XmlNode &list = element.AppendElement(QStringLiteral("testcases"));
         for (TestCase &testCase : module.testCases) {
-            auto &&item = AppendElement(list, QStringLiteral("testcase"));
+            XmlNode &item = list.AppendElement(QStringLiteral("testcase"));
             testCase.WriteToXML(item);
         }
     }
 
     if (!module.applets.isEmpty()) {
-        auto &&list = AppendElement(element, QStringLiteral("applets"));
+        XmlNode &list = element.AppendElement(QStringLiteral("applets"));
         for (const Applet &applet : std::as_const(module.applets)) {
-            auto &&item = AppendElement(list, QStringLiteral("applet"));
-            SetAttribute(item, QStringLiteral("appletid"), QString::number(applet.appletid));
-            SetAttribute(item, QStringLiteral("appletidhex"), HexClassId(applet.appletid));
-            SetAttribute(item, QStringLiteral("hostid"), QString::number(applet.hostid));
-            SetAttribute(item, QStringLiteral("baseid"), QString::number(applet.baseid));
-            SetAttribute(item, QStringLiteral("apptype"), QString::number(applet.apptype));
-            SetAttribute(item, QStringLiteral("privset"), QString::number(applet.privset));
-            SetAttribute(item, QStringLiteral("flags"), QString::number(applet.flags));
-            SetAttribute(item, QStringLiteral("flagshex"),
+            XmlNode &item = list.AppendElement(QStringLiteral("applet"));
+            item.SetAttribute(QStringLiteral("appletid"), QString::number(applet.appletid));
+            item.SetAttribute(QStringLiteral("appletidhex"), HexClassId(applet.appletid));
+            item.SetAttribute(QStringLiteral("hostid"), QString::number(applet.hostid));
+            item.SetAttribute(QStringLiteral("baseid"), QString::number(applet.baseid));
+            item.SetAttribute(QStringLiteral("apptype"), QString::number(applet.apptype));
+            item.SetAttribute(QStringLiteral("privset"), QString::number(applet.privset));
+            item.SetAttribute(QStringLiteral("flags"), QString::number(applet.flags));
+            item.SetAttribute(QStringLiteral("flagshex"),
                          QStringLiteral("0x%1").arg(applet.flags, 4, 16, QLatin1Char('0')));
         }
     }
 
     if (!module.classids.isEmpty()) {
-        auto &&list = AppendElement(element, QStringLiteral("classids"));
+        XmlNode &list = element.AppendElement(QStringLiteral("classids"));
         for (const unsigned int id : std::as_const(module.classids)) {
-            auto &&item = AppendElement(list, QStringLiteral("classid"));
-            SetAttribute(item, QStringLiteral("value"), QString::number(id));
-            SetAttribute(item, QStringLiteral("valuehex"), HexClassId(id));
+            XmlNode &item = list.AppendElement(QStringLiteral("classid"));
+            item.SetAttribute(QStringLiteral("value"), QString::number(id));
+            item.SetAttribute(QStringLiteral("valuehex"), HexClassId(id));
         }
     }
 
     const bool anySecondary = std::any_of(module.secondaryModules.cbegin(), module.secondaryModules.cend(),
                                           [](const QString &name) { return !name.isEmpty(); });
     if (anySecondary) {
-        auto &&secondaries = AppendElement(element, QStringLiteral("secondary_modules"));
+        XmlNode &secondaries = element.AppendElement(QStringLiteral("secondary_modules"));
         for (const QString &name : std::as_const(module.secondaryModules)) {
             if (name.isEmpty())
                 continue;
-            auto &&item = AppendElement(secondaries, QStringLiteral("secondary_module"));
-            SetAttribute(item, QStringLiteral("name"), name);
+            XmlNode &item = secondaries.AppendElement(QStringLiteral("secondary_module"));
+            item.SetAttribute(QStringLiteral("name"), name);
         }
     }
 }
@@ -235,13 +228,11 @@ bool _TestModule::ProcessModuleXML(const QString &path)
     if (!file.exists() || !file.open(QIODevice::ReadOnly))
         return false;
 
-    QString message;
-    int line = 0;
-    int column = 0;
-    const std::unique_ptr<XmlNode> root = XmlNode::Parse(file.readAll(), &message, &line, &column);
+    XmlParseError error;
+    const std::unique_ptr<XmlNode> root = XmlNode::Parse(file.readAll(), &error);
     if (!root) {
         errorText = QStringLiteral("Error processing oat xml file:") + path + QStringLiteral("\n\t")
-            + message + QStringLiteral(": Line(%1) Column(%2)").arg(line).arg(column);
+            + error.message + QStringLiteral(": Line(%1) Column(%2)").arg(error.line).arg(error.column);
         return false;
     }
     file.close();
@@ -285,7 +276,8 @@ bool _TestModule::ProcessModuleXML(const QString &path)
 
 bool _TestModule::ReadFromManifest(const QDomElement &element)
 {
-    return ReadEntry(*this, element);
+    // The kinds read their own elements in the light-tree overload.
+    return ReadFromManifest(*XmlNode::FromDom(element));
 }
 
 bool _TestModule::ReadFromManifest(const XmlNode &element)
@@ -295,7 +287,9 @@ bool _TestModule::ReadFromManifest(const XmlNode &element)
 
 void _TestModule::WriteToManifest(QDomElement &element)
 {
-    WriteEntry(*this, element);
+    XmlNode node(element.tagName());
+    WriteToManifest(node);
+    node.CopyTo(element);
 }
 
 void _TestModule::WriteToManifest(XmlNode &element)

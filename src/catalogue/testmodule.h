@@ -4,7 +4,7 @@
 #include "catalogue/testcase.h"
 #include "common/export.h"
 #include "device/device.h"
-#include "modules/testresults.h"
+#include "catalogue/testresults.h"
 #include "resources/mif.h"
 
 #include <QDomElement>

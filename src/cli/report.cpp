@@ -11,6 +11,7 @@
 #include "controller/resultsmerge.h"
 #include "log/log.h"
 
+#include "common/filewriter.h"
 #include "common/xmlwriter.h"
 
 #include <algorithm>
@@ -408,7 +409,7 @@ int PublishReport(const RunReport &report, const QCommandLineParser &parser, boo
             continue;
         }
         QString error;
-        if (!XmlWriter::WriteFile(path, bytes, true, &error)) {
+        if (!FileWriter::Write(path, bytes, true, &error)) {
             Err(QStringLiteral("harness: cannot write %1: %2\n")
                     .arg(path, error.isEmpty() ? QStringLiteral("unknown error") : error));
             return ExitUsage;

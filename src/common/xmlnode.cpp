@@ -1,5 +1,6 @@
 #include "common/xmlnode.h"
 
+#include <QDomDocument>
 #include <QStringDecoder>
 #include <QXmlStreamReader>
 
@@ -490,8 +491,7 @@ XmlNode::~XmlNode()
     }
 }
 
-std::unique_ptr<XmlNode> XmlNode::Parse(const QByteArray &bytes, QString *error, int *line,
-                                        int *column)
+std::unique_ptr<XmlNode> XmlNode::Parse(const QByteArray &bytes, XmlParseError *error)
 {
     {
         QStringDecoder decoder(QStringDecoder::Utf8, QStringDecoder::Flag::Stateless);
@@ -501,11 +501,10 @@ std::unique_ptr<XmlNode> XmlNode::Parse(const QByteArray &bytes, QString *error,
                 return root;
         }
     }
-    return ParseFully(bytes, error, line, column);
+    return ParseFully(bytes, error);
 }
 
-std::unique_ptr<XmlNode> XmlNode::ParseFully(const QByteArray &bytes, QString *error, int *line,
-                                             int *column)
+std::unique_ptr<XmlNode> XmlNode::ParseFully(const QByteArray &bytes, XmlParseError *error)
 {
     QXmlStreamReader reader(bytes);
     reader.setNamespaceProcessing(false);
@@ -568,12 +567,11 @@ std::unique_ptr<XmlNode> XmlNode::ParseFully(const QByteArray &bytes, QString *e
         }
     }
     if (reader.hasError() || !root) {
-        if (error)
-            *error = reader.hasError() ? reader.errorString() : QStringLiteral("no root element");
-        if (line)
-            *line = int(reader.lineNumber());
-        if (column)
-            *column = int(reader.columnNumber());
+        if (error) {
+            error->message = reader.hasError() ? reader.errorString() : QStringLiteral("no root element");
+            error->line = int(reader.lineNumber());
+            error->column = int(reader.columnNumber());
+        }
         return nullptr;
     }
     return root;
@@ -623,6 +621,68 @@ XmlNode *XmlNode::FirstChildElement() const
             return child.get();
     }
     return nullptr;
+}
+
+std::unique_ptr<XmlNode> XmlNode::FromDom(const QDomElement &element)
+{
+    auto node = std::make_unique<XmlNode>(element.tagName());
+    const QDomNamedNodeMap attributes = element.attributes();
+    for (int i = 0; i < attributes.count(); ++i) {
+        const QDomAttr attribute = attributes.item(i).toAttr();
+        node->SetAttribute(attribute.name(), attribute.value());
+    }
+    for (QDomNode child = element.firstChild(); !child.isNull(); child = child.nextSibling()) {
+        if (child.isElement()) {
+            node->AppendChild(FromDom(child.toElement()));
+        } else if (child.isCDATASection()) {
+            auto section = std::make_unique<XmlNode>(QString(), CData);
+            section->SetValue(child.nodeValue());
+            node->AppendChild(std::move(section));
+        } else if (child.isText()) {
+            node->AppendText(child.nodeValue());
+        } else if (child.isComment()) {
+            auto comment = std::make_unique<XmlNode>(QString(), Comment);
+            comment->SetValue(child.nodeValue());
+            node->AppendChild(std::move(comment));
+        } else if (child.isProcessingInstruction()) {
+            auto instruction = std::make_unique<XmlNode>(child.nodeName(), ProcessingInstruction);
+            instruction->SetValue(child.nodeValue());
+            node->AppendChild(std::move(instruction));
+        }
+    }
+    return node;
+}
+
+void XmlNode::CopyTo(QDomElement &element) const
+{
+    QDomDocument document = element.ownerDocument();
+    for (const auto &attribute : m_attributes)
+        element.setAttribute(attribute.first, attribute.second);
+    for (const std::unique_ptr<XmlNode> &child : m_children) {
+        switch (child->m_kind) {
+        case Element: {
+            QDomElement copy = document.createElement(child->m_name);
+            child->CopyTo(copy);
+            element.appendChild(copy);
+            break;
+        }
+        case Text:
+            element.appendChild(document.createTextNode(child->m_value));
+            break;
+        case CData:
+            element.appendChild(document.createCDATASection(child->m_value));
+            break;
+        case Comment:
+            element.appendChild(document.createComment(child->m_value));
+            break;
+        case ProcessingInstruction:
+            element.appendChild(document.createProcessingInstruction(child->m_name, child->m_value));
+            break;
+        case EntityReference:
+            element.appendChild(document.createEntityReference(child->m_name));
+            break;
+        }
+    }
 }
 
 XmlNode &XmlNode::AppendElement(const QString &name)

@@ -12,6 +12,15 @@
 #include <memory>
 #include <vector>
 
+// Why and where a document could not be parsed: the parser's message and the
+// 1-based line and column it stopped at.
+struct XmlParseError
+{
+    QString message;
+    int line = 0;
+    int column = 0;
+};
+
 // A light XML tree for the big documents the library handles by the
 // thousand: module descriptions, catalogue caches and processed-results
 // files. It holds what those documents are made of (elements, attributes,
@@ -20,9 +29,8 @@
 // (whitespace-only text is dropped) and is written by XmlWriter exactly as
 // the same tree held in a QDomDocument would be.
 //
-//   QString error;
-//   int line = 0, column = 0;
-//   std::unique_ptr<XmlNode> root = XmlNode::Parse(bytes, &error, &line, &column);
+//   XmlParseError error;
+//   std::unique_ptr<XmlNode> root = XmlNode::Parse(bytes, &error);
 //   for (const XmlNode *child : root->ChildElements())
 //       child->Attribute(QStringLiteral("name"));
 class HARNESS_EXPORT XmlNode
@@ -39,15 +47,14 @@ public:
 
     // Parses a whole document and returns its root element. Everything
     // outside the root element (declaration, document type, comments) is not
-    // kept. On malformed input returns null and fills error, line and column
-    // (when given) with the parser's message and position.
-    static std::unique_ptr<XmlNode> Parse(const QByteArray &bytes, QString *error = nullptr,
-                                          int *line = nullptr, int *column = nullptr);
+    // kept. On malformed input returns null and fills error (when given)
+    // with the parser's message and position.
+    static std::unique_ptr<XmlNode> Parse(const QByteArray &bytes, XmlParseError *error = nullptr);
 
     // Parse through QXmlStreamReader alone. Parse gives the same tree faster
     // for plain documents; this is the reference it is held to.
-    static std::unique_ptr<XmlNode> ParseFully(const QByteArray &bytes, QString *error = nullptr,
-                                               int *line = nullptr, int *column = nullptr);
+    static std::unique_ptr<XmlNode> ParseFully(const QByteArray &bytes,
+                                               XmlParseError *error = nullptr);
 
     // Whether XML 1.0 can carry the character at all.
     static bool IsXmlChar(char32_t c)
@@ -83,6 +90,16 @@ public:
     std::vector<XmlNode *> ChildElements() const;
     // The first child element, or null.
     XmlNode *FirstChildElement() const;
+    // Calls visit with every child element, in document order, without
+    // building a list.
+    template <class Visit>
+    void ForEachChildElement(Visit &&visit) const
+    {
+        for (const auto &child : m_children) {
+            if (child->IsElement())
+                visit(*child);
+        }
+    }
 
     // Appends a new element and returns it.
     XmlNode &AppendElement(const QString &name);
@@ -100,6 +117,13 @@ public:
     // for an element without child elements).
     int Depth() const;
 
+    // The DOM element with everything below it as a light tree (entity
+    // references and document type nodes are left out).
+    static std::unique_ptr<XmlNode> FromDom(const QDomElement &element);
+    // Adds this element's attributes and children to element, so that a
+    // record written as a light tree can be handed out as DOM.
+    void CopyTo(QDomElement &element) const;
+
 private:
     void CollectText(QString &out) const;
 
@@ -109,75 +133,3 @@ private:
     AttributeList m_attributes;
     std::vector<std::unique_ptr<XmlNode>> m_children;
 };
-
-// The same writing code builds a DOM element (for callers of the DOM
-// interface) and an XmlNode (for the library's own big files) through these.
-namespace XmlBuild {
-
-inline void SetAttribute(QDomElement &element, const QString &name, const QString &value)
-{
-    element.setAttribute(name, value);
-}
-
-inline void SetAttribute(XmlNode &element, const QString &name, const QString &value)
-{
-    element.SetAttribute(name, value);
-}
-
-inline QDomElement AppendElement(QDomElement &parent, const QString &name)
-{
-    QDomElement child = parent.ownerDocument().createElement(name);
-    parent.appendChild(child);
-    return child;
-}
-
-inline XmlNode &AppendElement(XmlNode &parent, const QString &name)
-{
-    return parent.AppendElement(name);
-}
-
-} // namespace XmlBuild
-
-// The same reading code takes a DOM element (from callers of the DOM
-// interface) and an XmlNode (from the library's own files) through these.
-namespace XmlRead {
-
-inline QString Attribute(const QDomElement &element, const QString &name)
-{
-    return element.attribute(name);
-}
-
-inline QString Attribute(const XmlNode &element, const QString &name)
-{
-    return element.Attribute(name);
-}
-
-inline QString TagName(const QDomElement &element)
-{
-    return element.tagName();
-}
-
-inline QString TagName(const XmlNode &element)
-{
-    return element.Name();
-}
-
-// Calls visit with every child element, in document order.
-template <class Visit>
-void ForEachChild(const QDomElement &element, Visit &&visit)
-{
-    for (QDomElement child = element.firstChildElement(); !child.isNull();
-         child = child.nextSiblingElement())
-        visit(child);
-}
-
-template <class Visit>
-void ForEachChild(const XmlNode &element, Visit &&visit)
-{
-    for (const auto &child : element.Children()) {
-        if (child->IsElement())
-            visit(*child);
-    }
-}
-
-} // namespace XmlRead

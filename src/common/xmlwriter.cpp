@@ -1,11 +1,10 @@
 #include "common/xmlwriter.h"
 
+#include "common/filewriter.h"
 #include "common/xmlnode.h"
 
 #include <QDomNamedNodeMap>
-#include <QFile>
 #include <QIODevice>
-#include <QSaveFile>
 #include <QVarLengthArray>
 
 #include <algorithm>
@@ -712,47 +711,16 @@ QByteArray Serialize(const XmlNode &node, int indent)
     return ToString(node, indent).toUtf8();
 }
 
-bool WriteFile(const QString &path, const QByteArray &bytes, bool atomic, QString *error)
-{
-    auto fail = [error](const QString &why) {
-        if (error)
-            *error = why;
-        return false;
-    };
-    if (atomic) {
-        QSaveFile file(path);
-        if (!file.open(QIODevice::WriteOnly))
-            return fail(file.errorString());
-        if (file.write(bytes) != bytes.size()) {
-            const QString why = file.errorString();
-            file.cancelWriting();
-            return fail(why);
-        }
-        if (!file.commit())
-            return fail(file.errorString());
-        return true;
-    }
-    QFile file(path);
-    if (!file.open(QIODevice::WriteOnly | QIODevice::Truncate))
-        return fail(file.errorString());
-    if (file.write(bytes) != bytes.size())
-        return fail(file.errorString());
-    if (!file.flush())
-        return fail(file.errorString());
-    file.close();
-    return true;
-}
-
 bool WriteDocument(const QDomDocument &document, const QString &path, int indent, bool atomic,
                    QString *error)
 {
-    return WriteFile(path, Serialize(document, indent), atomic, error);
+    return FileWriter::Write(path, Serialize(document, indent), atomic, error);
 }
 
 bool WriteDocument(const XmlNode &root, const QString &path, int indent, bool atomic,
                    QString *error)
 {
-    return WriteFile(path, Serialize(root, indent), atomic, error);
+    return FileWriter::Write(path, Serialize(root, indent), atomic, error);
 }
 
 } // namespace XmlWriter

@@ -1,6 +1,7 @@
 #pragma once
 
 #include "common/export.h"
+#include "common/filewriter.h"
 
 #include <QByteArray>
 #include <QDomDocument>
@@ -34,14 +35,7 @@ HARNESS_EXPORT QByteArray Serialize(const QDomNode &node, int indent = 1);
 HARNESS_EXPORT QString ToString(const XmlNode &node, int indent = 1);
 HARNESS_EXPORT QByteArray Serialize(const XmlNode &node, int indent = 1);
 
-// Writes bytes to path. With atomic set the file is written beside the
-// destination and renamed over it only once complete, so a crash or a full
-// disk never leaves a truncated file. Returns false (and fills error when
-// given) when the file cannot be written; an existing file is then unchanged.
-HARNESS_EXPORT bool WriteFile(const QString &path, const QByteArray &bytes, bool atomic = true,
-                              QString *error = nullptr);
-
-// Serialize(document) written with WriteFile.
+// Serialize(document) written with FileWriter::Write.
 HARNESS_EXPORT bool WriteDocument(const QDomDocument &document, const QString &path,
                                   int indent = 1, bool atomic = true, QString *error = nullptr);
 HARNESS_EXPORT bool WriteDocument(const XmlNode &root, const QString &path, int indent = 1,
@@ -57,7 +51,7 @@ HARNESS_EXPORT bool WriteDocument(const XmlNode &root, const QString &path, int 
 //   out.Open(root);              // "<testkit a=...>" (its children are not written)
 //   out.Write(module);           // a whole element, one level deeper
 //   out.Close();                 // "</testkit>", or "/>" when nothing was written inside
-//   XmlWriter::WriteFile(path, out.Finish());
+//   FileWriter::Write(path, out.Finish());
 //
 // Given a device, the stream passes its text on to it as it goes (UTF-8, in
 // pieces of some tens of kilobytes), so the document is never held whole;

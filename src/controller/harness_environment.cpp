@@ -6,6 +6,7 @@
 #include "common/stringhash.h"
 #include "controller/environmentkeys.h"
 #include "environment/platforms.h"
+#include "environment/devicexml.h"
 #include "environment/testdirectories.h"
 
 #include <QDir>

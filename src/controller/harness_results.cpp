@@ -7,7 +7,7 @@
 #include "controller/environmentkeys.h"
 #include "controller/resultssession.h"
 #include "controller/processedresults.h"
-#include "modules/testresults.h"
+#include "catalogue/testresults.h"
 
 #include <QDir>
 

@@ -5,6 +5,7 @@
 
 #include "controller/environmentkeys.h"
 #include "environment/testdirectories.h"
+#include "handset/connectfactory.h"
 
 bool Harness::Initialize()
 {

@@ -1,6 +1,6 @@
 #include "controller/moduletimings.h"
 
-#include "common/xmlwriter.h"
+#include "common/filewriter.h"
 #include "environment/testdirectories.h"
 
 #include <QFile>
@@ -201,7 +201,7 @@ bool ModuleTimings::Save(const QString &path)
                            {QStringLiteral("version"), kVersion},
                            {QStringLiteral("modules"), list}};
     QString error;
-    if (!XmlWriter::WriteFile(path, QJsonDocument(root).toJson(QJsonDocument::Indented), true, &error)) {
+    if (!FileWriter::Write(path, QJsonDocument(root).toJson(QJsonDocument::Indented), true, &error)) {
         m_error = QStringLiteral("cannot write %1: %2").arg(path, error);
         return false;
     }

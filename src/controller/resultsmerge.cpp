@@ -105,15 +105,13 @@ bool ResultsMerge::Add(const QString &path, const QString &handset, const QStrin
         m_error = QStringLiteral("%1 is too large for a processed-results file (%2 bytes)").arg(path).arg(file.size());
         return false;
     }
-    QString message;
-    int line = 0;
-    int column = 0;
-    const std::unique_ptr<XmlNode> root = XmlNode::Parse(file.readAll(), &message, &line, &column);
+    XmlParseError parseError;
+    const std::unique_ptr<XmlNode> root = XmlNode::Parse(file.readAll(), &parseError);
     if (!root) {
         m_error = QStringLiteral("%1 is not a processed-results file: %2 (line %3, column %4)")
-                      .arg(path, message)
-                      .arg(line)
-                      .arg(column);
+                      .arg(path, parseError.message)
+                      .arg(parseError.line)
+                      .arg(parseError.column);
         return false;
     }
     if (root->Name().toLower() != QLatin1String("testmodules")) {

@@ -1,5 +1,8 @@
+#include "environment/devicexml.h"
+
 #include "environment/testdirectories.h"
 
+#include "common/filewriter.h"
 #include "common/xmlwriter.h"
 
 #include <QDomDocument>
@@ -404,5 +407,5 @@ bool FlattenDeviceXml(const QString &source, const QString &destination)
 
     ExpandDocument(expansion);
     MergeDuplicateSections(expansion.document);
-    return XmlWriter::WriteFile(destination, SerializeFlattened(expansion).toLatin1(), true);
+    return FileWriter::Write(destination, SerializeFlattened(expansion).toLatin1(), true);
 }

@@ -1,7 +1,8 @@
 // The device connection of this library: every handset is an emulated one,
 // a folder below the handsets folder (see EmulatedHandset).
 
-#include "device/device.h"
+#include "handset/connectfactory.h"
+
 #include "handset/emulatedhandset.h"
 #include "log/log.h"
 

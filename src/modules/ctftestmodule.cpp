@@ -234,22 +234,10 @@ bool CtfTestModule::ProcessPackage(const QString &directory)
     return false;
 }
 
-bool CtfTestModule::ReadFromManifest(const QDomElement &element)
-{
-    _TestModule::ReadFromManifest(element);
-    return Programs::ReadFromManifest(element, programs) > 0;
-}
-
 bool CtfTestModule::ReadFromManifest(const XmlNode &element)
 {
     _TestModule::ReadFromManifest(element);
     return Programs::ReadFromManifest(element, programs) > 0;
-}
-
-void CtfTestModule::WriteToManifest(QDomElement &element)
-{
-    _TestModule::WriteToManifest(element);
-    Programs::WriteToManifest(element, programs);
 }
 
 void CtfTestModule::WriteToManifest(XmlNode &element)

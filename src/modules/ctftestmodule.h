@@ -45,9 +45,10 @@ public:
     QString ModuleXMLName() override;
     bool ProcessModuleMIF(const QString &path) override;
     // The base entry plus "programs"; true when at least one program was read.
-    bool ReadFromManifest(const QDomElement &element) override;
+    // The DOM forms read and write through these.
+    using _TestModule::ReadFromManifest;
+    using _TestModule::WriteToManifest;
     bool ReadFromManifest(const XmlNode &element) override;
-    void WriteToManifest(QDomElement &element) override;
     void WriteToManifest(XmlNode &element) override;
 
     QList<SysResource> programs;

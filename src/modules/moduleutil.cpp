@@ -3,7 +3,7 @@
 #include "common/clock.h"
 #include "device/device.h"
 #include "log/log.h"
-#include "modules/testresults.h"
+#include "catalogue/testresults.h"
 
 #include <QDateTime>
 #include <QDir>

@@ -361,38 +361,16 @@ bool OatTestModule::ProcessPackage(const QString &directory)
     return false;
 }
 
-template <class Element>
-bool OatTestModule::ReadEntry(const Element &element)
-{
-    _TestModule::ReadFromManifest(element);
-    mifname = XmlRead::Attribute(element, QStringLiteral("mifname"));
-    return Programs::ReadFromManifest(element, programs) > 0;
-}
-
-bool OatTestModule::ReadFromManifest(const QDomElement &element)
-{
-    return ReadEntry(element);
-}
-
 bool OatTestModule::ReadFromManifest(const XmlNode &element)
 {
-    return ReadEntry(element);
-}
-
-template <class Element>
-void OatTestModule::WriteEntry(Element &element)
-{
-    _TestModule::WriteToManifest(element);
-    XmlBuild::SetAttribute(element, QStringLiteral("mifname"), mifname);
-    Programs::WriteToManifest(element, programs);
-}
-
-void OatTestModule::WriteToManifest(QDomElement &element)
-{
-    WriteEntry(element);
+    _TestModule::ReadFromManifest(element);
+    mifname = element.Attribute(QStringLiteral("mifname"));
+    return Programs::ReadFromManifest(element, programs) > 0;
 }
 
 void OatTestModule::WriteToManifest(XmlNode &element)
 {
-    WriteEntry(element);
+    _TestModule::WriteToManifest(element);
+    element.SetAttribute(QStringLiteral("mifname"), mifname);
+    Programs::WriteToManifest(element, programs);
 }

@@ -47,10 +47,10 @@ public:
     QString ModuleXMLName() override;
     bool ProcessModuleMIF(const QString &path) override;
     // The base entry plus "mifname" and "programs"; true when at least one
-    // program was read.
-    bool ReadFromManifest(const QDomElement &element) override;
+    // program was read. The DOM forms read and write through these.
+    using _TestModule::ReadFromManifest;
+    using _TestModule::WriteToManifest;
     bool ReadFromManifest(const XmlNode &element) override;
-    void WriteToManifest(QDomElement &element) override;
     void WriteToManifest(XmlNode &element) override;
 
     // The module's handset directory name: the module name with an "oat"
@@ -71,8 +71,4 @@ private:
     QString SetupConfigData(const QMap<QString, QString> &env);
     void ExecuteMifHack(IKestoDevice *device);
     void StampLog(const QString &hostPath, const QString &runId);
-    template <class Element>
-    void WriteEntry(Element &element);
-    template <class Element>
-    bool ReadEntry(const Element &element);
 };

@@ -19,18 +19,14 @@ QString PropertyText(const SysResource &program, const char *name)
     return program.Property(name).toString();
 }
 
-namespace {
-
-template <class Element>
-int ReadPrograms(const Element &element, QList<SysResource> &programs)
+int ReadFromManifest(const XmlNode &element, QList<SysResource> &programs)
 {
-    using namespace XmlRead;
     int count = 0;
-    ForEachChild(element, [&](const auto &list) {
-        if (TagName(list).toLower() != QLatin1String("programs"))
+    element.ForEachChildElement([&](const XmlNode &list) {
+        if (list.Name().toLower() != QLatin1String("programs"))
             return;
-        ForEachChild(list, [&](const auto &item) {
-            if (TagName(item).toLower() != QLatin1String("program"))
+        list.ForEachChildElement([&](const XmlNode &item) {
+            if (item.Name().toLower() != QLatin1String("program"))
                 return;
             SysResource program;
             program.ReadFromXML(item);
@@ -41,42 +37,15 @@ int ReadPrograms(const Element &element, QList<SysResource> &programs)
     return count;
 }
 
-} // namespace
-
-int ReadFromManifest(const QDomElement &element, QList<SysResource> &programs)
-{
-    return ReadPrograms(element, programs);
-}
-
-int ReadFromManifest(const XmlNode &element, QList<SysResource> &programs)
-{
-    return ReadPrograms(element, programs);
-}
-
-namespace {
-
-template <class Element>
-void WritePrograms(Element &element, QList<SysResource> &programs)
+void WriteToManifest(XmlNode &element, QList<SysResource> &programs)
 {
     if (programs.isEmpty())
         return;
-    auto &&list = XmlBuild::AppendElement(element, QStringLiteral("programs"));
+    XmlNode &list = element.AppendElement(QStringLiteral("programs"));
     for (SysResource &program : programs) {
-        auto &&item = XmlBuild::AppendElement(list, QStringLiteral("program"));
+        XmlNode &item = list.AppendElement(QStringLiteral("program"));
         program.WriteToXML(item);
     }
-}
-
-} // namespace
-
-void WriteToManifest(QDomElement &element, QList<SysResource> &programs)
-{
-    WritePrograms(element, programs);
-}
-
-void WriteToManifest(XmlNode &element, QList<SysResource> &programs)
-{
-    WritePrograms(element, programs);
 }
 
 bool ReadFromPackage(const QString &directory, const QString &moduleName, const QString &prefix,

@@ -7,9 +7,10 @@
 #include "common/export.h"
 #include "resources/sysresource.h"
 
-#include <QDomElement>
 #include <QList>
 #include <QString>
+
+class XmlNode;
 
 namespace Programs {
 
@@ -18,11 +19,9 @@ HARNESS_EXPORT QString PropertyText(const SysResource &program, const char *name
 
 // Appends every "program" of every "programs" child of element; returns how
 // many were read.
-HARNESS_EXPORT int ReadFromManifest(const QDomElement &element, QList<SysResource> &programs);
 HARNESS_EXPORT int ReadFromManifest(const XmlNode &element, QList<SysResource> &programs);
 
 // Appends a "programs" child holding one "program" per record, when there are any.
-HARNESS_EXPORT void WriteToManifest(QDomElement &element, QList<SysResource> &programs);
 HARNESS_EXPORT void WriteToManifest(XmlNode &element, QList<SysResource> &programs);
 
 // Reads the program records of type programType from the module information

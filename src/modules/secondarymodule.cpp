@@ -56,12 +56,6 @@ bool SecondaryModule::ProcessModuleMIF(const QString &)
     return false;
 }
 
-bool SecondaryModule::ReadFromManifest(const QDomElement &element)
-{
-    _TestModule::ReadFromManifest(element);
-    return false;
-}
-
 bool SecondaryModule::ReadFromManifest(const XmlNode &element)
 {
     _TestModule::ReadFromManifest(element);

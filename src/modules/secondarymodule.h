@@ -24,8 +24,8 @@ public:
     QString ModuleName() override;
     QString ModuleXMLName() override;
     bool ProcessModuleMIF(const QString &path) override;
-    // Reads the base entry; always false.
-    bool ReadFromManifest(const QDomElement &element) override;
+    // Reads the base entry; always false. The DOM form reads through this.
+    using _TestModule::ReadFromManifest;
     bool ReadFromManifest(const XmlNode &element) override;
 
 private:

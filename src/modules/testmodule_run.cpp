@@ -2,7 +2,7 @@
 
 #include "catalogue/testmodule.h"
 
-#include "common/xmlwriter.h"
+#include "common/filewriter.h"
 #include "modules/moduleutil.h"
 
 #include <QDir>
@@ -133,5 +133,5 @@ void _TestModule::StampTextLog(const QString &hostPath, const QString &runId, St
         stamped += line;
         stamped += '\n';
     }
-    XmlWriter::WriteFile(hostPath, stamped, true);
+    FileWriter::Write(hostPath, stamped, true);
 }

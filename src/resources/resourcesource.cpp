@@ -1,6 +1,6 @@
 #include "resources/resourcesource.h"
 
-#include "common/xmlwriter.h"
+#include "common/filewriter.h"
 #include "encoding/qencoding.h"
 #include "resources/kestoresources.h"
 
@@ -167,7 +167,7 @@ bool CompileResourceSource(const QString &source, const QString &output, QString
     }
     QByteArray compiled;
     QString reason;
-    if (!resources.SaveTo(compiled) || !XmlWriter::WriteFile(output, compiled, true, &reason)) {
+    if (!resources.SaveTo(compiled) || !FileWriter::Write(output, compiled, true, &reason)) {
         *error = QStringLiteral("cannot write %1 (%2)").arg(output, reason.isEmpty() ? QStringLiteral("the resources could not be serialised") : reason);
         return false;
     }

@@ -137,56 +137,49 @@ void SysResource::Decode()
     }
 }
 
-template <class Element>
-void SysResource::WriteRecord(Element &element)
+void SysResource::WriteToXML(XmlNode &element)
 {
-    using namespace XmlBuild;
-    SetAttribute(element, QStringLiteral("type"), QString::number(type));
-    SetAttribute(element, QStringLiteral("keysize"), QString::number(keysize));
+    element.SetAttribute(QStringLiteral("type"), QString::number(type));
+    element.SetAttribute(QStringLiteral("keysize"), QString::number(keysize));
     if (!data.isEmpty())
-        AppendElement(element, QStringLiteral("data"));
+        element.AppendElement(QStringLiteral("data"));
     const QList<QByteArray> names = PropertyNames();
     if (names.isEmpty())
         return;
-    auto &&list = AppendElement(element, QStringLiteral("properties"));
+    XmlNode &list = element.AppendElement(QStringLiteral("properties"));
     for (const QByteArray &name : names) {
         const QVariant value = Property(name.constData());
         if (!value.isValid() || value.toString().isEmpty())
             continue;
-        auto &&property = AppendElement(list, QStringLiteral("property"));
-        SetAttribute(property, QStringLiteral("name"), QString::fromLatin1(name));
-        SetAttribute(property, QStringLiteral("value"), value.toString());
+        XmlNode &property = list.AppendElement(QStringLiteral("property"));
+        property.SetAttribute(QStringLiteral("name"), QString::fromLatin1(name));
+        property.SetAttribute(QStringLiteral("value"), value.toString());
     }
 }
 
 void SysResource::WriteToXML(QDomElement &element)
 {
-    WriteRecord(element);
+    XmlNode node(element.tagName());
+    WriteToXML(node);
+    node.CopyTo(element);
 }
 
-void SysResource::WriteToXML(XmlNode &element)
+void SysResource::ReadFromXML(const XmlNode &element)
 {
-    WriteRecord(element);
-}
-
-template <class Element>
-void SysResource::ReadRecord(const Element &element)
-{
-    using namespace XmlRead;
     Reset();
-    type = Attribute(element, QStringLiteral("type")).toUInt();
-    keysize = quint16(Attribute(element, QStringLiteral("keysize")).toUInt());
-    ForEachChild(element, [this](const auto &child) {
-        const QString name = TagName(child).toLower();
+    type = element.Attribute(QStringLiteral("type")).toUInt();
+    keysize = quint16(element.Attribute(QStringLiteral("keysize")).toUInt());
+    element.ForEachChildElement([this](const XmlNode &child) {
+        const QString name = child.Name().toLower();
         if (name == QLatin1String("data")) {
             // The manifest keeps only the mark that there were bytes.
             data.clear();
         } else if (name == QLatin1String("properties")) {
-            ForEachChild(child, [this](const auto &property) {
-                const QString propertyName = Attribute(property, QStringLiteral("name"));
+            child.ForEachChildElement([this](const XmlNode &property) {
+                const QString propertyName = property.Attribute(QStringLiteral("name"));
                 if (!propertyName.isEmpty())
                     SetProperty(propertyName.toLatin1().constData(),
-                                Attribute(property, QStringLiteral("value")).toLatin1());
+                                property.Attribute(QStringLiteral("value")).toLatin1());
             });
         }
     });
@@ -194,10 +187,5 @@ void SysResource::ReadRecord(const Element &element)
 
 void SysResource::ReadFromXML(const QDomElement &element)
 {
-    ReadRecord(element);
-}
-
-void SysResource::ReadFromXML(const XmlNode &element)
-{
-    ReadRecord(element);
+    ReadFromXML(*XmlNode::FromDom(element));
 }

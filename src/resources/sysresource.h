@@ -63,10 +63,4 @@ struct HARNESS_EXPORT SysResource
     quint32 type = 0;
     QByteArray data;
     std::unique_ptr<QObject> properties;
-
-private:
-    template <class Element>
-    void WriteRecord(Element &element);
-    template <class Element>
-    void ReadRecord(const Element &element);
 };

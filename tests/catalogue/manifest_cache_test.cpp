@@ -4,14 +4,10 @@
 
 #include "catalogue/framework.h"
 #include "common/stringhash.h"
-#include "common/xmlnode.h"
-#include "common/xmlwriter.h"
-#include "modules/ctfapplettestmodule.h"
 #include "modules/ctftestmodule.h"
 #include "modules/oatframework.h"
 #include "modules/oattestmodule.h"
 #include "modules/secondarymodule.h"
-#include "modules/uttestmodule.h"
 
 #include <QCoreApplication>
 #include <QFile>
@@ -233,94 +229,6 @@ TEST_F(ManifestCacheTest, WrittenCatalogueReadsBackTheSame)
     ASSERT_TRUE(expected.contains("<data/>"));
     expected.replace("     <data/>\n", "");
     EXPECT_EQ(testutil::ReadFile(again), expected);
-}
-
-TEST_F(ManifestCacheTest, CacheEntriesAreTheEntriesTheDomInterfaceWrites)
-{
-    // The cache is written through the light tree; a caller of the DOM
-    // interface must get the very same entry, kind by kind.
-    BuildRichKit();
-    Manifest manifest(kit->Root(), false);
-    Scan(manifest);
-    const QByteArray cache = testutil::ReadFile(manifest.cacheFile);
-    ASSERT_EQ(manifest.testModules.size(), 6);
-    for (const auto &module : std::as_const(manifest.testModules)) {
-        QDomDocument document;
-        QDomElement element = document.createElement(QStringLiteral("testmodule"));
-        document.appendChild(element);
-        module->WriteToManifest(element);
-        XmlNode light(QStringLiteral("testmodule"));
-        module->WriteToManifest(light);
-        const QByteArray written = XmlWriter::Serialize(light);
-        EXPECT_EQ(written, XmlWriter::Serialize(element)) << module->moduleName.toStdString();
-        // As it stands in the cache, two levels down.
-        QByteArray indented;
-        for (const QByteArray &line : written.split('\n')) {
-            if (!line.isEmpty())
-                indented += "  " + line + '\n';
-        }
-        EXPECT_TRUE(cache.contains(indented)) << module->moduleName.toStdString();
-    }
-}
-
-TEST_F(ManifestCacheTest, EntriesReadThroughTheDomInterfaceAreTheCataloguesOwn)
-{
-    // The cache is read through the light tree; a caller of the DOM
-    // interface reading the same entries must get the same records.
-    BuildRichKit();
-    Manifest scanned(kit->Root(), false);
-    Scan(scanned);
-    Manifest read(kit->Root(), false);
-    ASSERT_TRUE(read.ReadManifest());
-
-    QDomDocument document;
-    ASSERT_TRUE(document.setContent(testutil::ReadFile(read.cacheFile)));
-    const QDomElement modules = document.documentElement().firstChildElement(QStringLiteral("testmodules"));
-    const auto make = [](const QString &type) -> QSharedPointer<_TestModule> {
-        if (type == CtfTestModule::Type())
-            return QSharedPointer<_TestModule>(new CtfTestModule);
-        if (type == OatTestModule::Type())
-            return QSharedPointer<_TestModule>(new OatTestModule);
-        if (type == SecondaryModule::Type())
-            return QSharedPointer<_TestModule>(new SecondaryModule);
-        if (type == CtfAppletTestModule::Type())
-            return QSharedPointer<_TestModule>(new CtfAppletTestModule);
-        return QSharedPointer<_TestModule>(new UTTestModule);
-    };
-    const auto written = [](const QSharedPointer<_TestModule> &module) {
-        XmlNode entry(QStringLiteral("testmodule"));
-        module->WriteToManifest(entry);
-        return XmlWriter::Serialize(entry);
-    };
-    int compared = 0;
-    for (QDomElement entry = modules.firstChildElement(); !entry.isNull(); entry = entry.nextSiblingElement()) {
-        const QString type = entry.attribute(QStringLiteral("testtype"));
-        const QSharedPointer<_TestModule> viaDom = make(type);
-        const bool named = viaDom->ReadFromManifest(entry);
-        const QSharedPointer<_TestModule> viaTree = make(type);
-        const std::unique_ptr<XmlNode> tree = XmlNode::Parse(XmlWriter::Serialize(entry));
-        ASSERT_NE(tree, nullptr);
-        EXPECT_EQ(viaTree->ReadFromManifest(*tree), named);
-        const QSharedPointer<_TestModule> catalogued = read.FindTestModule(viaDom->moduleName);
-        ASSERT_TRUE(catalogued) << viaDom->moduleName.toStdString();
-        EXPECT_EQ(written(viaTree), written(viaDom)) << viaDom->moduleName.toStdString();
-        EXPECT_EQ(written(catalogued), written(viaDom)) << viaDom->moduleName.toStdString();
-        ++compared;
-    }
-    EXPECT_EQ(compared, 6);
-
-    QList<QSharedPointer<_Framework>> frameworks;
-    ASSERT_EQ(read.GetFrameworks(frameworks), 2u);
-    const QDomElement list = document.documentElement().firstChildElement(QStringLiteral("frameworks"));
-    for (QDomElement entry = list.firstChildElement(); !entry.isNull(); entry = entry.nextSiblingElement()) {
-        _Framework viaDom;
-        ASSERT_TRUE(viaDom.ReadFromManifest(entry));
-        const auto match = std::find_if(frameworks.cbegin(), frameworks.cend(),
-                                        [&viaDom](const auto &f) { return f->name == viaDom.name; });
-        ASSERT_NE(match, frameworks.cend());
-        EXPECT_EQ((*match)->classId, viaDom.classId);
-        EXPECT_EQ((*match)->variants.keys(), viaDom.variants.keys());
-    }
 }
 
 TEST_F(ManifestCacheTest, WrittenCacheIsWellFormedXmlOfTheDocumentedLayout)

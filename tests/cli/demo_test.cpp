@@ -73,8 +73,19 @@ TEST_F(DemoInit, PackagesAreTarArchivesWithReadableModuleInformation)
     EXPECT_EQ(packages, 4 + 6 + 1);  // frameworks; the kit's modules, a secondary one among them; the platform's module
 }
 
-TEST_F(DemoInit, ScriptsAreValidShellAndPerl)
+TEST_F(DemoInit, ScriptsAreValidShellAndPerlAndDescriptionsValidXml)
 {
+    if (testutil::HaveProgram(QStringLiteral("xmllint"))) {
+        int descriptions = 0;
+        QDirIterator xml(root, {QStringLiteral("*module.xml")}, QDir::Files, QDirIterator::Subdirectories);
+        while (xml.hasNext()) {
+            QByteArray out;
+            ++descriptions;
+            EXPECT_EQ(testutil::RunProgram(QStringLiteral("xmllint"), {QStringLiteral("--noout"), xml.next()}, &out), 0)
+                << out.constData();
+        }
+        EXPECT_EQ(descriptions, 6);
+    }
     QDirIterator it(root, {QStringLiteral("*.exe")}, QDir::Files, QDirIterator::Subdirectories);
     while (it.hasNext()) {
         const QString path = it.next();

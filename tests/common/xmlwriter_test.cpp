@@ -1,3 +1,4 @@
+#include "common/filewriter.h"
 #include "common/xmlnode.h"
 #include "common/xmlwriter.h"
 
@@ -79,21 +80,21 @@ TEST(XmlWriter, EscapesAttributesAndReplacesCharactersXmlCannotCarry)
     EXPECT_EQ(back.documentElement().attribute(QStringLiteral("v")), QStringLiteral("a\"b\nc<d>&"));
 }
 
-TEST(XmlWriter, AtomicWriteReplacesWholeFileOrLeavesItUntouched)
+TEST(FileWriter, AtomicWriteReplacesWholeFileOrLeavesItUntouched)
 {
     QTemporaryDir dir;
     const QString path = dir.filePath(QStringLiteral("out.xml"));
-    ASSERT_TRUE(XmlWriter::WriteFile(path, "first"));
-    ASSERT_TRUE(XmlWriter::WriteFile(path, "second"));
+    ASSERT_TRUE(FileWriter::Write(path, "first"));
+    ASSERT_TRUE(FileWriter::Write(path, "second"));
     EXPECT_EQ(testutil::ReadFile(path), QByteArray("second"));
 
     QString error;
-    EXPECT_FALSE(XmlWriter::WriteFile(dir.filePath(QStringLiteral("missing/out.xml")), "x", true, &error));
+    EXPECT_FALSE(FileWriter::Write(dir.filePath(QStringLiteral("missing/out.xml")), "x", true, &error));
     EXPECT_FALSE(error.isEmpty());
 
     if (::geteuid() != 0) {
         QFile::setPermissions(dir.path(), QFileDevice::ReadOwner | QFileDevice::ExeOwner);
-        EXPECT_FALSE(XmlWriter::WriteFile(path, "third"));
+        EXPECT_FALSE(FileWriter::Write(path, "third"));
         QFile::setPermissions(dir.path(), QFileDevice::ReadOwner | QFileDevice::WriteOwner | QFileDevice::ExeOwner);
         EXPECT_EQ(testutil::ReadFile(path), QByteArray("second"));
     }

@@ -9,7 +9,7 @@
 #include "catalogue/manifest.h"
 #include "catalogue/testmodule.h"
 #include "controller/harness.h"
-#include "modules/testresults.h"
+#include "catalogue/testresults.h"
 
 #include <QDomDocument>
 #include <QSharedPointer>

@@ -1,4 +1,4 @@
-#include "environment/testdirectories.h"
+#include "environment/devicexml.h"
 
 #include "currentdirectory.h"
 

@@ -1,4 +1,4 @@
-#include "device/device.h"
+#include "handset/connectfactory.h"
 #include "handset/emulatedhandset.h"
 #include "log/log.h"
 

@@ -3,8 +3,8 @@
 // Helpers shared by the module kind tests.
 
 #include "catalogue/compilervariant.h"
+#include "catalogue/testresults.h"
 #include "log/log.h"
-#include "modules/testresults.h"
 #include "resources/mif.h"
 #include "support/testutil.h"
 

@@ -1,9 +1,8 @@
 #include "support/handsetfixture.h"
 
-#include "archive/tar.h"
 #include "common/handsetpath.h"
 #include "device/device.h"
-#include "resources/mifbuilder.h"
+#include "handset/connectfactory.h"
 
 #include <QDir>
 #include <QSettings>
@@ -11,41 +10,6 @@
 #include <gtest/gtest.h>
 
 namespace testutil {
-
-QByteArray BuildMif(const ModuleSpec &layout)
-{
-    MifBuilder mif;
-    for (unsigned int id : layout.classIds)
-        mif.AddClass(id);
-    for (unsigned int id : layout.appletIds)
-        mif.AddApplet(id);
-    for (const MifProgram &program : layout.programs)
-        mif.AddProgram(program.name, program.arguments, program.type);
-    for (const QString &key : layout.suitePrograms)
-        mif.AddSuiteProgram(key);
-    return mif.Build();
-}
-
-Members ModuleMembers(const ModuleSpec &layout)
-{
-    const QString prefix = layout.directory.isEmpty() ? QString() : layout.directory + QLatin1Char('/');
-    const QString mifName = layout.mifName.isEmpty() ? layout.directory + QStringLiteral(".mif") : layout.mifName;
-    Members members;
-    members.append({prefix + mifName, BuildMif(layout)});
-    if (!layout.behaviour.isEmpty())
-        members.append({prefix + QStringLiteral("behaviour"), layout.behaviour});
-    for (const auto &file : layout.files)
-        members.append({prefix + file.first, file.second});
-    return members;
-}
-
-bool WritePackage(const QString &path, const Members &members)
-{
-    Tar tar;
-    for (const auto &member : members)
-        tar.AddFile(member.first, member.second);
-    return tar.Write(path);
-}
 
 HandsetFixture::HandsetFixture()
 {

@@ -2,6 +2,8 @@
 
 #include "support/testutil.h"
 
+#include "modules/kitwriter.h"
+
 #include <QByteArray>
 #include <QList>
 #include <QPair>
@@ -17,46 +19,29 @@ class Log;
 
 namespace testutil {
 
-// A program record (system resource of a program type) of a module
-// information file.
-struct MifProgram
+// Packages of modules for the emulated handset, as the library's kit writer
+// makes them (modules/kitwriter.h).
+using MifProgram = KitProgram;
+using ModuleSpec = KitPackage;
+using Members = KitMembers;
+
+// The bytes of the layout's module information file.
+inline QByteArray BuildMif(const ModuleSpec &layout)
 {
-    QString name;      // the key the program is started by
-    QString arguments; // stored as "Arguments" when not empty
-    unsigned int type = 0x0102FAF7;
-};
+    return layout.Mif();
+}
 
-// One module of a package: the members are placed below `directory`, the
-// module's folder on the handset ("fs:/usermods/<directory>/").
-struct ModuleSpec
+// The members of the module's package.
+inline Members ModuleMembers(const ModuleSpec &layout)
 {
-    QString directory;
-    // Name of the module information file; directory + ".mif" when empty.
-    QString mifName;
-    QVector<unsigned int> classIds;
-    QVector<unsigned int> appletIds;
-    QList<MifProgram> programs;
-    // OAT suite program records, keys "<vendor>:<suite>:<program name>".
-    QStringList suitePrograms;
-    // Text of the "behaviour" script; no script when empty.
-    QByteArray behaviour;
-    // Further members, names relative to directory.
-    QList<QPair<QString, QByteArray>> files;
-};
+    return layout.Members();
+}
 
-using Members = QList<QPair<QString, QByteArray>>;
-
-// The bytes of a module information file listing the layout's class IDs,
-// applets and program records (with a 40-byte header block).
-QByteArray BuildMif(const ModuleSpec &layout);
-
-// The members of the module's package: the .mif, the behaviour (when given)
-// and the further files, all below layout.directory.
-Members ModuleMembers(const ModuleSpec &layout);
-
-// Writes a tar package of the members (names as given, written by the
-// library's own Tar); false when it cannot be written.
-bool WritePackage(const QString &path, const Members &members);
+// Writes a tar package of the members; false when it cannot be written.
+inline bool WritePackage(const QString &path, const Members &members)
+{
+    return KitWriter::WritePackage(path, members);
+}
 
 // A private handsets folder: sets KESTIX_HANDSETS to a temporary folder for
 // the fixture's lifetime, creates handsets in it and packages beside it.
