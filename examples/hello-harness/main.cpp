@@ -2,9 +2,9 @@
 // modules of the selected test kit, runs MODULE (default: the first one) and
 // prints its verdicts. The library's log goes to hello-harness.log.
 #include <harness/catalogue/testmodule.h>
+#include <harness/catalogue/testresults.h>
 #include <harness/controller/harness.h>
 #include <harness/log/log.h>
-#include <harness/modules/testresults.h>
 
 #include <QCoreApplication>
 #include <QTextStream>
