@@ -148,6 +148,8 @@ public:
                 record.handset = Name();
                 record.start = QDateTime::currentDateTimeUtc();
                 record.outcome = ModuleSource::StartFailed;
+                if (m_run.m_observer)
+                    m_run.m_observer->ModuleEnded(record);
                 m_queue.Done(index, Name(), ModuleSource::StartFailed, record);
                 continue;
             }
@@ -169,7 +171,24 @@ public:
         m_record = ModuleRecord();
     }
 
-    void ModuleEnded(const ModuleRecord &record) override { m_record = record; }
+    void ModuleStarted(const ModuleRecord &record) override
+    {
+        if (m_run.m_observer)
+            m_run.m_observer->ModuleStarted(record);
+    }
+
+    void ModuleWaiting(const ModuleRecord &record, const QString &waitingFor, qint64 elapsedMs) override
+    {
+        if (m_run.m_observer)
+            m_run.m_observer->ModuleWaiting(record, waitingFor, elapsedMs);
+    }
+
+    void ModuleEnded(const ModuleRecord &record) override
+    {
+        m_record = record;
+        if (m_run.m_observer)
+            m_run.m_observer->ModuleEnded(record);
+    }
 
     bool KeepFrameworks() const override { return true; }
 
@@ -248,6 +267,11 @@ void ShardedRun::AddHandset(Harness *harness)
 void ShardedRun::SetTestCases(const QStringList &testCases)
 {
     m_testCases = testCases;
+}
+
+void ShardedRun::SetObserver(RunObserver *observer)
+{
+    m_observer = observer;
 }
 
 void ShardedRun::LogMessage(const QString &message) const

@@ -24,6 +24,9 @@ public:
     Log &operator=(const Log &) = delete;
 
     void SetVerbose(bool verbose);
+    // Text put before every line of this Log's console echo (not the file),
+    // e.g. the handset's name when several handsets share the console.
+    void SetEchoPrefix(const QString &prefix);
 
     // A non-empty path names the log file; an empty one "log.txt" in the
     // current directory. Does not open the file.
@@ -41,5 +44,6 @@ private:
     void CloseLog();
 
     QFile m_file;
+    QString m_echoPrefix;
     bool m_verbose = false;
 };
