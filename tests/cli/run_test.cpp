@@ -606,8 +606,9 @@ TEST_F(DemoRun, TheHtmlReportWorksInARealBrowser)
     const QString dom = QString::fromUtf8(browse({QStringLiteral("--dump-dom")}, QString(), console));
     if (dom.isEmpty())
         GTEST_SKIP() << "headless browser test skipped: chromium did not run here: " << console.constData();
+    // The page writes nothing to the console: any line there is an error.
     for (const QByteArray &line : console.split('\n'))
-        EXPECT_FALSE(line.contains("CONSOLE") && (line.contains("Error") || line.contains("Uncaught"))) << line.constData();
+        EXPECT_FALSE(line.contains(":CONSOLE")) << line.constData();
     EXPECT_TRUE(dom.contains(QStringLiteral("<b data-count=\"passed\">14</b>"))) << dom.toStdString();
     EXPECT_TRUE(dom.contains(QStringLiteral("<b data-count=\"failed\">4</b>")));
     EXPECT_TRUE(dom.contains(QStringLiteral("<b data-count=\"unsupported\">3</b>")));
