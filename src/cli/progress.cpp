@@ -16,6 +16,10 @@ const char *const kGreen = "32";
 const char *const kRed = "31";
 const char *const kYellow = "33";
 const char *const kClearLine = "\r\033[K";
+// After how long a running module gets a status line, and how often a
+// heartbeat line.
+constexpr qint64 kStatusAfterMs = 3000;
+constexpr qint64 kHeartbeatMs = 60000;
 
 QString Duration(qint64 ms)
 {
@@ -59,13 +63,6 @@ bool ProgressPrinter::ColourWanted(std::FILE *stream)
 {
     const char *noColour = std::getenv("NO_COLOR");
     return IsTerminal(stream) && !(noColour && *noColour);
-}
-
-void ProgressPrinter::SetIntervals(qint64 statusAfterMs, qint64 heartbeatMs)
-{
-    const std::lock_guard<std::mutex> lock(m_mutex);
-    m_statusAfterMs = statusAfterMs;
-    m_heartbeatMs = qMax<qint64>(heartbeatMs, 1);
 }
 
 QString ProgressPrinter::Paint(const QString &text, const char *colour) const
@@ -122,7 +119,7 @@ void ProgressPrinter::ModuleStarted(const ModuleRecord &record)
 void ProgressPrinter::ModuleWaiting(const ModuleRecord &record, const QString &waitingFor, qint64 elapsedMs)
 {
     const std::lock_guard<std::mutex> lock(m_mutex);
-    if (elapsedMs < m_statusAfterMs)
+    if (elapsedMs < kStatusAfterMs)
         return;
     const QString what = QStringLiteral("waiting for %1, %2").arg(waitingFor, Elapsed(elapsedMs));
     if (m_terminal) {
@@ -130,7 +127,7 @@ void ProgressPrinter::ModuleWaiting(const ModuleRecord &record, const QString &w
         DrawStatus();
         return;
     }
-    const qint64 beats = elapsedMs / m_heartbeatMs;
+    const qint64 beats = elapsedMs / kHeartbeatMs;
     if (beats <= m_beats.value(record.handset))
         return;
     m_beats.insert(record.handset, beats);

@@ -20,7 +20,8 @@
 // a module runs longer than a few seconds, a terminal shows a status line
 // updated in place (module, handset, what it waits for, elapsed); any other
 // output gets a heartbeat line every minute instead. Times are the library
-// clock's, as the run loop reports them. Told from every handset's thread.
+// clock's, as the run loop reports them, so at KESTIX_TIME_SCALE=0 a long
+// wait shows its heartbeats at once. Told from every handset's thread.
 class ProgressPrinter : public RunObserver
 {
 public:
@@ -31,10 +32,6 @@ public:
     // and NO_COLOR unset or empty).
     static bool IsTerminal(std::FILE *stream);
     static bool ColourWanted(std::FILE *stream);
-
-    // After how long a running module gets a status line, and how often a
-    // heartbeat line (milliseconds on the library clock).
-    void SetIntervals(qint64 statusAfterMs, qint64 heartbeatMs);
 
     void ModuleStarted(const ModuleRecord &record) override;
     void ModuleWaiting(const ModuleRecord &record, const QString &waitingFor, qint64 elapsedMs) override;
@@ -61,8 +58,6 @@ private:
     int m_done = 0;
     int m_handsetWidth;
     int m_moduleWidth;
-    qint64 m_statusAfterMs = 3000;
-    qint64 m_heartbeatMs = 60000;
     // Per handset: the status text of its module in hand, and how many
     // heartbeats that module has had.
     QMap<QString, QString> m_status;

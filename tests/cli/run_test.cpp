@@ -500,7 +500,8 @@ TEST_F(DemoRun, AModulePastItsTimeoutIsStoppedRemovedAndReportedWhileTheRunGoesO
     // On a terminal the same wait is a status line rewritten in place.
     const QByteArray terminal = OnTerminal(WithLog({QStringLiteral("run"), QStringLiteral("--timeout"), QStringLiteral("20"), QStringLiteral("ITimer")}), env, dir.path());
     if (testutil::HaveProgram(QStringLiteral("script"))) {
-        EXPECT_TRUE(terminal.contains("\r\033[KITimer on demo-phone: waiting for its log, 19 s")) << terminal.constData();
+        EXPECT_TRUE(QString::fromUtf8(terminal).contains(QRegularExpression(QStringLiteral("\r\033\\[KITimer on demo-phone: waiting for its log, 1\\d s"))))
+            << terminal.constData();
         EXPECT_FALSE(terminal.contains("still running"));
     }
 
