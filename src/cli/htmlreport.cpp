@@ -123,7 +123,7 @@ QString Number(double value)
     return QString::number(value, 'f', 1);
 }
 
-void Counts(HtmlWriter &html, const RunReport &report)
+void Counts(HtmlWriter &html, const RunReport &report, bool withNotFinished)
 {
     const int total = report.Total(kPass) + report.Total(kFail) + report.Total(kUnsupported) + report.Total(kUnexecuted);
     const struct {
@@ -147,10 +147,12 @@ void Counts(HtmlWriter &html, const RunReport &report)
         html.Text(QLatin1String(entry.word));
         html.Close();
     }
-    html.Open("div", {{"class", QStringLiteral("count notfinished")}});
-    html.Element("b", QString::number(report.NotFinished()), {{"data-count", QStringLiteral("not finished")}});
-    html.Text(QStringLiteral("modules not finished"));
-    html.Close();
+    if (withNotFinished) {
+        html.Open("div", {{"class", QStringLiteral("count notfinished")}});
+        html.Element("b", QString::number(report.NotFinished()), {{"data-count", QStringLiteral("not finished")}});
+        html.Text(QStringLiteral("modules not finished"));
+        html.Close();
+    }
     html.Close();
     html.Open("div", {{"class", QStringLiteral("bar")}, {"role", QStringLiteral("img")},
                       {"aria-label", QStringLiteral("test case verdicts")}});
@@ -247,8 +249,14 @@ void Cell(HtmlWriter &html, const QString &text, const QString &sortValue, bool 
     html.Element("td", text, {{"data-value", sortValue}, {"class", number ? QStringLiteral("num") : QString()}});
 }
 
-void ModuleTable(HtmlWriter &html, const RunReport &report, bool withHandset)
+// The handset and duration columns only when some module has them (the
+// processed results of report hold neither).
+void ModuleTable(HtmlWriter &html, const RunReport &report)
 {
+    const bool withHandset = std::any_of(report.modules.cbegin(), report.modules.cend(),
+                                         [](const ModuleReport &m) { return !m.handset.isEmpty(); });
+    const bool withDuration = std::any_of(report.modules.cbegin(), report.modules.cend(),
+                                          [](const ModuleReport &m) { return m.durationMs >= 0; });
     html.Element("h2", QStringLiteral("Modules"));
     html.Open("p");
     html.Open("label");
@@ -268,7 +276,7 @@ void ModuleTable(HtmlWriter &html, const RunReport &report, bool withHandset)
     } columns[] = {{"Module", false}, {"Family", false}, {"Handset", false}, {"Duration", true}, {"Passed", true},
                    {"Failed", true}, {"Unsupported", true}, {"Unexecuted", true}, {"Outcome", false}};
     for (const auto &column : columns) {
-        if (!withHandset && qstrcmp(column.title, "Handset") == 0)
+        if ((!withHandset && qstrcmp(column.title, "Handset") == 0) || (!withDuration && qstrcmp(column.title, "Duration") == 0))
             continue;
         html.Element("th", QLatin1String(column.title),
                      {{"data-type", column.number ? QStringLiteral("number") : QStringLiteral("text")}});
@@ -288,7 +296,8 @@ void ModuleTable(HtmlWriter &html, const RunReport &report, bool withHandset)
         Cell(html, module.subFamily.isEmpty() ? module.family : module.family + QStringLiteral(" / ") + module.subFamily, module.family);
         if (withHandset)
             Cell(html, module.handset, module.handset);
-        Cell(html, Seconds(module.durationMs), QString::number(module.durationMs), true);
+        if (withDuration)
+            Cell(html, Seconds(module.durationMs), QString::number(module.durationMs), true);
         for (const QString &word : {kPass, kFail, kUnsupported, kUnexecuted}) {
             const QString count = QString::number(module.Count(word));
             Cell(html, count, count, true);
@@ -358,7 +367,7 @@ QByteArray RunReport::Html(const QString &folder) const
     html.Open("body");
     html.Element("h1", history ? QStringLiteral("Processed results") : QStringLiteral("Harness run"));
     if (history) {
-        html.Element("p", QStringLiteral("Handsets: %1").arg(handsets.isEmpty() ? QStringLiteral("not recorded") : handsets.join(QStringLiteral(", "))),
+        html.Element("p", QStringLiteral("The standing verdict of every test case a processed-results file holds."),
                      {{"class", QStringLiteral("meta")}});
     } else {
         html.Element("p", QStringLiteral("Started %1 UTC on %2, %3, handsets: %4%5")
@@ -367,7 +376,7 @@ QByteArray RunReport::Html(const QString &folder) const
                                    interrupted ? QStringLiteral(" (stopped by a signal)") : QString()),
                      {{"class", QStringLiteral("meta")}});
     }
-    Counts(html, *this);
+    Counts(html, *this, !history);
     if (history) {
         html.Element("h2", QStringLiteral("History"));
         html.Element("p", QStringLiteral("This processed-results file keeps one standing verdict per test case, "
@@ -376,8 +385,7 @@ QByteArray RunReport::Html(const QString &folder) const
     } else {
         Timeline(html, *this);
     }
-    ModuleTable(html, *this, !history || std::any_of(modules.cbegin(), modules.cend(),
-                                                      [](const ModuleReport &m) { return !m.handset.isEmpty(); }));
+    ModuleTable(html, *this);
     ModuleDetails(html, *this, folder);
     html.Open("script");
     html.Trusted(kScript);
