@@ -400,8 +400,14 @@ TEST_F(DemoRun, SharedRunsNameTheHandsetOfEachModule)
     AddHandset(QStringLiteral("demo-phone2"), "offlineAfter=1\n");  // lost with a module in hand
     AddHandset(QStringLiteral("demo-phone3"));
     testutil::WriteFile(handsets + QStringLiteral("/demo-phone3/offline"), "");
-    const ToolResult r = Tool({QStringLiteral("run"), QStringLiteral("--all-targets"), QStringLiteral("--test-data"), testData});
+    const ToolResult r = Tool({QStringLiteral("run"), QStringLiteral("--verbose"), QStringLiteral("--all-targets"), QStringLiteral("--test-data"), testData});
     EXPECT_EQ(r.status, 1) << r.err.constData() << r.out.constData();
+    // Every progress line and every library line names its handset.
+    const QString out = QString::fromUtf8(r.out);
+    EXPECT_EQ(out.count(QRegularExpression(QStringLiteral("^\\[[1-6]/6\\] demo-phone  "), QRegularExpression::MultilineOption)), 6) << r.out.constData();
+    EXPECT_TRUE(out.contains(QStringLiteral("handset lost; the module goes back to the queue"))) << r.out.constData();
+    EXPECT_TRUE(r.err.contains("\ndemo-phone: Running KVK test ITimer")) << r.err.constData();
+    EXPECT_TRUE(r.err.contains("\ndemo-phone2: Running ")) << r.err.constData();
     const QMap<QString, QString> rows = Rows(r.out);
     EXPECT_EQ(rows.value(QStringLiteral("ITimer")), QStringLiteral("demo-phone 3 1 1 0")) << r.out.constData();
     EXPECT_EQ(rows.value(QStringLiteral("OatAudio")), QStringLiteral("demo-phone 2 1 1 0"));
