@@ -8,6 +8,7 @@
 
 #include <QDir>
 #include <QMap>
+#include <QUrl>
 
 #include <algorithm>
 
@@ -330,7 +331,8 @@ void ModuleDetails(HtmlWriter &html, const RunReport &report, const QString &fol
                 if (j > 0)
                     html.Text(QStringLiteral(", "));
                 const QString relative = base.relativeFilePath(module.logs.at(j));
-                html.Element("a", relative, {{"href", QDir::fromNativeSeparators(relative)}});
+                // A log name may hold "#", "?" or "%": the link is encoded.
+                html.Element("a", relative, {{"href", QString::fromLatin1(QUrl::toPercentEncoding(QDir::fromNativeSeparators(relative), "/"))}});
             }
             html.Close();
         }

@@ -590,6 +590,20 @@ TEST_F(DemoRun, TheHtmlReportWorksInARealBrowser)
     const ToolResult r = Tool({QStringLiteral("run"), QStringLiteral("--all-targets"), QStringLiteral("--test-data"), testData, QStringLiteral("--html"), html});
     ASSERT_EQ(r.status, 1) << r.err.constData();
 
+    // Every link is a relative one to a copied log, or one within the page.
+    const QString page = QString::fromUtf8(testutil::ReadFile(html));
+    int logLinks = 0;
+    static const QRegularExpression link(QStringLiteral("href=\"([^\"]*)\""));
+    for (QRegularExpressionMatchIterator it = link.globalMatch(page); it.hasNext();) {
+        const QString target = it.next().captured(1);
+        if (target.startsWith(QLatin1Char('#')))
+            continue;
+        EXPECT_TRUE(target.startsWith(QStringLiteral("demo/data/Norvane/Targets/demo-phone"))) << target.toStdString();
+        EXPECT_TRUE(QFileInfo(dir.filePath(QUrl::fromPercentEncoding(target.toUtf8()))).isFile()) << target.toStdString();
+        ++logLinks;
+    }
+    EXPECT_GE(logLinks, 7);  // Sockets has two
+
     QTemporaryDir profile;
     ASSERT_TRUE(profile.isValid());
     // The page after its script ran; standard error holds its console.
