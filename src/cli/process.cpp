@@ -33,7 +33,7 @@ int ProcessCommand(const QStringList &arguments)
     setup.AddTo(parser);
     const QCommandLineOption logDir(QStringLiteral("log-dir"), QStringLiteral("The folder of saved logs."), QStringLiteral("DIR"));
     const QCommandLineOption results(QStringLiteral("results"), QStringLiteral("The processed-results file (default: DIR/ProcessedResults/ProcessedResults.xml)."), QStringLiteral("FILE"));
-    parser.addOptions({logDir, results, JUnitOption(), JsonOption()});
+    parser.addOptions({logDir, results, JUnitOption(), JsonOption(), HtmlOption()});
     int status = ExitSuccess;
     if (!ParseArguments(parser, arguments, status, 0, 0))
         return status;

@@ -353,6 +353,14 @@ const QCommandLineOption &JsonOption()
     return option;
 }
 
+const QCommandLineOption &HtmlOption()
+{
+    static const QCommandLineOption option(QStringLiteral("html"),
+                                           QStringLiteral("Write a self-contained HTML report to FILE ('-': standard output)."),
+                                           QStringLiteral("FILE"));
+    return option;
+}
+
 bool CheckOutputPath(const QString &path, QString *error)
 {
     if (path == QLatin1String("-"))
@@ -382,7 +390,7 @@ bool CheckOutputPath(const QString &path, QString *error)
 
 bool CheckReportOutputs(const QCommandLineParser &parser, const QString &command)
 {
-    for (const QCommandLineOption *option : {&JUnitOption(), &JsonOption()}) {
+    for (const QCommandLineOption *option : {&JUnitOption(), &JsonOption(), &HtmlOption()}) {
         QString error;
         if (parser.isSet(*option) && !CheckOutputPath(parser.value(*option), &error)) {
             Err(QStringLiteral("%1: cannot write --%2 %3: %4\n")
@@ -393,17 +401,30 @@ bool CheckReportOutputs(const QCommandLineParser &parser, const QString &command
     return true;
 }
 
-int PublishReport(const RunReport &report, const QCommandLineParser &parser, bool withHandset)
+bool ExportsToOutput(const QCommandLineParser &parser)
 {
-    const bool exportToOutput = (parser.isSet(JUnitOption()) && parser.value(JUnitOption()) == QLatin1String("-"))
-                                || (parser.isSet(JsonOption()) && parser.value(JsonOption()) == QLatin1String("-"));
-    const auto say = exportToOutput ? Err : Out;
+    for (const QCommandLineOption *option : {&JUnitOption(), &JsonOption(), &HtmlOption()}) {
+        if (parser.isSet(*option) && parser.value(*option) == QLatin1String("-"))
+            return true;
+    }
+    return false;
+}
+
+int PublishReport(const RunReport &report, const QCommandLineParser &parser, bool withHandset,
+                  const std::function<QString()> &trailer)
+{
+    const auto say = ExportsToOutput(parser) ? Err : Out;
     say(QStringLiteral("\n") + report.Summary(withHandset));
-    for (const auto &[option, json] : {std::pair{&JUnitOption(), false}, std::pair{&JsonOption(), true}}) {
+    if (trailer)
+        say(trailer());
+    enum Kind { JUnit, Json, Html };
+    for (const auto &[option, kind] : {std::pair{&JUnitOption(), JUnit}, std::pair{&JsonOption(), Json}, std::pair{&HtmlOption(), Html}}) {
         if (!parser.isSet(*option))
             continue;
         const QString path = parser.value(*option);
-        const QByteArray bytes = json ? report.Json() : report.JUnit();
+        const QByteArray bytes = kind == Json  ? report.Json()
+                                 : kind == Html ? report.Html(path == QLatin1String("-") ? QDir::currentPath() : QFileInfo(path).absolutePath())
+                                                : report.JUnit();
         if (path == QLatin1String("-")) {
             Out(QString::fromUtf8(bytes));
             continue;
@@ -414,7 +435,8 @@ int PublishReport(const RunReport &report, const QCommandLineParser &parser, boo
                     .arg(path, error.isEmpty() ? QStringLiteral("unknown error") : error));
             return ExitUsage;
         }
-        say(QStringLiteral("%1: %2\n").arg(json ? QStringLiteral("JSON summary") : QStringLiteral("JUnit report"), path));
+        say(QStringLiteral("%1: %2\n").arg(kind == Json ? QStringLiteral("JSON summary") : kind == Html ? QStringLiteral("HTML report") : QStringLiteral("JUnit report"),
+                                            kind == Html ? QFileInfo(path).absoluteFilePath() : path));
     }
     return ExitSuccess;
 }
@@ -467,7 +489,7 @@ int ReportCommand(const QStringList &arguments)
     QCommandLineParser parser;
     parser.setApplicationDescription(QStringLiteral(
         "Prints the summary of a processed-results file, the verdicts gathered there over every run, "
-        "and exports it as JUnit XML or JSON.\n"
+        "and exports it as JUnit XML, JSON or a self-contained HTML page.\n"
         "Modules without any executed test case are left out unless --all is given.\n"
         "With --merge, merges the processed results of several hosts and handsets (each ran a shard of "
         "one selection) into one row per module; with --expect-all, the modules of the selection that "
@@ -489,7 +511,7 @@ int ReportCommand(const QStringList &arguments)
     SelectionOptions selection;
     setup.AddTo(parser);
     selection.AddTo(parser);
-    parser.addOptions({JUnitOption(), JsonOption(), all, merge, expectAll, pattern, saveTimings});
+    parser.addOptions({JUnitOption(), JsonOption(), HtmlOption(), all, merge, expectAll, pattern, saveTimings});
     int status = ExitSuccess;
     if (!ParseArguments(parser, arguments, status, 1, -1))
         return status;

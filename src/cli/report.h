@@ -7,6 +7,8 @@
 #include <QString>
 #include <QStringList>
 
+#include <functional>
+
 // One test case of a module report.
 struct TestCaseReport
 {
@@ -63,6 +65,9 @@ struct RunReport
     // is an error with the reason; other words are skipped.
     QByteArray JUnit() const;
     QByteArray Json() const;
+    // A self-contained HTML page; links to logs are relative to folder (the
+    // page's own folder).
+    QByteArray Html(const QString &folder) const;
 
     int Total(const QString &result) const;
     int Errors() const;  // test cases of modules that did not finish
@@ -77,9 +82,11 @@ struct RunReport
 // of the few after it), joined by " / ". Empty when the log does not show it.
 QString VerdictLines(const QString &logPath, const QString &testCase, const QString &verdict);
 
-// The --junit FILE and --json FILE options of the commands that report.
+// The --junit FILE, --json FILE and --html FILE options of the commands that
+// report.
 const QCommandLineOption &JUnitOption();
 const QCommandLineOption &JsonOption();
+const QCommandLineOption &HtmlOption();
 
 // True when path ("-" is standard output) can be written: an existing file
 // that is writable, or a new file in an existing writable folder. Else false
@@ -93,4 +100,8 @@ bool CheckReportOutputs(const QCommandLineParser &parser, const QString &command
 // output) and writes the exports the parser's options ask for. ExitUsage
 // (with the reason on standard error) when an export cannot be written, else
 // ExitSuccess.
-int PublishReport(const RunReport &report, const QCommandLineParser &parser, bool withHandset);
+// trailer, when given, adds lines after the summary.
+int PublishReport(const RunReport &report, const QCommandLineParser &parser, bool withHandset,
+                  const std::function<QString()> &trailer = {});
+// True when an export option names standard output ("-").
+bool ExportsToOutput(const QCommandLineParser &parser);

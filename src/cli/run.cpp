@@ -4,19 +4,20 @@
 
 #include "cli/commands.h"
 #include "cli/options.h"
+#include "cli/progress.h"
 #include "cli/report.h"
 #include "cli/setup.h"
 #include "cli/shardoptions.h"
 
 #include "catalogue/testcase.h"
 #include "catalogue/testmodule.h"
+#include "common/clock.h"
 #include "controller/harness.h"
 #include "controller/shardedrun.h"
 #include "environment/testdirectories.h"
 #include "log/log.h"
 
 #include <QDir>
-#include <QElapsedTimer>
 #include <QFileInfo>
 #include <QLockFile>
 #include <QSet>
@@ -218,6 +219,72 @@ ModuleReport RowOf(const ShardedRun::ModuleResult &result, const QSharedPointer<
     return row;
 }
 
+// The modules as the run takes them: run order, each name and source once.
+QList<QSharedPointer<_TestModule>> RunOrder(QList<QSharedPointer<_TestModule>> modules)
+{
+    Harness::SortForRun(modules);
+    QSet<QString> seen;
+    QList<QSharedPointer<_TestModule>> order;
+    for (const QSharedPointer<_TestModule> &module : std::as_const(modules)) {
+        const QString key = module->Source() + QLatin1Char('/') + module->moduleName.toLower();
+        if (!seen.contains(key)) {
+            seen.insert(key);
+            order.append(module);
+        }
+    }
+    return order;
+}
+
+QString Seconds(double seconds)
+{
+    return QString::number(seconds, 'f', seconds < 10 ? 1 : 0) + QStringLiteral(" s");
+}
+
+// What a dry run prints: the handsets, the modules in run order and what
+// the options change about them.
+QString Plan(const QList<QSharedPointer<_TestModule>> &order, const QStringList &handsets, const QStringList &retried,
+             const QStringList &testCases, double timeoutSeconds)
+{
+    QString text = QStringLiteral("Dry run: nothing is installed or started.\n");
+    text += handsets.size() == 1
+                ? QStringLiteral("%1 on %2, in this order:\n").arg(order.size() == 1 ? QStringLiteral("1 module") : QStringLiteral("%1 modules").arg(order.size()), handsets.constFirst())
+                : QStringLiteral("%1 shared by %2 (one queue in this order; each handset takes the next module when it is free):\n")
+                      .arg(order.size() == 1 ? QStringLiteral("1 module") : QStringLiteral("%1 modules").arg(order.size()), handsets.join(QStringLiteral(", ")));
+    int width = 0;
+    for (const QSharedPointer<_TestModule> &module : order)
+        width = qMax(width, int(module->moduleName.size()));
+    const int digits = int(QString::number(order.size()).size());
+    for (qsizetype i = 0; i < order.size(); ++i) {
+        const QSharedPointer<_TestModule> &module = order.at(i);
+        text += QStringLiteral("%1. %2  %3  %4  %5\n")
+                    .arg(i + 1, digits)
+                    .arg(module->moduleName.leftJustified(width), module->TestType(), module->Source(),
+                         module->testCases.size() == 1 ? QStringLiteral("1 test case") : QStringLiteral("%1 test cases").arg(module->testCases.size()));
+    }
+    if (!retried.isEmpty())
+        text += QStringLiteral("--retry leaves out what the processed results show passed: %1\n").arg(retried.join(QStringLiteral(", ")));
+    if (!testCases.isEmpty())
+        text += QStringLiteral("Test cases of %1: %2\n").arg(order.constFirst()->moduleName, testCases.join(QStringLiteral(", ")));
+    if (timeoutSeconds > 0)
+        text += QStringLiteral("A module still running after %1 is stopped.\n").arg(Seconds(timeoutSeconds));
+    return text;
+}
+
+// The slowest modules of a run, longest first.
+QString Slowest(const RunReport &report, int count)
+{
+    QList<const ModuleReport *> timed;
+    for (const ModuleReport &module : report.modules) {
+        if (module.durationMs >= 0 && module.start.isValid())
+            timed.append(&module);
+    }
+    std::stable_sort(timed.begin(), timed.end(), [](const ModuleReport *a, const ModuleReport *b) { return a->durationMs > b->durationMs; });
+    QStringList parts;
+    for (qsizetype i = 0; i < qMin<qsizetype>(count, timed.size()); ++i)
+        parts.append(QStringLiteral("%1 %2").arg(timed.at(i)->name, Seconds(double(timed.at(i)->durationMs) / 1000.0)));
+    return parts.isEmpty() ? QString() : QStringLiteral("Slowest: %1\n").arg(parts.join(QStringLiteral(", ")));
+}
+
 int RunCommand(const QStringList &arguments)
 {
     const QString command = arguments.at(0);
@@ -246,8 +313,10 @@ int RunCommand(const QStringList &arguments)
     const QCommandLineOption retry(QStringLiteral("retry"), QStringLiteral("Run only the selected modules that no handset's processed results show with every test case passed."));
     const QCommandLineOption allTargets(QStringLiteral("all-targets"), QStringLiteral("Share the modules among every handset 'harness targets' lists."));
     const QCommandLineOption wait(QStringLiteral("wait"), QStringLiteral("Wait for a handset another run is using instead of failing."));
+    const QCommandLineOption dryRun(QStringLiteral("dry-run"), QStringLiteral("Print what would run, on which handsets and in which order (after --retry), and stop; no handset is touched."));
+    const QCommandLineOption timeout(QStringLiteral("timeout"), QStringLiteral("Stop a module still running SECONDS after it started: it is removed from the handset and reported as not finished."), QStringLiteral("SECONDS"));
     parser.addOptions({target, testData, dpk, testCases, runOption, noDelete, copyDelay, logDir,
-                       JUnitOption(), JsonOption(), retry, allTargets, wait});
+                       JUnitOption(), JsonOption(), HtmlOption(), retry, allTargets, wait, dryRun, timeout});
     parser.addPositionalArgument(QStringLiteral("PATTERN"), QStringLiteral("Module name patterns ('*' at either end); each must match a module."), QStringLiteral("[PATTERN...]"));
     int status = ExitSuccess;
     if (!ParseArguments(parser, arguments, status))
@@ -262,6 +331,16 @@ int RunCommand(const QStringList &arguments)
         if (!ok)
             return Refuse(command, QStringLiteral("--copy-delay needs a number of milliseconds"));
     }
+    // A week is more than any module may take; the limit keeps the
+    // milliseconds far from overflowing.
+    constexpr double kMaxTimeoutSeconds = 7 * 24 * 3600;
+    double timeoutSeconds = 0;
+    if (parser.isSet(timeout)) {
+        bool ok = false;
+        timeoutSeconds = parser.value(timeout).toDouble(&ok);
+        if (!ok || !(timeoutSeconds > 0) || timeoutSeconds > kMaxTimeoutSeconds)
+            return Refuse(command, QStringLiteral("--timeout needs a number of seconds above 0 and at most %1").arg(kMaxTimeoutSeconds));
+    }
     static const QStringList kRunOptions{QStringLiteral("auto"), QStringLiteral("interactive"), QStringLiteral("all")};
     if (parser.isSet(runOption) && !kRunOptions.contains(parser.value(runOption).toLower()))
         return Refuse(command, QStringLiteral("unknown --run-option '%1' (auto, interactive or all)").arg(parser.value(runOption)));
@@ -275,11 +354,17 @@ int RunCommand(const QStringList &arguments)
     // The selection comes first: it needs the catalogues, not a handset, so
     // a shard plan is printed without touching one. The Harness that makes
     // it runs on the first handset.
+    // One log per handset, so that each names its handset on a shared
+    // console; they all write the same file.
     Log log;
-    const EchoToStandardError echo;
+    log.SetLogPath(setup.LogPath(parser));
+    log.SetVerbose(parser.isSet(setup.verbose));
+    ConsoleFilter console(parser.isSet(setup.verbose));
+    std::vector<std::unique_ptr<Log>> logs;
     std::vector<std::unique_ptr<Harness>> harnesses;
     harnesses.push_back(std::make_unique<Harness>());
-    setup.Apply(parser, *harnesses.front(), log);
+    logs.push_back(std::make_unique<Log>());
+    setup.Apply(parser, *harnesses.front(), *logs.front());
     QList<QSharedPointer<_TestModule>> modules;
     {
         const EchoToStandardError quiet(true);
@@ -295,7 +380,8 @@ int RunCommand(const QStringList &arguments)
     QStringList names;
     if (!ResolveTargets(parser.values(target), parser.isSet(allTargets), command, names))
         return ExitUsage;
-    if (!parser.isSet(allTargets)) {
+    const bool dry = parser.isSet(dryRun);
+    if (!parser.isSet(allTargets) && !dry) {
         for (const QString &name : std::as_const(names)) {
             if (!Reachable(name, command))
                 return ExitUsage;
@@ -303,6 +389,8 @@ int RunCommand(const QStringList &arguments)
     }
     std::vector<std::unique_ptr<QLockFile>> locks;
     for (const QString &name : std::as_const(names)) {
+        if (dry)
+            break;
         locks.push_back(LockHandset(name, parser.isSet(wait), command));
         if (!locks.back())
             return ExitUsage;
@@ -312,9 +400,13 @@ int RunCommand(const QStringList &arguments)
     for (const QString &name : std::as_const(names)) {
         if (name != names.constFirst()) {
             harnesses.push_back(std::make_unique<Harness>());
-            setup.Apply(parser, *harnesses.back(), log);
+            logs.push_back(std::make_unique<Log>());
+            setup.Apply(parser, *harnesses.back(), *logs.back());
         }
         Harness &harness = *harnesses.back();
+        if (names.size() > 1)
+            logs.back()->SetEchoPrefix(name + QStringLiteral(": "));
+        harness.SetModuleTimeLimit(qint64(timeoutSeconds * 1000.0));
         harness.SetTarget(name);
         QString folder = TestDirectories::GetLogDirectory(name);
         if (parser.isSet(logDir)) {
@@ -333,12 +425,12 @@ int RunCommand(const QStringList &arguments)
             harness.SetCopyDelay(parser.value(copyDelay));
     }
 
-
     // The history of each handset: needed by --retry, and a damaged one is
     // said out loud.
     QMap<QString, QString> resultsPaths;
     QStringList damagedBefore;
     QSet<QString> passed;
+    QStringList retried;
     for (const QString &name : std::as_const(names)) {
         const QString path = TestDirectories::GetProcessResultsPath(name);
         resultsPaths.insert(name, path);
@@ -360,7 +452,12 @@ int RunCommand(const QStringList &arguments)
         // What no handset's history shows passed runs again, modules that
         // never ran included.
         modules.erase(std::remove_if(modules.begin(), modules.end(),
-                                     [&](const QSharedPointer<_TestModule> &m) { return passed.contains(m->moduleName.toLower()); }),
+                                     [&](const QSharedPointer<_TestModule> &m) {
+                                         if (!passed.contains(m->moduleName.toLower()))
+                                             return false;
+                                         retried.append(m->moduleName);
+                                         return true;
+                                     }),
                       modules.end());
         if (modules.isEmpty()) {
             Out(QStringLiteral("Every selected module has passed on %1: nothing to retry.\n")
@@ -382,8 +479,25 @@ int RunCommand(const QStringList &arguments)
         }
     }
 
+    const QList<QSharedPointer<_TestModule>> order = RunOrder(modules);
+    if (dry) {
+        retried.sort(Qt::CaseInsensitive);
+        Out(Plan(order, names, retried, wantedCases, timeoutSeconds));
+        return ExitSuccess;
+    }
+
     // ---- The run. ----
+    const bool exportToOutput = ExportsToOutput(parser);
+    int handsetWidth = 0;
+    for (const QString &name : std::as_const(names))
+        handsetWidth = qMax(handsetWidth, int(name.size()));
+    int moduleWidth = 0;
+    for (const QSharedPointer<_TestModule> &module : order)
+        moduleWidth = qMax(moduleWidth, int(module->moduleName.size()));
+    ProgressPrinter progress(exportToOutput ? stderr : stdout, int(order.size()), handsetWidth, moduleWidth);
+    console.SetPrinter(&progress);
     ShardedRun run(&log);
+    run.SetObserver(&progress);
     for (const std::unique_ptr<Harness> &harness : harnesses)
         run.AddHandset(harness.get());
     run.SetTestCases(wantedCases);
@@ -391,13 +505,21 @@ int RunCommand(const QStringList &arguments)
     report.host = QSysInfo::machineHostName();
     report.handsets = names;
     report.start = QDateTime::currentDateTimeUtc();
-    QElapsedTimer elapsed;
-    elapsed.start();
+    const Clock::Timer elapsed;
     // Held until the command returns: a signal while the reports are
     // written only asks for what is being done anyway.
     const StopOnSignal stop(run);
     run.Run(modules);
-    report.durationMs = elapsed.elapsed();
+    progress.Finish();
+    console.SetPrinter(nullptr);
+    // At a reduced time scale the handsets' clocks run ahead of this
+    // thread's: the run took at least as long as its busiest handset.
+    QMap<QString, qint64> busy;
+    for (const ShardedRun::ModuleResult &result : run.Modules())
+        busy[result.record.handset] += qMax<qint64>(result.record.durationMs, 0);
+    report.durationMs = elapsed.Elapsed();
+    for (const qint64 ms : std::as_const(busy))
+        report.durationMs = qMax(report.durationMs, ms);
     report.interrupted = run.Stopped();
     for (const ShardedRun::ModuleResult &result : run.Modules()) {
         QSharedPointer<_TestModule> module;
@@ -407,7 +529,9 @@ int RunCommand(const QStringList &arguments)
         }
         report.modules.append(RowOf(result, module, run.Stopped()));
     }
-    status = PublishReport(report, parser, true);
+    status = PublishReport(report, parser, true, [&] {
+        return QStringLiteral("Elapsed: %1\n").arg(Seconds(double(report.durationMs) / 1000.0)) + Slowest(report, 3);
+    });
 
     QString text;
     for (const ShardedRun::HandsetResult &handset : run.Handsets()) {
@@ -430,7 +554,6 @@ int RunCommand(const QStringList &arguments)
         }
     }
     text += QStringLiteral("Library log: %1\n").arg(setup.LogPath(parser));
-    const bool exportToOutput = parser.value(JUnitOption()) == QLatin1String("-") || parser.value(JsonOption()) == QLatin1String("-");
     (exportToOutput ? Err : Out)(text);
     if (status != ExitSuccess)
         return status;

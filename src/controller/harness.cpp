@@ -47,6 +47,11 @@ void Harness::SetRunObserver(RunObserver *observer)
     m_observer = observer;
 }
 
+void Harness::SetModuleTimeLimit(qint64 ms)
+{
+    m_moduleTimeLimitMs = qMax<qint64>(ms, 0);
+}
+
 void Harness::SetNoDelete(bool noDelete)
 {
     m_noDelete = noDelete;

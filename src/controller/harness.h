@@ -61,6 +61,11 @@ public:
     // with the verdicts recorded for it in this run; not owned, null for
     // none.
     void SetRunObserver(RunObserver *observer);
+    // Milliseconds a module may take from its start until its log is
+    // complete; past it the module is no longer waited for, is removed from
+    // the handset (unless SetNoDelete) and ends as TimedOut. 0 (the default)
+    // leaves only the log wait's own ten-minute limit.
+    void SetModuleTimeLimit(qint64 ms);
     // The run option handed to every module the run starts.
     void SetRunOption(const QString &option);
     // Milliseconds paused before copying a module's logs; text that is not an
@@ -286,4 +291,5 @@ private:
     // module.
     bool m_deferResultsSave = false;
     RunObserver *m_observer = nullptr;
+    qint64 m_moduleTimeLimitMs = 0;
 };

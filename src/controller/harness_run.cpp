@@ -8,6 +8,7 @@
 #include "common/clock.h"
 #include "controller/modulesource.h"
 #include "controller/resultssession.h"
+#include "modules/moduleutil.h"
 
 #include <algorithm>
 
@@ -44,7 +45,8 @@ bool Harness::WaitForLog(QSharedPointer<_TestModule> module)
     for (;;) {
         if (ConnectionDied())
             return false;
-        if (timer.Elapsed() > kLogWaitLimitMs || module->IsLogComplete(m_device))
+        if (timer.Elapsed() > kLogWaitLimitMs || !ModuleUtil::WaitWatch::KeepWaiting()
+            || module->IsLogComplete(m_device))
             return true;
         Clock::Sleep(m_device->platform == IKestoDevice::PLATFORM_WIN32 ? kFastPollMs : kPollMs);
     }
@@ -91,10 +93,20 @@ QString ModuleRecord::Reason() const
         return QStringLiteral("install or start failed");
     case ModuleSource::NoFramework:
         return QStringLiteral("no framework for test type %1").arg(testType);
+    case ModuleSource::TimedOut:
+        return QStringLiteral("stopped after its time limit of %1 s").arg(double(timeLimitMs) / 1000.0);
     case ModuleSource::Interrupted:
         break;
     }
     return QStringLiteral("handset lost");
+}
+
+void RunObserver::ModuleStarted(const ModuleRecord &)
+{
+}
+
+void RunObserver::ModuleWaiting(const ModuleRecord &, const QString &, qint64)
+{
 }
 
 void ModuleSource::Finished(const QSharedPointer<_TestModule> &, Outcome)
@@ -155,13 +167,45 @@ bool Harness::RunModules(ModuleSource &source)
     };
 
     ModuleRecord record;
+    Clock::Timer moduleTimer;
+    // While a module is in hand: what it waits for, and whether it has
+    // outlived the time limit.
+    bool inHand = false;
+    QString waitingFor;
+    bool timedOut = false;
+    const ModuleUtil::WaitWatch watch([&] {
+        if (!inHand)
+            return true;
+        const qint64 elapsed = moduleTimer.Elapsed();
+        if (m_observer)
+            m_observer->ModuleWaiting(record, waitingFor, elapsed);
+        if (m_moduleTimeLimitMs > 0 && elapsed > m_moduleTimeLimitMs)
+            timedOut = true;
+        return !timedOut;
+    });
     // Tells the source and the observer how the module in hand ended.
     const auto finish = [&](const QSharedPointer<_TestModule> &module, ModuleSource::Outcome outcome) {
+        inHand = false;
         record.outcome = outcome;
-        record.durationMs = record.start.msecsTo(QDateTime::currentDateTimeUtc());
+        record.durationMs = moduleTimer.Elapsed();
         if (m_observer)
             m_observer->ModuleEnded(record);
         source.Finished(module, outcome);
+    };
+    // A module past the time limit is no longer waited for and leaves the
+    // handset; true when the handset is still there for the next one.
+    const auto stopTimedOut = [&](const QSharedPointer<_TestModule> &module) {
+        LogMessage(QStringLiteral("   Test %1 did not finish within %2 s; stopping it\n")
+                       .arg(module->moduleName)
+                       .arg(double(m_moduleTimeLimitMs) / 1000.0),
+                   true);
+        if (!m_noDelete && !m_device->connectionLost) {
+            module->RemoveTest(m_device);
+            LogMessage(QStringLiteral("   Removing test %1\n").arg(module->moduleName), true);
+        }
+        record.timeLimitMs = m_moduleTimeLimitMs;
+        finish(module, m_device->connectionLost ? ModuleSource::Interrupted : ModuleSource::TimedOut);
+        return !ConnectionDied();
     };
 
     while (const QSharedPointer<_TestModule> module = source.Next()) {
@@ -171,6 +215,12 @@ bool Harness::RunModules(ModuleSource &source)
         record.testType = module->TestType();
         record.handset = m_device->GetConnectTarget().name;
         record.start = QDateTime::currentDateTimeUtc();
+        moduleTimer.Restart();
+        inHand = true;
+        timedOut = false;
+        waitingFor = QStringLiteral("its framework");
+        if (m_observer)
+            m_observer->ModuleStarted(record);
         module->SetLogger(m_logger);
         const QString name = module->moduleName;
         const QString testType = module->TestType();
@@ -220,7 +270,13 @@ bool Harness::RunModules(ModuleSource &source)
         module->SetRunOption(m_runOption);
 
         result = true;
+        waitingFor = QStringLiteral("its start");
         if (!Run(module)) {
+            if (timedOut) {
+                if (!stopTimedOut(module))
+                    return false;
+                continue;
+            }
             LogMessage(QStringLiteral("Test %1 Failed\n").arg(name), true);
             // A handset that went away fails every module after this one.
             if (m_device->connectionLost) {
@@ -233,10 +289,17 @@ bool Harness::RunModules(ModuleSource &source)
         }
 
         LogMessage(QStringLiteral("   Test %1 Run\n").arg(name), true);
+        waitingFor = QStringLiteral("its log");
         if (!WaitForLog(module)) {
             finish(module, ModuleSource::Interrupted);
             return false;
         }
+        if (timedOut) {
+            if (!stopTimedOut(module))
+                return false;
+            continue;
+        }
+        waitingFor = QStringLiteral("its logs to be copied");
 
         if (m_copyDelay > 0) {
             LogMessage(QStringLiteral("   Sleeping %1 Milliseconds\n").arg(m_copyDelay), true);

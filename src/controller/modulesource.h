@@ -23,6 +23,7 @@ public:
         StartFailed,   // it could not be installed or started
         NoFramework,   // the kit has no framework for its test type
         Interrupted,   // the handset was lost before its logs were copied
+        TimedOut,      // it outlived the run's time limit per module and was removed
     };
 
     virtual ~ModuleSource();
@@ -48,7 +49,8 @@ struct HARNESS_EXPORT ModuleRecord
     QString testType;
     QString handset;       // the connected handset's name
     QDateTime start;       // UTC, when the loop took the module
-    qint64 durationMs = 0; // until the outcome was known
+    qint64 durationMs = 0; // until the outcome was known, on the library's clock
+    qint64 timeLimitMs = 0; // the time limit it outlived (TimedOut)
     ModuleSource::Outcome outcome = ModuleSource::Interrupted;
     // The verdicts the module's logs gave when they were recorded; empty
     // unless outcome is Recorded and a log was recognised.
@@ -61,11 +63,18 @@ struct HARNESS_EXPORT ModuleRecord
     QString Reason() const;
 };
 
-// Told about every module a run loop takes, as soon as its outcome is known
-// (Harness::SetRunObserver). Called on the run loop's thread.
+// Told about every module a run loop takes (Harness::SetRunObserver): when
+// it starts, while it waits, and as soon as its outcome is known. Called on
+// the run loop's thread.
 class HARNESS_EXPORT RunObserver
 {
 public:
     virtual ~RunObserver();
+    // The loop took the module (name, source, test type, handset, start).
+    virtual void ModuleStarted(const ModuleRecord &record);
+    // After every poll of a wait of the module in hand: what it waits for
+    // ("its start", "its log") and the milliseconds since it started, on the
+    // library's clock.
+    virtual void ModuleWaiting(const ModuleRecord &record, const QString &waitingFor, qint64 elapsedMs);
     virtual void ModuleEnded(const ModuleRecord &record) = 0;
 };

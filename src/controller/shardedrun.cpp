@@ -150,6 +150,8 @@ public:
                 record.handset = Name();
                 record.start = QDateTime::currentDateTimeUtc();
                 record.outcome = ModuleSource::StartFailed;
+                if (m_run.m_observer)
+                    m_run.m_observer->ModuleEnded(record);
                 m_queue.Done(index, Name(), ModuleSource::StartFailed, record);
                 continue;
             }
@@ -171,20 +173,34 @@ public:
         m_record = ModuleRecord();
     }
 
+    void ModuleStarted(const ModuleRecord &record) override
+    {
+        if (m_run.m_observer)
+            m_run.m_observer->ModuleStarted(record);
+    }
+
+    void ModuleWaiting(const ModuleRecord &record, const QString &waitingFor, qint64 elapsedMs) override
+    {
+        if (m_run.m_observer)
+            m_run.m_observer->ModuleWaiting(record, waitingFor, elapsedMs);
+    }
+
     void ModuleEnded(const ModuleRecord &record) override
     {
         m_record = record;
         // The wall time of every module that ran to its verdicts is kept
         // beside the handset's processed results, to balance later shards.
-        if (record.outcome != ModuleSource::Recorded)
-            return;
-        const QString path = ModuleTimings::PathBeside(m_harness.GetProcessedResultsPath());
-        QString error;
-        if (!ModuleTimings::Record(path, record.name, record.source,
-                                   {record.durationMs, record.handset, QSysInfo::machineHostName(),
-                                    QDateTime::currentDateTimeUtc()},
-                                   &error))
-            m_run.LogMessage(QStringLiteral("Warning: the time of %1 could not be recorded: %2\n").arg(record.name, error));
+        if (record.outcome == ModuleSource::Recorded) {
+            const QString path = ModuleTimings::PathBeside(m_harness.GetProcessedResultsPath());
+            QString error;
+            if (!ModuleTimings::Record(path, record.name, record.source,
+                                       {record.durationMs, record.handset, QSysInfo::machineHostName(),
+                                        QDateTime::currentDateTimeUtc()},
+                                       &error))
+                m_run.LogMessage(QStringLiteral("Warning: the time of %1 could not be recorded: %2\n").arg(record.name, error));
+        }
+        if (m_run.m_observer)
+            m_run.m_observer->ModuleEnded(record);
     }
 
     bool KeepFrameworks() const override { return true; }
@@ -264,6 +280,11 @@ void ShardedRun::AddHandset(Harness *harness)
 void ShardedRun::SetTestCases(const QStringList &testCases)
 {
     m_testCases = testCases;
+}
+
+void ShardedRun::SetObserver(RunObserver *observer)
+{
+    m_observer = observer;
 }
 
 void ShardedRun::LogMessage(const QString &message) const

@@ -13,6 +13,7 @@
 
 class Harness;
 class Log;
+class RunObserver;
 class _TestModule;
 
 // Runs one selection of modules on several handsets at once. The selected
@@ -83,6 +84,11 @@ public:
     void AddHandset(Harness *harness);
     // Test cases for the first module in run order, wherever it runs.
     void SetTestCases(const QStringList &testCases);
+    // Told about every module each handset takes, on that handset's thread
+    // (so from several threads at once); not owned, null for none. A module
+    // that ends Interrupted goes back to the queue and is told about again
+    // when another handset takes it.
+    void SetObserver(RunObserver *observer);
 
     // Runs the selection (duplicates by name and source run once). Every
     // Harness is set up on the calling thread first, so a missing catalogue
@@ -114,6 +120,7 @@ private:
     std::atomic<bool> m_stop{false};
 
     Log *m_logger = nullptr;
+    RunObserver *m_observer = nullptr;
     QList<Harness *> m_harnesses;
     QStringList m_testCases;
     QList<ModuleResult> m_modules;

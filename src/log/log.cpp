@@ -1,6 +1,7 @@
 #include "log/log.h"
 
 #include <QDir>
+#include <QStringList>
 
 #include <iostream>
 #include <mutex>
@@ -42,6 +43,12 @@ void Log::SetVerbose(bool verbose)
     m_verbose = verbose;
 }
 
+void Log::SetEchoPrefix(const QString &prefix)
+{
+    const std::lock_guard<std::recursive_mutex> locker(LogMutex());
+    m_echoPrefix = prefix;
+}
+
 void Log::SetLogPath(const QString &path)
 {
     const std::lock_guard<std::recursive_mutex> locker(LogMutex());
@@ -60,8 +67,18 @@ void Log::LogMessage(const QString &message, bool echo)
         m_file.write(message.toLatin1());
         CloseLog();
     }
-    if (m_verbose || echo)
+    if (!m_verbose && !echo)
+        return;
+    if (m_echoPrefix.isEmpty()) {
         std::cout << message.toUtf8().constData() << std::endl;
+        return;
+    }
+    QStringList lines = message.split(QLatin1Char('\n'));
+    for (QString &line : lines) {
+        if (!line.isEmpty())
+            line.prepend(m_echoPrefix);
+    }
+    std::cout << lines.join(QLatin1Char('\n')).toUtf8().constData() << std::endl;
 }
 
 void Log::EchoDot(bool newLine, unsigned int indent)

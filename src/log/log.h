@@ -25,6 +25,9 @@ public:
 
     // When set, every message is echoed to the console.
     void SetVerbose(bool verbose);
+    // Text put before every line of this Log's console echo (not the file),
+    // e.g. the handset's name when several handsets share the console.
+    void SetEchoPrefix(const QString &prefix);
 
     // A non-empty path names the log file; an empty one "log.txt" in the
     // current directory. Does not open the file.
@@ -44,5 +47,6 @@ private:
     void CloseLog();
 
     QFile m_file;
+    QString m_echoPrefix;
     bool m_verbose = false;
 };

@@ -11,6 +11,8 @@
 #include <QFileInfo>
 #include <QTemporaryFile>
 
+#include <utility>
+
 namespace ModuleUtil {
 
 namespace {
@@ -94,7 +96,7 @@ bool WaitWhileRunning(const std::function<bool()> &running, bool growing)
 {
     qint64 delay = 1;
     for (int polls = 0; running(); ++polls) {
-        if (polls >= kMaxRunPolls)
+        if (polls >= kMaxRunPolls || !WaitWatch::KeepWaiting())
             return false;
         Clock::Sleep(delay);
         if (growing)
@@ -153,9 +155,28 @@ bool WaitForLogMarker(IKestoDevice *device, const QString &devicePath, const QBy
             }
         }
         // A handset that went away will never complete the log.
-        if (waited > kLogWaitLimitMs || (device && device->connectionLost))
+        if (waited > kLogWaitLimitMs || (device && device->connectionLost) || !WaitWatch::KeepWaiting())
             return false;
     }
+}
+
+namespace {
+thread_local WaitWatch *t_watch = nullptr;
+} // namespace
+
+WaitWatch::WaitWatch(std::function<bool()> keepWaiting) : m_keepWaiting(std::move(keepWaiting)), m_outer(t_watch)
+{
+    t_watch = this;
+}
+
+WaitWatch::~WaitWatch()
+{
+    t_watch = m_outer;
+}
+
+bool WaitWatch::KeepWaiting()
+{
+    return !t_watch || !t_watch->m_keepWaiting || t_watch->m_keepWaiting();
 }
 
 } // namespace ModuleUtil

@@ -47,7 +47,8 @@ HARNESS_EXPORT bool ForEachLogLine(const QString &path, const std::function<void
 
 // Waits while running() answers true, sleeping between polls: a delay that
 // starts at 1 ms and grows by 50 ms up to 1000 ms (growing), or 1 ms each
-// time. True when the test stopped within kMaxRunPolls polls.
+// time. True when the test stopped within kMaxRunPolls polls (and its
+// WaitWatch, if any, let it wait).
 HARNESS_EXPORT bool WaitWhileRunning(const std::function<bool()> &running, bool growing);
 
 // Copies a handset file to a private temporary host file, lets it settle
@@ -63,8 +64,29 @@ enum class WaitProgress {
 
 // Polls the handset log until it holds marker (letter case as given), with
 // a delay from 100 ms growing by 100 ms up to 2000 ms. False once the delays
-// add up to more than kLogWaitLimitMs without the marker.
+// add up to more than kLogWaitLimitMs without the marker, or when this
+// thread's WaitWatch says to stop.
 HARNESS_EXPORT bool WaitForLogMarker(IKestoDevice *device, const QString &devicePath,
                                      const QByteArray &marker, Log *logger, WaitProgress progress);
+
+// Lets a caller watch the waits of its own thread: while a WaitWatch is
+// alive, WaitWhileRunning and WaitForLogMarker call it after every poll, and
+// give up (returning false) as soon as it answers false. Watches nest; the
+// innermost one is asked.
+class HARNESS_EXPORT WaitWatch
+{
+public:
+    explicit WaitWatch(std::function<bool()> keepWaiting);
+    ~WaitWatch();
+    WaitWatch(const WaitWatch &) = delete;
+    WaitWatch &operator=(const WaitWatch &) = delete;
+
+    // What the innermost watch of this thread answers; true without one.
+    static bool KeepWaiting();
+
+private:
+    std::function<bool()> m_keepWaiting;
+    WaitWatch *m_outer;
+};
 
 } // namespace ModuleUtil

@@ -15,6 +15,8 @@
 #include <QSet>
 #include <QTemporaryDir>
 #include <QThread>
+#include <QStandardPaths>
+#include <QUrl>
 
 #include <gtest/gtest.h>
 
@@ -195,7 +197,7 @@ TEST_F(DemoRun, AnInterruptedRunEndsTheModuleInHandAndReportsTheRest)
         tool.setProcessEnvironment(env);
         tool.setWorkingDirectory(dir.path());
         tool.start(QStringLiteral(HARNESS_BINARY_DIR "/harness"),
-                   WithLog({QStringLiteral("run"), QStringLiteral("--junit"), junit}));
+                   WithLog({QStringLiteral("run"), QStringLiteral("--verbose"), QStringLiteral("--junit"), junit}));
         tool.setReadChannel(QProcess::StandardError);
         ASSERT_TRUE(tool.waitForStarted());
         // Stop as soon as the first module is under way.
@@ -207,6 +209,7 @@ TEST_F(DemoRun, AnInterruptedRunEndsTheModuleInHandAndReportsTheRest)
             }
         };
         readUntil("Running KVK test");
+        ASSERT_GT(tool.processId(), 0) << err.constData();
         ::kill(pid_t(tool.processId()), SIGINT);
         if (stops == 2) {
             readUntil("signal again");
@@ -399,8 +402,14 @@ TEST_F(DemoRun, SharedRunsNameTheHandsetOfEachModule)
     AddHandset(QStringLiteral("demo-phone2"), "offlineAfter=1\n");  // lost with a module in hand
     AddHandset(QStringLiteral("demo-phone3"));
     testutil::WriteFile(handsets + QStringLiteral("/demo-phone3/offline"), "");
-    const ToolResult r = Tool({QStringLiteral("run"), QStringLiteral("--all-targets"), QStringLiteral("--test-data"), testData});
+    const ToolResult r = Tool({QStringLiteral("run"), QStringLiteral("--verbose"), QStringLiteral("--all-targets"), QStringLiteral("--test-data"), testData});
     EXPECT_EQ(r.status, 1) << r.err.constData() << r.out.constData();
+    // Every progress line and every library line names its handset.
+    const QString out = QString::fromUtf8(r.out);
+    EXPECT_EQ(out.count(QRegularExpression(QStringLiteral("^\\[[1-6]/6\\] demo-phone  "), QRegularExpression::MultilineOption)), 6) << r.out.constData();
+    EXPECT_TRUE(out.contains(QStringLiteral("handset lost; the module goes back to the queue"))) << r.out.constData();
+    EXPECT_TRUE(r.err.contains("\ndemo-phone: Running KVK test ITimer")) << r.err.constData();
+    EXPECT_TRUE(r.err.contains("\ndemo-phone2: Running ")) << r.err.constData();
     const QMap<QString, QString> rows = Rows(r.out);
     EXPECT_EQ(rows.value(QStringLiteral("ITimer")), QStringLiteral("demo-phone 3 1 1 0")) << r.out.constData();
     EXPECT_EQ(rows.value(QStringLiteral("OatAudio")), QStringLiteral("demo-phone 2 1 1 0"));
@@ -453,6 +462,245 @@ TEST_F(DemoRun, ShardsOfOneSelectionMergeIntoTheVerdictsOfOneRun)
     EXPECT_EQ(half.status, 1);
     EXPECT_EQ(Rows(half.out).size(), 6) << half.out.constData();
     EXPECT_TRUE(half.out.contains("not run by any shard")) << half.out.constData();
+}
+
+// ---- What a run shows while it runs and afterwards. ----
+
+// The tool on a terminal: "script" gives it one; everything it wrote, both
+// streams. Empty when there is no "script" here.
+QByteArray OnTerminal(const QStringList &arguments, const QProcessEnvironment &env, const QString &folder)
+{
+    if (!testutil::HaveProgram(QStringLiteral("script")))
+        return {};
+    QStringList quoted{QStringLiteral(HARNESS_BINARY_DIR "/harness")};
+    for (const QString &argument : arguments)
+        quoted.append(QLatin1Char('\'') + argument + QLatin1Char('\''));
+    QProcess tool;
+    tool.setProcessEnvironment(env);
+    tool.setWorkingDirectory(folder);
+    tool.start(QStringLiteral("script"), {QStringLiteral("-q"), QStringLiteral("-e"), QStringLiteral("-c"),
+                                           quoted.join(QLatin1Char(' ')), QStringLiteral("/dev/null")});
+    tool.closeWriteChannel();
+    if (!tool.waitForFinished(120000))
+        return {};
+    return tool.readAll();
+}
+
+// Makes the ITimer module of the demo kit one that never completes its log:
+// its package is taken apart and put together again with tar.
+void HangITimer(const QString &root)
+{
+    const QString folder = root + QStringLiteral("/kits/DemoKit/tests/system/timer/ITimer/package");
+    const QString package = folder + QStringLiteral("/ITimer_Win32_Release.kestix");
+    const QString work = folder + QStringLiteral("/unpacked");
+    ASSERT_TRUE(QDir().mkpath(work));
+    ASSERT_EQ(testutil::RunProgram(QStringLiteral("tar"), {QStringLiteral("-xf"), package, QStringLiteral("-C"), work}), 0);
+    const QString behaviour = work + QStringLiteral("/itimer/behaviour");
+    QByteArray script = testutil::ReadFile(behaviour);
+    ASSERT_TRUE(script.contains("echo '[/VERBOSE]'\n"));
+    testutil::WriteFile(behaviour, script.replace("echo '[/VERBOSE]'\n", ""));
+    ASSERT_EQ(testutil::RunProgram(QStringLiteral("tar"), {QStringLiteral("-cf"), package, QStringLiteral("-C"), work, QStringLiteral("itimer")}), 0);
+    QDir(work).removeRecursively();
+}
+
+TEST_F(DemoRun, ProgressShowsOneLinePerModuleAndColourOnlyOnATerminal)
+{
+    const ToolResult r = Tool({QStringLiteral("run"), QStringLiteral("--test-data"), testData});
+    EXPECT_EQ(r.status, 1) << r.err.constData();
+    const QString out = QString::fromUtf8(r.out);
+    static const QRegularExpression timer(QStringLiteral("\n\\[[1-6]/6\\] demo-phone  ITimer +3 passed 1 failed 1 unsupported  \\d+\\.\\d s\n"));
+    EXPECT_TRUE(out.contains(timer)) << r.out.constData();
+    EXPECT_EQ(out.count(QRegularExpression(QStringLiteral("^\\[[1-6]/6\\] demo-phone  "), QRegularExpression::MultilineOption)), 6);
+    EXPECT_TRUE(out.contains(QRegularExpression(QStringLiteral("Total \\(6 modules\\).*\nElapsed: \\d+\\.\\d s\nSlowest: \\w+ \\d"))));
+    EXPECT_FALSE(r.out.contains('\033'));
+    // The library's own messages stay in its log unless asked for.
+    EXPECT_FALSE(r.out.contains("Running KVK test") || r.err.contains("Running KVK test")) << r.err.constData();
+    EXPECT_TRUE(testutil::ReadFile(dir.filePath(QStringLiteral("harness.log"))).contains("Running KVK test"));
+    const ToolResult verbose = Tool({QStringLiteral("run"), QStringLiteral("--verbose"), QStringLiteral("IClock")});
+    EXPECT_TRUE(verbose.err.contains("Running KVK test IClock")) << verbose.err.constData();
+    EXPECT_FALSE(verbose.err.contains("\n\n"));
+
+    const QStringList arguments = WithLog({QStringLiteral("run"), QStringLiteral("ITimer")});
+    const QByteArray coloured = OnTerminal(arguments, env, dir.path());
+    if (coloured.isEmpty())
+        GTEST_SKIP() << "no terminal to try colour on ('script' is missing or did not run)";
+    EXPECT_TRUE(coloured.contains("\033[32m3 passed\033[0m \033[31m1 failed\033[0m")) << coloured.constData();
+    QProcessEnvironment plain = env;
+    plain.insert(QStringLiteral("NO_COLOR"), QStringLiteral("1"));
+    const QByteArray noColour = OnTerminal(arguments, plain, dir.path());
+    EXPECT_TRUE(noColour.contains("ITimer  3 passed 1 failed 1 unsupported")) << noColour.constData();
+    EXPECT_FALSE(noColour.contains("\033[3"));
+}
+
+TEST_F(DemoRun, AModulePastItsTimeoutIsStoppedRemovedAndReportedWhileTheRunGoesOn)
+{
+    HangITimer(root);
+    const QString junit = dir.filePath(QStringLiteral("junit.xml"));
+    // 150 s on the library's clock: instant at time scale 0.
+    const QStringList arguments{QStringLiteral("run"), QStringLiteral("--timeout"), QStringLiteral("150"),
+                                QStringLiteral("--junit"), junit, QStringLiteral("ITimer"), QStringLiteral("IClock")};
+    const ToolResult r = Tool(arguments);
+    EXPECT_EQ(r.status, 1) << r.err.constData();
+    EXPECT_TRUE(r.out.contains("Not finished: ITimer on demo-phone: stopped after its time limit of 150 s")) << r.out.constData();
+    EXPECT_EQ(Rows(r.out).value(QStringLiteral("IClock")), QStringLiteral("demo-phone 3 0 0 0"));
+    // Off a terminal, a long module shows it is alive once a minute.
+    const QString out = QString::fromUtf8(r.out);
+    EXPECT_EQ(out.count(QRegularExpression(QStringLiteral(R"(\n\[\.\.\.\] demo-phone  ITimer  still running: waiting for its log, [12] min \d+ s\n)"))), 2)
+        << r.out.constData();
+    EXPECT_EQ(Installed(QStringLiteral("demo-phone")), QStringList());
+    ExpectValidJUnit(junit);
+    EXPECT_EQ(ReadXml(junit).attribute(QStringLiteral("errors")), QStringLiteral("5"));
+
+    // On a terminal the same wait is a status line rewritten in place.
+    const QByteArray terminal = OnTerminal(WithLog({QStringLiteral("run"), QStringLiteral("--timeout"), QStringLiteral("20"), QStringLiteral("ITimer")}), env, dir.path());
+    if (testutil::HaveProgram(QStringLiteral("script"))) {
+        EXPECT_TRUE(QString::fromUtf8(terminal).contains(QRegularExpression(QStringLiteral("\r\033\\[KITimer on demo-phone: waiting for its log, 1\\d s"))))
+            << terminal.constData();
+        EXPECT_FALSE(terminal.contains("still running"));
+    }
+
+    for (const char *bad : {"0", "-3", "soon", "1e9"}) {
+        const ToolResult refused = Tool({QStringLiteral("run"), QStringLiteral("--timeout"), QLatin1String(bad)});
+        EXPECT_EQ(refused.status, 2) << bad;
+        EXPECT_TRUE(refused.err.contains("--timeout needs a number of seconds")) << refused.err.constData();
+    }
+}
+
+TEST_F(DemoRun, ADryRunSaysWhatWouldRunWhereAndInWhichOrderAndTouchesNothing)
+{
+    ASSERT_EQ(Tool({QStringLiteral("run"), QStringLiteral("IClock")}).status, 0);
+    const QByteArray before = testutil::ReadFile(results);
+    AddHandset(QStringLiteral("demo-phone2"));
+    // Not even an offline handset is a reason to stop: nothing is connected.
+    testutil::WriteFile(handsets + QStringLiteral("/demo-phone2/offline"), "");
+    const ToolResult r = Tool({QStringLiteral("run"), QStringLiteral("--dry-run"), QStringLiteral("--retry"), QStringLiteral("--timeout"), QStringLiteral("90"),
+                               QStringLiteral("--target"), QStringLiteral("demo-phone"), QStringLiteral("--target"), QStringLiteral("demo-phone2")});
+    EXPECT_EQ(r.status, 0) << r.err.constData();
+    EXPECT_EQ(QString::fromUtf8(r.out),
+              QStringLiteral("Dry run: nothing is installed or started.\n"
+                             "5 modules shared by demo-phone, demo-phone2 (one queue in this order; each handset takes the next module when it is free):\n"
+                             "1. ITimer           ctf  KVK  5 test cases\n"
+                             "2. PlatformVersion  ctf  PVS  2 test cases\n"
+                             "3. Widgets          ctfapplet  KVK  3 test cases\n"
+                             "4. OatAudio         oat  KVK  4 test cases\n"
+                             "5. Sockets          uitf  KVK  4 test cases\n"
+                             "--retry leaves out what the processed results show passed: IClock\n"
+                             "A module still running after 90 s is stopped.\n"));
+    EXPECT_EQ(testutil::ReadFile(results), before);
+    EXPECT_FALSE(QFileInfo::exists(targets + QStringLiteral("/demo-phone2/Logs/ProcessedResults/ProcessedResults.xml")));
+    EXPECT_FALSE(QFileInfo::exists(targets + QStringLiteral("/demo-phone/run.lock")));
+    EXPECT_EQ(Installed(QStringLiteral("demo-phone")), QStringList());
+}
+
+TEST_F(DemoRun, TheHtmlReportOfARunCutShortShowsItsNotRunModules)
+{
+    AddToIni(QStringLiteral("demo-phone"), "offlineAfter=12\n");
+    const QString html = dir.filePath(QStringLiteral("out/report.html"));
+    QDir().mkpath(dir.filePath(QStringLiteral("out")));
+    const ToolResult r = Tool({QStringLiteral("run"), QStringLiteral("--html"), html});
+    EXPECT_EQ(r.status, 1) << r.err.constData();
+    EXPECT_TRUE(r.out.contains("HTML report: " + html.toUtf8() + "\n")) << r.out.constData();
+    const QString page = QString::fromUtf8(testutil::ReadFile(html));
+    EXPECT_TRUE(page.contains(QStringLiteral("<b data-count=\"not finished\">6</b>"))) << page.toStdString();
+    EXPECT_TRUE(page.contains(QStringLiteral("Not finished: not run: every handset was lost")));
+    EXPECT_EQ(page.count(QStringLiteral("<tr class=\"module\"")), 6);
+    EXPECT_EQ(page.count(QStringLiteral("<span class=\"outcome notfinished\">not finished</span>")), 6);
+    // Self-contained: nothing is fetched from anywhere.
+    EXPECT_FALSE(page.contains(QRegularExpression(QStringLiteral("(src|href)=\"(https?:|//)"))));
+}
+
+TEST_F(DemoRun, TheHtmlReportEscapesNamesAndSaysThatNoHistoryIsRecorded)
+{
+    const QString file = dir.filePath(QStringLiteral("results.xml"));
+    testutil::WriteFile(file, "<testmodules><module name=\"&lt;script&gt;alert(1)&lt;/script&gt;\" family=\"a&amp;b\" source=\"KVK\">"
+                              "<testcase name=\"&lt;img src=x onerror=alert(2)&gt;\" result=\"fail\"/></module></testmodules>");
+    const QString html = dir.filePath(QStringLiteral("history.html"));
+    const ToolResult r = RunTool({QStringLiteral("report"), file, QStringLiteral("--html"), html}, env, dir.path());
+    EXPECT_EQ(r.status, 1) << r.err.constData();
+    const QString page = QString::fromUtf8(testutil::ReadFile(html));
+    EXPECT_TRUE(page.contains(QStringLiteral("&lt;script&gt;alert(1)&lt;/script&gt;"))) << page.toStdString();
+    EXPECT_TRUE(page.contains(QStringLiteral("&lt;img src=x onerror=alert(2)&gt;")));
+    EXPECT_TRUE(page.contains(QStringLiteral("a&amp;b")));
+    EXPECT_FALSE(page.contains(QStringLiteral("<script>alert")));
+    EXPECT_FALSE(page.contains(QStringLiteral("<img")));
+    EXPECT_EQ(page.count(QStringLiteral("<script>")), 1);  // the page's own
+    EXPECT_TRUE(page.contains(QStringLiteral("no history across runs is recorded")));
+}
+
+// Headless Chromium renders the report of a run shared by two handsets.
+TEST_F(DemoRun, TheHtmlReportWorksInARealBrowser)
+{
+    QString chromium = QStandardPaths::findExecutable(QStringLiteral("chromium"));
+    if (chromium.isEmpty())
+        GTEST_SKIP() << "headless browser test skipped: no 'chromium' on PATH (./run installs Debian's chromium package)";
+    AddHandset(QStringLiteral("demo-phone2"));
+    const QString html = dir.filePath(QStringLiteral("report.html"));
+    const ToolResult r = Tool({QStringLiteral("run"), QStringLiteral("--all-targets"), QStringLiteral("--test-data"), testData, QStringLiteral("--html"), html});
+    ASSERT_EQ(r.status, 1) << r.err.constData();
+
+    // Every link is a relative one to a copied log, or one within the page.
+    const QString page = QString::fromUtf8(testutil::ReadFile(html));
+    int logLinks = 0;
+    static const QRegularExpression link(QStringLiteral("href=\"([^\"]*)\""));
+    for (QRegularExpressionMatchIterator it = link.globalMatch(page); it.hasNext();) {
+        const QString target = it.next().captured(1);
+        if (target.startsWith(QLatin1Char('#')))
+            continue;
+        EXPECT_TRUE(target.startsWith(QStringLiteral("demo/data/Norvane/Targets/demo-phone"))) << target.toStdString();
+        EXPECT_TRUE(QFileInfo(dir.filePath(QUrl::fromPercentEncoding(target.toUtf8()))).isFile()) << target.toStdString();
+        ++logLinks;
+    }
+    EXPECT_GE(logLinks, 7);  // Sockets has two
+
+    QTemporaryDir profile;
+    ASSERT_TRUE(profile.isValid());
+    // The page after its script ran; standard error holds its console.
+    const auto browse = [&](const QStringList &what, const QString &fragment, QByteArray &err) {
+        QProcess browser;
+        browser.start(chromium, QStringList{QStringLiteral("--headless"), QStringLiteral("--no-sandbox"), QStringLiteral("--disable-gpu"),
+                                            QStringLiteral("--disable-quic"), QStringLiteral("--no-first-run"),
+                                            QStringLiteral("--disable-background-networking"), QStringLiteral("--disable-component-update"),
+                                            QStringLiteral("--disable-sync"), QStringLiteral("--user-data-dir=") + profile.path(),
+                                            QStringLiteral("--enable-logging=stderr"), QStringLiteral("--v=0")}
+                                    + what + QStringList{QUrl::fromLocalFile(html).toString() + fragment});
+        if (!browser.waitForFinished(120000) || browser.exitCode() != 0) {
+            browser.kill();
+            browser.waitForFinished();
+            return QByteArray();
+        }
+        err = browser.readAllStandardError();
+        return browser.readAllStandardOutput();
+    };
+    QByteArray console;
+    const QString dom = QString::fromUtf8(browse({QStringLiteral("--dump-dom")}, QString(), console));
+    if (dom.isEmpty())
+        GTEST_SKIP() << "headless browser test skipped: chromium did not run here: " << console.constData();
+    // The page writes nothing to the console: any line there is an error.
+    for (const QByteArray &line : console.split('\n'))
+        EXPECT_FALSE(line.contains(":CONSOLE")) << line.constData();
+    EXPECT_TRUE(dom.contains(QStringLiteral("<b data-count=\"passed\">14</b>"))) << dom.toStdString();
+    EXPECT_TRUE(dom.contains(QStringLiteral("<b data-count=\"failed\">4</b>")));
+    EXPECT_TRUE(dom.contains(QStringLiteral("<b data-count=\"unsupported\">3</b>")));
+    EXPECT_EQ(dom.count(QStringLiteral("<g class=\"lane\"")), 2);
+    EXPECT_EQ(dom.count(QStringLiteral("<rect class=\"module ")), 6);
+    EXPECT_TRUE(dom.contains(QStringLiteral("data-filter=\"all\"")));
+    EXPECT_FALSE(dom.contains(QStringLiteral("hidden=\"\"")));
+
+    // "#failures" in the address leaves only the modules with a failure.
+    const QString failures = QString::fromUtf8(browse({QStringLiteral("--dump-dom")}, QStringLiteral("#failures"), console));
+    EXPECT_TRUE(failures.contains(QStringLiteral("data-filter=\"failures\""))) << failures.toStdString();
+    static const QRegularExpression row(QStringLiteral("<tr class=\"module\" data-module=\"(\\w+)\" data-ok=\"(\\d)\"( hidden=\"\")?>"));
+    int shown = 0;
+    for (QRegularExpressionMatchIterator it = row.globalMatch(failures); it.hasNext();) {
+        const QRegularExpressionMatch m = it.next();
+        EXPECT_EQ(m.captured(3).isEmpty(), m.captured(2) == QLatin1String("0")) << m.captured(0).toStdString();
+        shown += m.captured(3).isEmpty() ? 1 : 0;
+    }
+    EXPECT_EQ(shown, 4);
+
+    const QString shot = dir.filePath(QStringLiteral("report.png"));
+    browse({QStringLiteral("--screenshot=") + shot, QStringLiteral("--window-size=1280,1600")}, QString(), console);
+    EXPECT_TRUE(testutil::ReadFile(shot).startsWith("\x89PNG"));
 }
 
 } // namespace

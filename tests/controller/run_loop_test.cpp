@@ -9,7 +9,9 @@
 #include "support/handsetfixture.h"
 
 #include <QDir>
+#include <QMap>
 #include <QRegularExpression>
+#include <QSet>
 
 namespace {
 
@@ -293,6 +295,49 @@ TEST_F(RunLoopTest, LogIsPolledEverySecondOnHandsetsAndCopiedAfterTenMinutesAtMo
     EXPECT_GE(never->pollTimes.size(), 590);
     EXPECT_LE(never->pollTimes.size(), 602);
     EXPECT_TRUE(m_events.contains(QStringLiteral("copy Stuck")));
+}
+
+TEST_F(RunLoopTest, AModulePastTheTimeLimitIsRemovedUncopiedAndTheObserverSeesItsWait)
+{
+    QSharedPointer<RecordingModule> stuck = Queue(QStringLiteral("Stuck"), QStringLiteral("ctf"));
+    stuck->pollsNeeded = 1000000;
+    QSharedPointer<RecordingModule> next = Queue(QStringLiteral("Zeta"), QStringLiteral("ctf"));
+    struct Watcher : RunObserver {
+        void ModuleStarted(const ModuleRecord &record) override { events.append(QStringLiteral("start ") + record.name); }
+        void ModuleWaiting(const ModuleRecord &record, const QString &what, qint64 elapsedMs) override
+        {
+            EXPECT_GE(elapsedMs, lastElapsed);
+            lastElapsed = elapsedMs;
+            waits.insert(record.name + QLatin1Char(' ') + what);
+        }
+        void ModuleEnded(const ModuleRecord &record) override
+        {
+            events.append(QStringLiteral("end ") + record.name);
+            ended.insert(record.name, record);
+            lastElapsed = 0;
+        }
+        QStringList events;
+        QSet<QString> waits;
+        qint64 lastElapsed = 0;
+        QMap<QString, ModuleRecord> ended;
+    } watcher;
+    m_harness.SetRunObserver(&watcher);
+    m_harness.SetModuleTimeLimit(5000);
+    EXPECT_TRUE(m_harness.Run());
+    m_harness.SetRunObserver(nullptr);
+
+    EXPECT_EQ(watcher.events, (QStringList{QStringLiteral("start Stuck"), QStringLiteral("end Stuck"),
+                                           QStringLiteral("start Zeta"), QStringLiteral("end Zeta")}));
+    EXPECT_TRUE(watcher.waits.contains(QStringLiteral("Stuck its log")));
+    const ModuleRecord timedOut = watcher.ended.value(QStringLiteral("Stuck"));
+    EXPECT_EQ(timedOut.outcome, ModuleSource::TimedOut);
+    EXPECT_GT(timedOut.durationMs, 5000);
+    EXPECT_LT(timedOut.durationMs, 6500);
+    EXPECT_EQ(timedOut.Reason(), QStringLiteral("stopped after its time limit of 5 s"));
+    EXPECT_LT(stuck->pollTimes.size(), 10);
+    EXPECT_TRUE(m_events.contains(QStringLiteral("remove Stuck")));
+    EXPECT_FALSE(m_events.contains(QStringLiteral("copy Stuck")));
+    EXPECT_EQ(watcher.ended.value(QStringLiteral("Zeta")).outcome, ModuleSource::Recorded);
 }
 
 TEST(RunLoopSimulator, SimulatorHandsetsArePolledEveryQuarterSecond)
