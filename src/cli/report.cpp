@@ -87,6 +87,25 @@ QString VerdictLines(const QString &logPath, const QString &testCase, const QStr
     return {};
 }
 
+QHash<QString, qint64> CaseTimes(const QString &logPath)
+{
+    QHash<QString, qint64> times;
+    QFile file(logPath);
+    if (!file.open(QIODevice::ReadOnly | QIODevice::Text) || file.size() > (16 << 20))
+        return times;
+    for (const QString &line : QString::fromUtf8(file.readAll()).split(QLatin1Char('\n'))) {
+        const QStringList words = line.split(QLatin1Char(' '), Qt::SkipEmptyParts);
+        if (words.size() != 4)
+            continue;
+        bool ok = false;
+        const double value = words.at(2).toDouble(&ok);
+        const QString unit = words.at(3).toLower();
+        if (ok && value >= 0 && value < 1e12 && (unit == QLatin1String("ms") || unit == QLatin1String("s")))
+            times.insert(words.at(0), qint64(unit == QLatin1String("s") ? value * 1000.0 : value));
+    }
+    return times;
+}
+
 int ModuleReport::Count(const QString &result) const
 {
     return int(std::count_if(testCases.cbegin(), testCases.cend(),
@@ -227,6 +246,8 @@ QByteArray RunReport::JUnit() const
             QDomElement element = document.createElement(QStringLiteral("testcase"));
             element.setAttribute(QStringLiteral("name"), testCase.name);
             element.setAttribute(QStringLiteral("classname"), className);
+            if (testCase.timeMs >= 0)
+                element.setAttribute(QStringLiteral("time"), Seconds(testCase.timeMs));
             if (!module.Finished()) {
                 QDomElement error = document.createElement(QStringLiteral("error"));
                 error.setAttribute(QStringLiteral("message"), module.reason);
@@ -281,11 +302,12 @@ QByteArray RunReport::Json() const
     QJsonArray list;
     for (const ModuleReport &module : modules) {
         QJsonArray cases;
-        for (const TestCaseReport &testCase : module.testCases)
-        {
+        for (const TestCaseReport &testCase : module.testCases) {
             QJsonObject object{{QStringLiteral("name"), testCase.name}, {QStringLiteral("result"), testCase.result}};
             if (!testCase.detail.isEmpty())
                 object.insert(QStringLiteral("detail"), testCase.detail);
+            if (testCase.timeMs >= 0)
+                object.insert(QStringLiteral("timeMs"), testCase.timeMs);
             cases.append(object);
         }
         QJsonObject object{{QStringLiteral("name"), module.name},

@@ -3,6 +3,7 @@
 #include <QCommandLineOption>
 #include <QCommandLineParser>
 #include <QDateTime>
+#include <QHash>
 #include <QList>
 #include <QString>
 #include <QStringList>
@@ -15,6 +16,7 @@ struct TestCaseReport
     QString name;
     QString result;  // "pass", "fail", "unsupported", "unexecuted" or the log's own word
     QString detail;  // for a failure: the log's lines that give the verdict, when found
+    qint64 timeMs = -1;  // as the log gives it; -1 when it gives none
 };
 
 // One module of a report: where and when it ran, how it ended and its
@@ -81,6 +83,10 @@ struct RunReport
 // line naming the test case and the line with the word (the same line, or one
 // of the few after it), joined by " / ". Empty when the log does not show it.
 QString VerdictLines(const QString &logPath, const QString &testCase, const QString &verdict);
+
+// The times a log's result table gives its test cases ("NAME VERDICT 12 ms"
+// or "... 1.5 s"), in milliseconds by test case name.
+QHash<QString, qint64> CaseTimes(const QString &logPath);
 
 // The --junit FILE, --json FILE and --html FILE options of the commands that
 // report.

@@ -196,8 +196,11 @@ ModuleReport RowOf(const ShardedRun::ModuleResult &result, const QSharedPointer<
         row.logs = record.logs;
     }
     if (result.ran && result.outcome == ModuleSource::Recorded && record.parsed) {
+        QHash<QString, qint64> times;
+        for (const QString &log : record.logs)
+            times.insert(CaseTimes(log));
         for (const TestCaseResult &verdict : record.results.caseResults) {
-            TestCaseReport testCase{verdict.testCase, verdict.result, QString()};
+            TestCaseReport testCase{verdict.testCase, verdict.result, QString(), times.value(verdict.testCase, -1)};
             for (qsizetype i = 0; testCase.result == QLatin1String("fail") && testCase.detail.isEmpty() && i < record.logs.size(); ++i)
                 testCase.detail = VerdictLines(record.logs.at(i), verdict.testCase, verdict.result);
             row.testCases.append(testCase);

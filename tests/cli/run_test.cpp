@@ -151,6 +151,9 @@ TEST_F(DemoRun, ReportsEveryModuleOfThisRunWithItsHandsetTimesAndLogs)
     const QString message = timer.elementsByTagName(QStringLiteral("failure")).at(0).toElement().attribute(QStringLiteral("message"));
     EXPECT_TRUE(message.contains(QLatin1String("Test: Expiry / Result: FAIL"))) << message.toStdString();
     EXPECT_TRUE(message.contains(QLatin1String("/Logs/ITimer-"))) << message.toStdString();
+    // The unit test log gives each test case's time.
+    const QDomElement sockets = suites.elementsByTagName(QStringLiteral("testsuite")).at(5).toElement();
+    EXPECT_EQ(sockets.firstChildElement(QStringLiteral("testcase")).attribute(QStringLiteral("time")), QStringLiteral("0.007"));
 
     const QJsonObject summary = QJsonDocument::fromJson(testutil::ReadFile(json)).object();
     EXPECT_FALSE(summary.value(QStringLiteral("start")).toString().isEmpty());
