@@ -1,11 +1,11 @@
 #pragma once
 
-#include "catalogue/compilervariant.h"
-#include "catalogue/testcase.h"
-#include "common/export.h"
-#include "device/device.h"
-#include "catalogue/testresults.h"
-#include "resources/mif.h"
+#include "compilervariant.h"
+#include "testcase.h"
+#include "../common/export.h"
+#include "../device/device.h"
+#include "testresults.h"
+#include "../resources/mif.h"
 
 #include <QDomElement>
 #include <QList>

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "controller/modulesource.h"
+#include "../controller/modulesource.h"
 
 #include <QHash>
 #include <QMap>

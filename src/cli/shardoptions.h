@@ -1,6 +1,6 @@
 #pragma once
 
-#include "controller/shardsetting.h"
+#include "../controller/shardsetting.h"
 
 #include <QCommandLineOption>
 #include <QCommandLineParser>

@@ -1,7 +1,7 @@
 #pragma once
 
-#include "common/export.h"
-#include "common/filewriter.h"
+#include "export.h"
+#include "filewriter.h"
 
 #include <QByteArray>
 #include <QDomDocument>

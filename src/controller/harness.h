@@ -1,8 +1,8 @@
 #pragma once
 
-#include "common/export.h"
-#include "device/device.h"
-#include "environment/platforms.h"
+#include "../common/export.h"
+#include "../device/device.h"
+#include "../environment/platforms.h"
 
 #include <QList>
 #include <QMap>

@@ -1,7 +1,7 @@
 #pragma once
 
-#include "common/export.h"
-#include "catalogue/testresults.h"
+#include "../common/export.h"
+#include "../catalogue/testresults.h"
 
 #include <QDateTime>
 #include <QSharedPointer>

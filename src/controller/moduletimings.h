@@ -1,6 +1,6 @@
 #pragma once
 
-#include "common/export.h"
+#include "../common/export.h"
 
 #include <QDateTime>
 #include <QHash>

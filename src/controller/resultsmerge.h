@@ -1,7 +1,7 @@
 #pragma once
 
-#include "common/export.h"
-#include "controller/moduletimings.h"
+#include "../common/export.h"
+#include "moduletimings.h"
 
 #include <QHash>
 #include <QList>

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "controller/harness.h"
+#include "harness.h"
 
 // Holds the processed-results document in memory for the lifetime of a Run
 // or Process call, so the file is read once rather than for every module.

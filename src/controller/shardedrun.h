@@ -1,7 +1,7 @@
 #pragma once
 
-#include "common/export.h"
-#include "controller/modulesource.h"
+#include "../common/export.h"
+#include "modulesource.h"
 
 #include <QDateTime>
 #include <QList>

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "encoding/qencoding.h"
+#include "qencoding.h"
 
 class MappingTable;
 

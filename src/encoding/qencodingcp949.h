@@ -1,6 +1,6 @@
 #pragma once
 
-#include "encoding/qencoding.h"
+#include "qencoding.h"
 
 // Windows code page 949: KS X 1001 in its EUC-KR form plus the Unified
 // Hangul Code extension (lead bytes 81-FE, trail bytes 41-FE), with ASCII.

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "encoding/qencoding.h"
+#include "qencoding.h"
 
 // ISO 8859-1: one byte per unit. Encoding keeps the low 8 bits of the unit.
 class HARNESS_EXPORT QEncodingIsoLatin1 : public QEncoding

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "encoding/qencoding.h"
+#include "qencoding.h"
 
 // KS X 1001 (KS C 5601) in its EUC-KR byte form, with ASCII.
 class HARNESS_EXPORT QEncodingKSC5601 : public QEncoding

@@ -1,6 +1,6 @@
 #pragma once
 
-#include "encoding/qencoding.h"
+#include "qencoding.h"
 
 // UTF-8. Each UTF-16 unit is encoded on its own, so a surrogate pair becomes
 // two three-byte sequences; the decoder turns such sequences back into the

@@ -1,7 +1,7 @@
 #pragma once
 
-#include "common/export.h"
-#include "environment/platforms.h"
+#include "../common/export.h"
+#include "platforms.h"
 
 #include <QString>
 

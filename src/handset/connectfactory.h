@@ -1,7 +1,7 @@
 #pragma once
 
-#include "common/export.h"
-#include "device/device.h"
+#include "../common/export.h"
+#include "../device/device.h"
 
 #include <QList>
 

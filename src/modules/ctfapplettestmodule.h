@@ -1,7 +1,7 @@
 #pragma once
 
-#include "catalogue/testmodule.h"
-#include "common/export.h"
+#include "../catalogue/testmodule.h"
+#include "../common/export.h"
 
 // A CTF test that runs as an applet under its own class ID and writes
 // CTF-format ".log" files into its handset directory.

@@ -1,7 +1,7 @@
 #pragma once
 
-#include "catalogue/modulekind.h"
-#include "common/export.h"
+#include "../catalogue/modulekind.h"
+#include "../common/export.h"
 
 #include <QList>
 

@@ -3,7 +3,7 @@
 // Helpers shared by the module kinds: log line classification, time-stamped
 // host names, the waits on a running test and on a growing handset log.
 
-#include "common/export.h"
+#include "../common/export.h"
 
 #include <QByteArray>
 #include <QString>

@@ -1,7 +1,7 @@
 #pragma once
 
-#include "catalogue/framework.h"
-#include "common/export.h"
+#include "../catalogue/framework.h"
+#include "../common/export.h"
 
 // The OAT framework applet (class ID 0x01010001) with the run's compiled
 // test data and device pack pushed into its handset directory.

@@ -1,8 +1,8 @@
 #pragma once
 
-#include "catalogue/testmodule.h"
-#include "common/export.h"
-#include "resources/sysresource.h"
+#include "../catalogue/testmodule.h"
+#include "../common/export.h"
+#include "../resources/sysresource.h"
 
 #include <QList>
 

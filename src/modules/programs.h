@@ -4,8 +4,8 @@
 // package while a kit is scanned, and stored in the manifest as
 // "programs"/"program" elements.
 
-#include "common/export.h"
-#include "resources/sysresource.h"
+#include "../common/export.h"
+#include "../resources/sysresource.h"
 
 #include <QList>
 #include <QString>

@@ -1,7 +1,7 @@
 #pragma once
 
-#include "catalogue/testmodule.h"
-#include "common/export.h"
+#include "../catalogue/testmodule.h"
+#include "../common/export.h"
 
 // A supporting module that other modules need on the handset while they run.
 // It is only installed and removed, never run or parsed, and never offered

@@ -1,7 +1,7 @@
 #pragma once
 
-#include "catalogue/testmodule.h"
-#include "common/export.h"
+#include "../catalogue/testmodule.h"
+#include "../common/export.h"
 
 // A unit test applet that runs under its own class ID and writes a text log
 // and an XML log into the "log" folder of its handset directory.

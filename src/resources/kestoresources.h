@@ -1,9 +1,9 @@
 #pragma once
 
-#include "common/export.h"
-#include "resources/mif.h"
-#include "resources/resourcestream.h"
-#include "resources/sysresource.h"
+#include "../common/export.h"
+#include "mif.h"
+#include "resourcestream.h"
+#include "sysresource.h"
 
 #include <QByteArray>
 #include <QList>
