@@ -568,6 +568,7 @@ TEST_F(TarTest, FailedOpenKeepsTheEntriesAndLeavesNothingOpen)
     Tar tar;
     EXPECT_FALSE(tar.Open(QIODevice::ReadOnly));
     ASSERT_TRUE(tar.Open(QIODevice::ReadOnly, Path("a.tar")));
+    EXPECT_TRUE(tar.IsOpen());
     ASSERT_EQ(tar.EntryCount(), 3u);
     EXPECT_FALSE(tar.Open(QIODevice::ReadOnly, Path("missing.tar")));
     EXPECT_FALSE(tar.IsOpen());
