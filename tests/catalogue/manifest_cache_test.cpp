@@ -169,8 +169,7 @@ TEST_F(ManifestCacheTest, ReadingReplacesModulesButKeepsFrameworks)
 TEST_F(ManifestCacheTest, WrittenCatalogueReadsBackTheSame)
 {
     BuildRichKit();
-    Manifest scanned(kit->Root(), false);
-    Scan(scanned);
+    Manifest scanned = ScanKit();
     ASSERT_EQ(scanned.testModules.keys(),
               (QStringList{"browser", "contacts", "helperlib", "menu", "prebuilt", "timer"}));
 
@@ -224,8 +223,7 @@ TEST_F(ManifestCacheTest, WrittenCatalogueReadsBackTheSame)
 TEST_F(ManifestCacheTest, WrittenCacheIsWellFormedXmlOfTheDocumentedLayout)
 {
     BuildRichKit();
-    Manifest manifest(kit->Root(), false);
-    Scan(manifest);
+    Manifest manifest = ScanKit();
 
     const QByteArray bytes = testutil::ReadFile(manifest.cacheFile);
     EXPECT_TRUE(bytes.startsWith("<testkit ")) << "no XML declaration";
@@ -250,8 +248,7 @@ TEST_F(ManifestCacheTest, WrittenCacheIsWellFormedXmlOfTheDocumentedLayout)
 TEST_F(ManifestCacheTest, SameCatalogueGivesTheSameBytesInAnotherProcess)
 {
     BuildRichKit();
-    Manifest manifest(kit->Root(), false);
-    Scan(manifest);
+    Manifest manifest = ScanKit();
 
     QByteArray output;
     ASSERT_EQ(testutil::RunProgram(u"" HARNESS_BINARY_DIR "/harness"_s,
@@ -276,8 +273,7 @@ TEST_F(ManifestCacheTest, EmptyCatalogueIsNeverWritten)
 TEST_F(ManifestCacheTest, UnwritableDestinationAnswersFalseWithAMessage)
 {
     kit->AddSourceModule(u"tests/a"_s, MakeModule(u"ctf"_s, u"A"_s));
-    Manifest manifest(kit->Root(), false);
-    Scan(manifest);
+    Manifest manifest = ScanKit();
 
     testutil::WriteFile(TempPath(u"plainfile"_s), "x");
     const QString destination = TempPath(u"plainfile/Manifest.xml"_s);

@@ -46,6 +46,12 @@ protected:
         manifest.SetLogger(&logger);
         ASSERT_TRUE(manifest.GenerateManifest(true));
     }
+    Manifest ScanKit(bool platform = false)
+    {
+        Manifest manifest(kit->Root(), platform);
+        Scan(manifest);
+        return manifest;
+    }
 
     // The names of the modules in key order.
     static QStringList Names(const QList<QSharedPointer<_TestModule>> &modules)

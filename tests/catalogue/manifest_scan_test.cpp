@@ -38,8 +38,7 @@ TEST_F(ManifestScanTest, FrameworkPackagesInRunFolderGiveFrameworksWithVariantsA
     // With a "run" folder, kind-named folders do not count.
     kit->AddDirectory(u"testframeworks/uitf"_s);
 
-    Manifest manifest(kit->Root(), false);
-    Scan(manifest);
+    Manifest manifest = ScanKit();
 
     EXPECT_EQ(manifest.frameworks.keys(), (QStringList{"ctf", "mine", "oat"}));
     const QSharedPointer<_Framework> oat = manifest.frameworks.value(u"oat"_s);
@@ -72,8 +71,7 @@ TEST_F(ManifestScanTest, KindFoldersOfTestframeworksGivePlainFrameworksWithoutVa
     // A description inside a kit's testframeworks folder is not a module.
     kit->AddSourceModule(u"TestFrameworks/oat/selftest"_s, MakeModule(u"oat"_s, u"Hidden"_s));
 
-    Manifest manifest(kit->Root(), false);
-    Scan(manifest);
+    Manifest manifest = ScanKit();
 
     EXPECT_EQ(manifest.frameworks.keys(), (QStringList{"ctf", "ctfapplet", "oat"}));
     for (const auto &framework : std::as_const(manifest.frameworks)) {
@@ -89,8 +87,7 @@ TEST_F(ManifestScanTest, PlatformManifestWalksTestframeworksLikeAnyFolder)
     kit->AddSourceModule(u"testframeworks/ctf/selftest"_s, MakeModule(u"ctf"_s, u"SelfTest"_s));
     kit->AddFrameworkPackage(u"testframeworks"_s, u"ctf"_s, u"Win32"_s, u"Debug"_s);
 
-    Manifest manifest(kit->Root(), true);
-    Scan(manifest);
+    Manifest manifest = ScanKit(true);
 
     EXPECT_TRUE(manifest.frameworks.isEmpty());
     const auto module = manifest.FindTestModule(u"selftest"_s);
@@ -111,8 +108,7 @@ TEST_F(ManifestScanTest, FamiliesComeFromTheDescriptionOrElseFromThePath)
     kit->AddSourceModule(u"tests/Shallow"_s, MakeModule(u"ctfapplet"_s, u"Shallow"_s));
     kit->AddSourceModule(u"tests"_s, MakeModule(u"ctf"_s, u"Top"_s));
 
-    Manifest manifest(kit->Root(), false);
-    Scan(manifest);
+    Manifest manifest = ScanKit();
 
     const auto family = [&](const char *name) {
         const auto module = manifest.FindTestModule(QLatin1String(name));
@@ -141,8 +137,7 @@ TEST_F(ManifestScanTest, FirstDescriptionOfANameWinsAndLaterOnesAddTheirPackageT
     kit->AddSourceModule(u"tests/b_arm/dup"_s, second);
     kit->AddSourceModule(u"tests/c_again/dup"_s, third);
 
-    Manifest manifest(kit->Root(), false);
-    Scan(manifest);
+    Manifest manifest = ScanKit();
 
     ASSERT_EQ(manifest.testModules.size(), 1);
     const auto module = manifest.testModules.value(u"dup"_s);
@@ -168,8 +163,7 @@ TEST_F(ManifestScanTest, SourceModulesGetTargetsAndPrebuiltOnesDoNot)
     // A package folder beside prebuilt binaries is not looked at for targets.
     kit->AddModulePackages(u"tests/x/prebuilt/package"_s, MakeModule(u"ctf"_s, u"Prebuilt"_s));
 
-    Manifest manifest(kit->Root(), false);
-    Scan(manifest);
+    Manifest manifest = ScanKit();
 
     const auto built = manifest.FindTestModule(u"fromsource"_s);
     ASSERT_TRUE(built);
@@ -210,8 +204,7 @@ TEST_P(ManifestKindTest, LastClassifyingEntryDecides)
         kit->AddFile(u"tests/m/mixed/"_s + QLatin1String(kind.entry), "x");
     kit->AddFile(u"tests/m/mixed/m.MOD"_s, "x");
 
-    Manifest manifest(kit->Root(), false);
-    Scan(manifest);
+    Manifest manifest = ScanKit();
     const auto found = manifest.FindTestModule(u"mixed"_s);
     ASSERT_TRUE(found);
     EXPECT_EQ(!found->targets.isEmpty(), kind.expectSource);
@@ -231,8 +224,7 @@ TEST_F(ManifestScanTest, OatModulesFindTheirBaseLineFile)
     kit->AddSourceModule(u"tests/oat/without"_s, MakeModule(u"oat"_s, u"Without"_s));
     kit->AddFile(u"tests/oat/without/zzz.txt"_s, "x");
 
-    Manifest manifest(kit->Root(), false);
-    Scan(manifest);
+    Manifest manifest = ScanKit();
 
     EXPECT_EQ(manifest.FindTestModule(u"with"_s)->baseLineFile, kit->Path(u"tests/oat/with/With.BaseLine"_s));
     const auto without = manifest.FindTestModule(u"without"_s);
@@ -250,8 +242,7 @@ TEST_F(ManifestScanTest, SecondaryModulesAreMovedInOnlyWhenNoModuleTakesTheirNam
     Module described = MakeModule(u"secondary"_s, u"Described"_s);
     kit->AddSourceModule(u"libs/described"_s, described);
 
-    Manifest manifest(kit->Root(), false);
-    Scan(manifest);
+    Manifest manifest = ScanKit();
 
     EXPECT_TRUE(manifest.secondaryModules.contains(u"HelperLib"_s));
     EXPECT_TRUE(manifest.secondaryModules.contains(u""_s));
@@ -295,8 +286,7 @@ TEST_F(ManifestScanTest, ModuleInformationComesFromTheFirstMatchingMemberThatLoa
     const QString good = kit->Path(u"tests/mif/package/Mif_Win32_Debug.kestix"_s);
     kit->AddFile(u"tests/mif/package/Mif_Win32_Release.kestix"_s, testutil::ReadFile(good).left(1500));
 
-    Manifest manifest(kit->Root(), false);
-    Scan(manifest);
+    Manifest manifest = ScanKit();
 
     const auto found = manifest.FindTestModule(u"mif"_s);
     ASSERT_TRUE(found);
@@ -317,8 +307,7 @@ TEST_F(ManifestScanTest, ASymbolicLinkLoopIsWalkedOnce)
     ASSERT_EQ(symlink("../..", kit->Path(u"tests/a/up"_s).toLocal8Bit().constData()), 0);
     ASSERT_EQ(symlink(".", kit->Path(u"tests/a/loopy/self"_s).toLocal8Bit().constData()), 0);
 
-    Manifest manifest(kit->Root(), false);
-    Scan(manifest);
+    Manifest manifest = ScanKit();
 
     EXPECT_EQ(manifest.testModules.keys(), (QStringList{"Helper", "loopy"}));
     EXPECT_EQ(manifest.FindTestModule(u"loopy"_s)->family, u"a"_s);
@@ -335,8 +324,7 @@ TEST_F(ManifestScanTest, BrokenAndMisnamedInputIsSkippedWithoutStoppingTheWalk)
     kit->AddFile(u"tests/notes/notes.xml"_s, "<notes/>");
     kit->AddSourceModule(u"tests/zgood"_s, MakeModule(u"uitf"_s, u"Good"_s));
 
-    Manifest manifest(kit->Root(), false);
-    Scan(manifest);
+    Manifest manifest = ScanKit();
 
     EXPECT_EQ(manifest.testModules.keys(), QStringList{"good"});
     EXPECT_TRUE(manifest.FindTestModule(u"good"_s).dynamicCast<UTTestModule>());
