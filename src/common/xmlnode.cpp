@@ -491,16 +491,17 @@ XmlNode::~XmlNode()
     }
 }
 
+std::unique_ptr<XmlNode> XmlNode::ParseQuickly(const QByteArray &bytes)
+{
+    QStringDecoder decoder(QStringDecoder::Utf8, QStringDecoder::Flag::Stateless);
+    const QString text = decoder(bytes);
+    return decoder.hasError() ? nullptr : QuickReader(text).Read();
+}
+
 std::unique_ptr<XmlNode> XmlNode::Parse(const QByteArray &bytes, XmlParseError *error)
 {
-    {
-        QStringDecoder decoder(QStringDecoder::Utf8, QStringDecoder::Flag::Stateless);
-        const QString text = decoder(bytes);
-        if (!decoder.hasError()) {
-            if (std::unique_ptr<XmlNode> root = QuickReader(text).Read())
-                return root;
-        }
-    }
+    if (std::unique_ptr<XmlNode> root = ParseQuickly(bytes))
+        return root;
     return ParseFully(bytes, error);
 }
 

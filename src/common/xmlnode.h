@@ -125,6 +125,11 @@ public:
     void CopyTo(QDomElement &element) const;
 
 private:
+    friend class XmlNodeTestAccess;
+
+    // The tree of a plain UTF-8 document read without QXmlStreamReader, or
+    // null when the document holds anything the quick reader leaves to it.
+    static std::unique_ptr<XmlNode> ParseQuickly(const QByteArray &bytes);
     void CollectText(QString &out) const;
 
     Kind m_kind;

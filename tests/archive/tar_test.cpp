@@ -16,6 +16,8 @@
 
 #include <unistd.h>
 
+using namespace Qt::StringLiterals;
+
 class TarTestAccess
 {
 public:
@@ -113,7 +115,7 @@ TEST_F(TarTest, OneTenByteMemberAndTheEndBlocksGiveThreeEntries)
 {
     Tar writer;
     writer.SetModificationTime(1700000000);
-    writer.AddFile(QStringLiteral("a.mif"), Bytes(10, 'a'));
+    writer.AddFile(u"a.mif"_s, Bytes(10, 'a'));
     ASSERT_TRUE(writer.Write(Path("one.tar")));
     EXPECT_EQ(QFileInfo(Path("one.tar")).size(), 4 * 512);
 
@@ -122,7 +124,7 @@ TEST_F(TarTest, OneTenByteMemberAndTheEndBlocksGiveThreeEntries)
     EXPECT_FALSE(tar.IsDamaged());
     ASSERT_EQ(tar.EntryCount(), 3u);
     TarFileEntry first = tar.Entry(0);
-    EXPECT_EQ(first.name, QStringLiteral("a.mif"));
+    EXPECT_EQ(first.name, u"a.mif"_s);
     EXPECT_EQ(first.size, 10u);
     EXPECT_EQ(first.offset, 512);
     EXPECT_TRUE(first.IsFile());
@@ -162,17 +164,17 @@ protected:
     // A tree with every kind of member the format holds.
     void MakeTree(const QString &root)
     {
-        WriteFile(root + QStringLiteral("/pkg/a.mif"), Bytes(1500, 'a'));
-        WriteFile(root + QStringLiteral("/pkg/empty"), QByteArray());
-        ASSERT_TRUE(QDir(root).mkpath(QStringLiteral("pkg/emptydir")));
-        ASSERT_TRUE(QFile::link(QStringLiteral("a.mif"), root + QStringLiteral("/pkg/link")));
-        ASSERT_EQ(::link(QFile::encodeName(root + QStringLiteral("/pkg/a.mif")).constData(),
-                         QFile::encodeName(root + QStringLiteral("/pkg/hard")).constData()),
+        WriteFile(root + u"/pkg/a.mif"_s, Bytes(1500, 'a'));
+        WriteFile(root + u"/pkg/empty"_s, QByteArray());
+        ASSERT_TRUE(QDir(root).mkpath(u"pkg/emptydir"_s));
+        ASSERT_TRUE(QFile::link(u"a.mif"_s, root + u"/pkg/link"_s));
+        ASSERT_EQ(::link(QFile::encodeName(root + u"/pkg/a.mif"_s).constData(),
+                         QFile::encodeName(root + u"/pkg/hard"_s).constData()),
                   0);
         const int maxName = GetParam().maxName;
-        const QString over100 = QStringLiteral("pkg/") + QString(60, QLatin1Char('d')) + QLatin1Char('/')
+        const QString over100 = u"pkg/"_s + QString(60, QLatin1Char('d')) + QLatin1Char('/')
                                 + QString(50, QLatin1Char('f'));
-        const QString over255 = QStringLiteral("pkg/") + QString(150, QLatin1Char('e')) + QLatin1Char('/')
+        const QString over255 = u"pkg/"_s + QString(150, QLatin1Char('e')) + QLatin1Char('/')
                                 + QString(130, QLatin1Char('g'));
         for (const QString &name : {over100, over255}) {
             if (maxName == 0 || name.size() + 2 <= maxName)
@@ -180,7 +182,7 @@ protected:
         }
         if (GetParam().sparse) {
             // Data at 64 KiB and at 160 KiB of a 256 KiB file; the rest holes.
-            QFile file(root + QStringLiteral("/pkg/sparse"));
+            QFile file(root + u"/pkg/sparse"_s);
             ASSERT_TRUE(file.open(QIODevice::WriteOnly));
             for (const qint64 at : {64 * 1024, 160 * 1024}) {
                 ASSERT_TRUE(file.seek(at));
@@ -203,26 +205,24 @@ TEST_P(ForeignArchive, ReadsEveryMemberAsGnuTarExtractsIt)
     const QString archive = Path("archive.tar");
     QByteArray output;
     if (writer.options.first().startsWith(QLatin1String("python:"))) {
-        const QString script = QStringLiteral(
-            "import sys, tarfile\n"
+        const QString script = u"import sys, tarfile\n"
             "with tarfile.open(sys.argv[1], 'w', format=getattr(tarfile, sys.argv[2])) as t:\n"
-            "    t.add(sys.argv[3], arcname='.')\n");
-        ASSERT_EQ(RunProgram(QStringLiteral("python3"),
-                             {QStringLiteral("-c"), script, archive, writer.options.first().mid(7), source}, &output),
+            "    t.add(sys.argv[3], arcname='.')\n"_s;
+        ASSERT_EQ(RunProgram(u"python3"_s,
+                             {u"-c"_s, script, archive, writer.options.first().mid(7), source}, &output),
                   0)
             << output.constData();
     } else {
-        ASSERT_EQ(RunProgram(QStringLiteral("tar"),
-                             writer.options + QStringList{QStringLiteral("--sort=name"), QStringLiteral("-cf"), archive,
-                                                          QStringLiteral("-C"), source, QStringLiteral(".")},
+        ASSERT_EQ(RunProgram(u"tar"_s,
+                             writer.options + QStringList{u"--sort=name"_s, u"-cf"_s, archive,
+                                                          u"-C"_s, source, u"."_s},
                              &output),
                   0)
             << output.constData();
     }
     const QString out = Path("out");
     ASSERT_TRUE(QDir().mkpath(out));
-    ASSERT_EQ(RunProgram(QStringLiteral("tar"), {QStringLiteral("-xf"), archive, QStringLiteral("-C"), out}, &output), 0)
-        << output.constData();
+    ASSERT_EQ(RunProgram(u"tar"_s, {u"-xf"_s, archive, u"-C"_s, out}, &output), 0) << output.constData();
 
     Tar tar;
     ASSERT_TRUE(tar.Open(QIODevice::ReadOnly, archive));
@@ -255,33 +255,24 @@ TEST_P(ForeignArchive, ReadsEveryMemberAsGnuTarExtractsIt)
     while (it.hasNext())
         onDisk.insert(QDir(out).relativeFilePath(it.next()));
     EXPECT_EQ(listed, onDisk);
-    EXPECT_EQ(listed.contains(QStringLiteral("pkg/sparse")), writer.sparse);
+    EXPECT_EQ(listed.contains(u"pkg/sparse"_s), writer.sparse);
 }
 
 INSTANTIATE_TEST_SUITE_P(
     Tar, ForeignArchive,
-    ::testing::Values(Writer{"Gnu", {QStringLiteral("--format=gnu")}, 0, false},
-                      Writer{"OldGnu", {QStringLiteral("--format=oldgnu")}, 0, false},
-                      Writer{"Posix", {QStringLiteral("--format=posix")}, 0, false},
-                      Writer{"Ustar", {QStringLiteral("--format=ustar")}, 256, false},
-                      Writer{"V7", {QStringLiteral("--format=v7")}, 99, false},
-                      Writer{"GnuSparse", {QStringLiteral("--format=gnu"), QStringLiteral("--sparse")}, 0, true},
-                      Writer{"OldGnuSparse", {QStringLiteral("--format=oldgnu"), QStringLiteral("--sparse")}, 0, true},
-                      Writer{"PaxSparse00",
-                             {QStringLiteral("--format=posix"), QStringLiteral("--sparse"),
-                              QStringLiteral("--sparse-version=0.0")},
-                             0, true},
-                      Writer{"PaxSparse01",
-                             {QStringLiteral("--format=posix"), QStringLiteral("--sparse"),
-                              QStringLiteral("--sparse-version=0.1")},
-                             0, true},
-                      Writer{"PaxSparse10",
-                             {QStringLiteral("--format=posix"), QStringLiteral("--sparse"),
-                              QStringLiteral("--sparse-version=1.0")},
-                             0, true},
-                      Writer{"PythonPax", {QStringLiteral("python:PAX_FORMAT")}, 0, false},
-                      Writer{"PythonGnu", {QStringLiteral("python:GNU_FORMAT")}, 0, false},
-                      Writer{"PythonUstar", {QStringLiteral("python:USTAR_FORMAT")}, 256, false}),
+    ::testing::Values(Writer{"Gnu", {u"--format=gnu"_s}, 0, false},
+                      Writer{"OldGnu", {u"--format=oldgnu"_s}, 0, false},
+                      Writer{"Posix", {u"--format=posix"_s}, 0, false},
+                      Writer{"Ustar", {u"--format=ustar"_s}, 256, false},
+                      Writer{"V7", {u"--format=v7"_s}, 99, false},
+                      Writer{"GnuSparse", {u"--format=gnu"_s, u"--sparse"_s}, 0, true},
+                      Writer{"OldGnuSparse", {u"--format=oldgnu"_s, u"--sparse"_s}, 0, true},
+                      Writer{"PaxSparse00", {u"--format=posix"_s, u"--sparse"_s, u"--sparse-version=0.0"_s}, 0, true},
+                      Writer{"PaxSparse01", {u"--format=posix"_s, u"--sparse"_s, u"--sparse-version=0.1"_s}, 0, true},
+                      Writer{"PaxSparse10", {u"--format=posix"_s, u"--sparse"_s, u"--sparse-version=1.0"_s}, 0, true},
+                      Writer{"PythonPax", {u"python:PAX_FORMAT"_s}, 0, false},
+                      Writer{"PythonGnu", {u"python:GNU_FORMAT"_s}, 0, false},
+                      Writer{"PythonUstar", {u"python:USTAR_FORMAT"_s}, 256, false}),
     [](const auto &info) { return std::string(info.param.label); });
 
 // ---- Hand-made archives: odd but valid fields, and damage ----
@@ -404,7 +395,7 @@ INSTANTIATE_TEST_SUITE_P(
                            + Member("x", PaxRecord("path", longName) + PaxRecord("size", "3"), 'x')
                            + Header("short", Octal(999)) + Padded("abc") + Member("plain", "q") + kEnd;
                 },
-                {QString(300, QLatin1Char('p')) + QStringLiteral("/name.mif"), "global/x"}, "abc", ""},
+                {QString(300, QLatin1Char('p')) + u"/name.mif"_s, "global/x"}, "abc", ""},
         Crafted{"SparseMemberThatIsAllHole",
                 [] {
                     return Member("x", PaxRecord("GNU.sparse.size", "1000") + PaxRecord("GNU.sparse.map", ""), 'x')
@@ -438,11 +429,11 @@ TEST_F(TarTest, HardLinkAndNonUtf8NameKeepTheirDetails)
     ASSERT_TRUE(tar.Open(QIODevice::ReadOnly, Path("links.tar")));
     ASSERT_FALSE(tar.IsDamaged()) << tar.ErrorString().toStdString();
     EXPECT_EQ(tar.Entry(0).rawName, QByteArray("a\xff"));
-    EXPECT_EQ(tar.Entry(0).name, QStringLiteral("a\\377"));
+    EXPECT_EQ(tar.Entry(0).name, u"a\\377"_s);
     TarFileEntry hard = tar.Entry(3);
     EXPECT_TRUE(hard.IsHardLink());
     EXPECT_TRUE(hard.IsFile());
-    EXPECT_EQ(hard.linkName, QStringLiteral("./a/"));
+    EXPECT_EQ(hard.linkName, u"./a/"_s);
     EXPECT_EQ(tar.EntryData(hard), QByteArray("two"));
     const TarFileEntry dangling = tar.Entry(4);
     EXPECT_TRUE(dangling.IsHardLink());
@@ -505,31 +496,26 @@ INSTANTIATE_TEST_SUITE_P(
 
 TEST_F(TarTest, GnuTarListsAndExtractsWhatWeWrite)
 {
-    if (!testutil::HaveProgram(QStringLiteral("tar")))
+    if (!testutil::HaveProgram(u"tar"_s))
         GTEST_SKIP() << "GNU tar is not installed";
-    const QString deep = QString(70, QLatin1Char('p')) + QStringLiteral("/") + QString(95, QLatin1Char('q'));
+    const QString deep = QString(70, QLatin1Char('p')) + u"/"_s + QString(95, QLatin1Char('q'));
     Tar writer;
     writer.SetModificationTime(1700000000);
-    writer.AddDirectory(QStringLiteral("mods"));
-    writer.AddFile(QStringLiteral("mods/a.mif"), Bytes(513, 'm'));
-    writer.AddFile(QStringLiteral("mods/empty"), QByteArray());
-    writer.AddFile(QStringLiteral("mods/") + deep, Bytes(512, 'd'));
-    writer.AddFile(QStringLiteral("mods/caf\u00e9.txt"), "bonjour\n");
+    writer.AddDirectory(u"mods"_s);
+    writer.AddFile(u"mods/a.mif"_s, Bytes(513, 'm'));
+    writer.AddFile(u"mods/empty"_s, QByteArray());
+    writer.AddFile(u"mods/"_s + deep, Bytes(512, 'd'));
+    writer.AddFile(u"mods/caf\u00e9.txt"_s, "bonjour\n");
     ASSERT_TRUE(writer.Write(Path("ours.tar")));
 
     QByteArray listing;
-    ASSERT_EQ(RunProgram(QStringLiteral("tar"), {QStringLiteral("-tvf"), QStringLiteral("ours.tar")}, &listing,
-                         dir.path()),
-              0);
+    ASSERT_EQ(RunProgram(u"tar"_s, {u"-tvf"_s, u"ours.tar"_s}, &listing, dir.path()), 0);
     EXPECT_TRUE(listing.contains("mods/a.mif")) << listing.constData();
     EXPECT_FALSE(listing.contains("warning")) << listing.constData();
 
-    ASSERT_TRUE(QDir(dir.path()).mkpath(QStringLiteral("out")));
+    ASSERT_TRUE(QDir(dir.path()).mkpath(u"out"_s));
     QByteArray messages;
-    ASSERT_EQ(RunProgram(QStringLiteral("tar"),
-                         {QStringLiteral("-xf"), QStringLiteral("ours.tar"), QStringLiteral("-C"), QStringLiteral("out")},
-                         &messages, dir.path()),
-              0);
+    ASSERT_EQ(RunProgram(u"tar"_s, {u"-xf"_s, u"ours.tar"_s, u"-C"_s, u"out"_s}, &messages, dir.path()), 0);
     EXPECT_TRUE(messages.isEmpty()) << messages.constData();
     EXPECT_EQ(ReadFile(Path("out/mods/a.mif")), Bytes(513, 'm'));
     EXPECT_TRUE(QFileInfo(Path("out/mods/empty")).isFile());
@@ -544,9 +530,9 @@ TEST_F(TarTest, GnuTarListsAndExtractsWhatWeWrite)
     EXPECT_FALSE(reader.IsDamaged());
     ASSERT_EQ(reader.EntryCount(), 7u);
     EXPECT_TRUE(reader.Entry(0).IsDirectory());
-    EXPECT_EQ(reader.Entry(0).name, QStringLiteral("mods/"));
+    EXPECT_EQ(reader.Entry(0).name, u"mods/"_s);
     TarFileEntry entry = reader.Entry(3);
-    EXPECT_EQ(entry.name, QStringLiteral("mods/") + deep);
+    EXPECT_EQ(entry.name, u"mods/"_s + deep);
     EXPECT_EQ(reader.EntryData(entry), Bytes(512, 'd'));
 }
 
@@ -554,9 +540,9 @@ TEST_F(TarTest, WriteRefusesNamesThatDoNotFitAndLeavesTheDestination)
 {
     WriteFile(Path("keep.tar"), "old");
     const QString tooLong = QString(101, QLatin1Char('n'));
-    for (const QString &name : {QString(), tooLong, QStringLiteral("dir/")}) {
+    for (const QString &name : {QString(), tooLong, u"dir/"_s}) {
         Tar writer;
-        writer.AddFile(QStringLiteral("fine"), "1");
+        writer.AddFile(u"fine"_s, "1");
         writer.AddFile(name, "2");
         EXPECT_FALSE(writer.Write(Path("keep.tar"))) << name.toStdString();
         EXPECT_EQ(ReadFile(Path("keep.tar")), QByteArray("old"));
@@ -568,11 +554,12 @@ TEST_F(TarTest, WriteRefusesNamesThatDoNotFitAndLeavesTheDestination)
 TEST_F(TarTest, FailedOpenKeepsTheEntriesAndLeavesNothingOpen)
 {
     Tar writer;
-    writer.AddFile(QStringLiteral("a"), "abc");
+    writer.AddFile(u"a"_s, "abc");
     ASSERT_TRUE(writer.Write(Path("a.tar")));
     Tar tar;
     EXPECT_FALSE(tar.Open(QIODevice::ReadOnly));
     ASSERT_TRUE(tar.Open(QIODevice::ReadOnly, Path("a.tar")));
+    EXPECT_TRUE(tar.IsOpen());
     ASSERT_EQ(tar.EntryCount(), 3u);
     EXPECT_FALSE(tar.Open(QIODevice::ReadOnly, Path("missing.tar")));
     EXPECT_FALSE(tar.IsOpen());
@@ -588,7 +575,7 @@ TEST_F(TarTest, FailedOpenKeepsTheEntriesAndLeavesNothingOpen)
 TEST_F(TarTest, CopiesShareEntriesButNeverTheOpenFile)
 {
     Tar writer;
-    writer.AddFile(QStringLiteral("a"), "abc");
+    writer.AddFile(u"a"_s, "abc");
     ASSERT_TRUE(writer.Write(Path("a.tar")));
     Tar original;
     ASSERT_TRUE(original.Open(QIODevice::ReadOnly, Path("a.tar")));
@@ -611,9 +598,9 @@ TEST_F(TarTest, CorruptedArchivesAreReportedAndReadOnlyWhatTheFileHolds)
 {
     Tar writer;
     writer.SetModificationTime(1700000000);
-    writer.AddDirectory(QStringLiteral("pkg"));
-    writer.AddFile(QStringLiteral("pkg/a.mif"), Bytes(600, 'a'));
-    writer.AddFile(QString(90, QLatin1Char('d')) + QStringLiteral("/") + QString(90, QLatin1Char('f')), Bytes(30, 'f'));
+    writer.AddDirectory(u"pkg"_s);
+    writer.AddFile(u"pkg/a.mif"_s, Bytes(600, 'a'));
+    writer.AddFile(QString(90, QLatin1Char('d')) + u"/"_s + QString(90, QLatin1Char('f')), Bytes(30, 'f'));
     ASSERT_TRUE(writer.Write(Path("good.tar")));
     const QByteArray good = ReadFile(Path("good.tar"));
 

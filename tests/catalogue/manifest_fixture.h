@@ -15,15 +15,17 @@
 
 #include <memory>
 
+using namespace Qt::StringLiterals;
+
 class ManifestFixture : public ::testing::Test
 {
 protected:
     void SetUp() override
     {
         ASSERT_TRUE(m_dir.isValid());
-        m_env.Set("KESTIX_DATA_ROOT", m_dir.path() + QStringLiteral("/data"));
-        kit = std::make_unique<kitbuilder::KitBuilder>(m_dir.path() + QStringLiteral("/kit"));
-        logger.SetLogPath(m_dir.path() + QStringLiteral("/log.txt"));
+        m_env.Set("KESTIX_DATA_ROOT", m_dir.path() + u"/data"_s);
+        kit = std::make_unique<kitbuilder::KitBuilder>(m_dir.path() + u"/kit"_s);
+        logger.SetLogPath(m_dir.path() + u"/log.txt"_s);
     }
 
     QString TempPath(const QString &relative) const { return m_dir.path() + QLatin1Char('/') + relative; }
@@ -33,7 +35,7 @@ protected:
         kitbuilder::Module module;
         module.kind = kind;
         module.name = name;
-        module.testCases = {name + QStringLiteral("_1"), name + QStringLiteral("_2")};
+        module.testCases = {name + u"_1"_s, name + u"_2"_s};
         return module;
     }
 
@@ -43,6 +45,12 @@ protected:
         ASSERT_TRUE(kit->Ok()) << kit->Errors().join(QLatin1Char('\n')).toStdString();
         manifest.SetLogger(&logger);
         ASSERT_TRUE(manifest.GenerateManifest(true));
+    }
+    Manifest ScanKit(bool platform = false)
+    {
+        Manifest manifest(kit->Root(), platform);
+        Scan(manifest);
+        return manifest;
     }
 
     // The names of the modules in key order.
@@ -56,7 +64,7 @@ protected:
 
     QString LogText() const
     {
-        return QString::fromLatin1(testutil::ReadFile(m_dir.path() + QStringLiteral("/log.txt")));
+        return QString::fromLatin1(testutil::ReadFile(m_dir.path() + u"/log.txt"_s));
     }
 
     QTemporaryDir m_dir;

@@ -8,13 +8,15 @@
 
 #include <gtest/gtest.h>
 
+using namespace Qt::StringLiterals;
+
 namespace {
 
 // The smallest concrete module: the catalogue side only.
 class RecordModule : public _TestModule
 {
 public:
-    QString TestType() override { return QStringLiteral("record"); }
+    QString TestType() override { return u"record"_s; }
     bool Run(IKestoDevice *, const QMap<QString, QString> &) override { return false; }
     bool GetLogFilePaths(IKestoDevice *, QStringList &) override { return false; }
     bool IsLogComplete(IKestoDevice *) override { return true; }
@@ -22,7 +24,7 @@ public:
     bool ParseLog(const QString &, TestResults &) override { return false; }
     void PostProcess(QMap<QString, QString> &) override {}
     QString ModuleName() override { return moduleName; }
-    QString ModuleXMLName() override { return QStringLiteral("record.xml"); }
+    QString ModuleXMLName() override { return u"record.xml"_s; }
     bool ProcessModuleMIF(const QString &) override { return false; }
 
 private:
@@ -43,7 +45,7 @@ class ModuleXml : public ::testing::Test
 protected:
     QString Write(const QByteArray &xml)
     {
-        const QString path = dir.filePath(QStringLiteral("ctfmodule.xml"));
+        const QString path = dir.filePath(u"ctfmodule.xml"_s);
         testutil::WriteFile(path, xml);
         return path;
     }
@@ -64,14 +66,14 @@ TEST_F(ModuleXml, ReadsUpperCaseAttributesBeforeLowerCaseOnes)
         "<testcase name='c' type=''/>"
         "<testcase type='auto'/>"
         "</SUITE></kit>")));
-    EXPECT_EQ(module.moduleName, QStringLiteral("Upper"));
-    EXPECT_EQ(module.family, QStringLiteral("fam"));
-    EXPECT_EQ(module.subFamily, QStringLiteral("Sub"));
-    EXPECT_EQ(module.minKestoVersion, QStringLiteral("3.1"));
-    EXPECT_EQ(module.secondaryModules, QStringList{QStringLiteral("helper")});
+    EXPECT_EQ(module.moduleName, u"Upper"_s);
+    EXPECT_EQ(module.family, u"fam"_s);
+    EXPECT_EQ(module.subFamily, u"Sub"_s);
+    EXPECT_EQ(module.minKestoVersion, u"3.1"_s);
+    EXPECT_EQ(module.secondaryModules, QStringList{u"helper"_s});
     ASSERT_EQ(module.testCases.size(), 3);
-    EXPECT_EQ(module.testCases[0].type, QStringLiteral("manual"));
-    EXPECT_EQ(module.testCases[1].type, QStringLiteral("auto"));
+    EXPECT_EQ(module.testCases[0].type, u"manual"_s);
+    EXPECT_EQ(module.testCases[1].type, u"auto"_s);
     EXPECT_EQ(module.testCases[2].type, QString());
     EXPECT_TRUE(module.errorText.isEmpty());
 }
@@ -79,8 +81,8 @@ TEST_F(ModuleXml, ReadsUpperCaseAttributesBeforeLowerCaseOnes)
 TEST_F(ModuleXml, AcceptsAnOatModuleElementWithLowerCaseNames)
 {
     ASSERT_TRUE(module.ProcessModuleXML(Write("<x><oatmodule name='Timer' family='f' subfamily='s'/></x>")));
-    EXPECT_EQ(module.moduleName, QStringLiteral("Timer"));
-    EXPECT_EQ(module.subFamily, QStringLiteral("s"));
+    EXPECT_EQ(module.moduleName, u"Timer"_s);
+    EXPECT_EQ(module.subFamily, u"s"_s);
 }
 
 TEST_F(ModuleXml, FailsWithTheSuiteMessageWhenTheFirstElementIsNoSuite)
@@ -88,8 +90,7 @@ TEST_F(ModuleXml, FailsWithTheSuiteMessageWhenTheFirstElementIsNoSuite)
     for (const QByteArray &xml : {QByteArray("<kit/>"), QByteArray("<kit><other/><suite name='x'/></kit>")}) {
         const QString path = Write(xml);
         EXPECT_FALSE(module.ProcessModuleXML(path));
-        EXPECT_EQ(module.errorText, QStringLiteral("Error processing module xml file:") + path
-                                        + QStringLiteral("\n\tSUITE node not found."));
+        EXPECT_EQ(module.errorText, u"Error processing module xml file:"_s + path + u"\n\tSUITE node not found."_s);
     }
 }
 
@@ -97,10 +98,9 @@ TEST_F(ModuleXml, ReportsParseErrorsWithLineAndColumn)
 {
     const QString path = Write("<kit>\n<suite name='x'>\n</kit>");
     EXPECT_FALSE(module.ProcessModuleXML(path));
-    EXPECT_TRUE(module.errorText.startsWith(QStringLiteral("Error processing oat xml file:") + path
-                                            + QStringLiteral("\n\t")));
-    EXPECT_TRUE(module.errorText.contains(QStringLiteral(": Line(3) Column(")));
-    EXPECT_FALSE(module.ProcessModuleXML(dir.filePath(QStringLiteral("missing.xml"))));
+    EXPECT_TRUE(module.errorText.startsWith(u"Error processing oat xml file:"_s + path + u"\n\t"_s));
+    EXPECT_TRUE(module.errorText.contains(u": Line(3) Column("_s));
+    EXPECT_FALSE(module.ProcessModuleXML(dir.filePath(u"missing.xml"_s)));
     EXPECT_TRUE(module.errorText.isEmpty());
 }
 
@@ -108,31 +108,31 @@ TEST(TestModuleRecord, IdHashFollowsSourceNameFamilyAndSubFamily)
 {
     RecordModule empty;
     QDomDocument document;
-    QDomElement element = document.createElement(QStringLiteral("testmodule"));
+    QDomElement element = document.createElement(u"testmodule"_s);
     empty.WriteToManifest(element);
-    EXPECT_EQ(empty.IDHash(), QStringLiteral("#0"));
+    EXPECT_EQ(empty.IDHash(), u"#0"_s);
 
     RecordModule kit;
     RecordModule platform;
     for (RecordModule *module : {&kit, &platform}) {
-        module->moduleName = QStringLiteral("ITimer");
-        module->family = QStringLiteral("Kernel");
-        module->subFamily = QStringLiteral("Time");
+        module->moduleName = u"ITimer"_s;
+        module->family = u"Kernel"_s;
+        module->subFamily = u"Time"_s;
     }
-    kit.SetSource(QStringLiteral("KVK"));
-    platform.SetSource(QStringLiteral("PVS"));
+    kit.SetSource(u"KVK"_s);
+    platform.SetSource(u"PVS"_s);
     kit.WriteToManifest(element);
     platform.WriteToManifest(element);
-    EXPECT_EQ(kit.IDHash(), StringHashName(QStringLiteral("KVKITimerKernelTime")));
+    EXPECT_EQ(kit.IDHash(), StringHashName(u"KVKITimerKernelTime"_s));
     EXPECT_NE(kit.IDHash(), platform.IDHash());
-    EXPECT_EQ(element.attribute(QStringLiteral("idhash")), platform.IDHash());
+    EXPECT_EQ(element.attribute(u"idhash"_s), platform.IDHash());
 }
 
 TEST(TestModuleRecord, ManifestEntryRoundTrips)
 {
     RecordModule module;
-    module.moduleName = QStringLiteral("ITimer");
-    module.source = QStringLiteral("KVK");
+    module.moduleName = u"ITimer"_s;
+    module.source = u"KVK"_s;
     module.classids << 0x10000001u << 7u;
     Applet applet;
     applet.appletid = 0x1234;
@@ -140,27 +140,27 @@ TEST(TestModuleRecord, ManifestEntryRoundTrips)
     applet.hostid = 9;
     applet.flags = 0x1f;
     module.applets << applet;
-    module.testCases << TestCase(QStringLiteral("t1"), QStringLiteral("auto"));
-    module.targets.insert(QStringLiteral("ITimer_Win32_Debug"),
-                          Target(QStringLiteral("ITimer_Win32_Debug"), IKestoDevice::PLATFORM_WIN32, QStringLiteral("Debug")));
-    module.secondaryModules << QString() << QStringLiteral("helper");
+    module.testCases << TestCase(u"t1"_s, u"auto"_s);
+    module.targets.insert(u"ITimer_Win32_Debug"_s,
+                          Target(u"ITimer_Win32_Debug"_s, IKestoDevice::PLATFORM_WIN32, u"Debug"_s));
+    module.secondaryModules << QString() << u"helper"_s;
 
     QDomDocument document;
-    QDomElement element = document.createElement(QStringLiteral("testmodule"));
+    QDomElement element = document.createElement(u"testmodule"_s);
     document.appendChild(element);
     module.WriteToManifest(element);
-    EXPECT_EQ(element.attribute(QStringLiteral("testtype")), QStringLiteral("record"));
-    const QDomElement written = element.firstChildElement(QStringLiteral("applets")).firstChildElement();
-    EXPECT_EQ(written.attribute(QStringLiteral("appletidhex")), QStringLiteral("0x00001234"));
-    EXPECT_EQ(written.attribute(QStringLiteral("flagshex")), QStringLiteral("0x001f"));
-    EXPECT_EQ(element.firstChildElement(QStringLiteral("secondary_modules")).childNodes().size(), 1);
+    EXPECT_EQ(element.attribute(u"testtype"_s), u"record"_s);
+    const QDomElement written = element.firstChildElement(u"applets"_s).firstChildElement();
+    EXPECT_EQ(written.attribute(u"appletidhex"_s), u"0x00001234"_s);
+    EXPECT_EQ(written.attribute(u"flagshex"_s), u"0x001f"_s);
+    EXPECT_EQ(element.firstChildElement(u"secondary_modules"_s).childNodes().size(), 1);
 
     // The file a manifest would hold is well-formed XML to an outside reader.
-    if (testutil::HaveProgram(QStringLiteral("xmllint"))) {
+    if (testutil::HaveProgram(u"xmllint"_s)) {
         QTemporaryDir dir;
-        const QString path = dir.filePath(QStringLiteral("m.xml"));
+        const QString path = dir.filePath(u"m.xml"_s);
         testutil::WriteFile(path, document.toByteArray());
-        EXPECT_EQ(testutil::RunProgram(QStringLiteral("xmllint"), {QStringLiteral("--noout"), path}), 0);
+        EXPECT_EQ(testutil::RunProgram(u"xmllint"_s, {u"--noout"_s, path}), 0);
     }
 
     RecordModule back;
@@ -175,23 +175,22 @@ TEST(TestModuleRecord, ManifestEntryRoundTrips)
     EXPECT_TRUE(back.applets[0].name.isEmpty());
     EXPECT_EQ(back.testCases.size(), 1);
     EXPECT_EQ(back.targets.size(), 1);
-    EXPECT_EQ(back.secondaryModules, QStringList{QStringLiteral("helper")});
+    EXPECT_EQ(back.secondaryModules, QStringList{u"helper"_s});
 }
 
 TEST(TestModuleRecord, ManifestReadingDropsMalformedEntriesAndKeepsTheRest)
 {
     QDomDocument document;
-    ASSERT_TRUE(document.setContent(QStringLiteral(
-        "<testmodule source='KVK'>"
+    ASSERT_TRUE(document.setContent(u"<testmodule source='KVK'>"
         "<targets><target name='a' arch='arm'/><target arch='arm'/><other name='b'/></targets>"
         "<applets><applet appletid='x'/><applet hostid='3'/><applet appletid='55' baseid='' flags='z'/></applets>"
         "<classids><classid value='0'/><classid value='nope'/><classid value='12'/></classids>"
         "<TestCases><testcase name='t'/><case name='u'/></TestCases>"
         "<secondary_modules><secondary_module name=''/><secondary_module/></secondary_modules>"
-        "</testmodule>")));
+        "</testmodule>"_s));
     RecordModule module;
     EXPECT_FALSE(module.ReadFromManifest(document.documentElement()));
-    EXPECT_EQ(module.targets.keys(), QStringList{QStringLiteral("a")});
+    EXPECT_EQ(module.targets.keys(), QStringList{u"a"_s});
     ASSERT_EQ(module.applets.size(), 1);
     EXPECT_EQ(module.applets[0].appletid, 55u);
     EXPECT_EQ(module.applets[0].baseid, 1000);
@@ -204,13 +203,13 @@ TEST(TestModuleRecord, ManifestReadingDropsMalformedEntriesAndKeepsTheRest)
 TEST(TestModuleRecord, GetCompilerVariantPrefersTheBuildAskedFor)
 {
     RecordModule module;
-    module.targets.insert(QStringLiteral("a"), Target(QStringLiteral("a"), IKestoDevice::PLATFORM_ARM, QStringLiteral("Release")));
-    EXPECT_EQ(module.GetCompilerVariant(IKestoDevice::PLATFORM_ARM, true)->name, QStringLiteral("a"));
-    module.targets.insert(QStringLiteral("b"), Target(QStringLiteral("b"), IKestoDevice::PLATFORM_ARM, QStringLiteral("Debug")));
-    module.targets.insert(QStringLiteral("c"), Target(QStringLiteral("c"), IKestoDevice::PLATFORM_ARM, QStringLiteral("other")));
-    module.targets.insert(QStringLiteral("d"), Target(QStringLiteral("d"), IKestoDevice::PLATFORM_WIN32, QStringLiteral("Debug")));
-    EXPECT_EQ(module.GetCompilerVariant(IKestoDevice::PLATFORM_ARM, true)->name, QStringLiteral("b"));
-    EXPECT_EQ(module.GetCompilerVariant(IKestoDevice::PLATFORM_ARM, false)->name, QStringLiteral("a"));
-    EXPECT_EQ(module.GetCompilerVariant(IKestoDevice::PLATFORM_WIN32, false)->name, QStringLiteral("d"));
+    module.targets.insert(u"a"_s, Target(u"a"_s, IKestoDevice::PLATFORM_ARM, u"Release"_s));
+    EXPECT_EQ(module.GetCompilerVariant(IKestoDevice::PLATFORM_ARM, true)->name, u"a"_s);
+    module.targets.insert(u"b"_s, Target(u"b"_s, IKestoDevice::PLATFORM_ARM, u"Debug"_s));
+    module.targets.insert(u"c"_s, Target(u"c"_s, IKestoDevice::PLATFORM_ARM, u"other"_s));
+    module.targets.insert(u"d"_s, Target(u"d"_s, IKestoDevice::PLATFORM_WIN32, u"Debug"_s));
+    EXPECT_EQ(module.GetCompilerVariant(IKestoDevice::PLATFORM_ARM, true)->name, u"b"_s);
+    EXPECT_EQ(module.GetCompilerVariant(IKestoDevice::PLATFORM_ARM, false)->name, u"a"_s);
+    EXPECT_EQ(module.GetCompilerVariant(IKestoDevice::PLATFORM_WIN32, false)->name, u"d"_s);
     EXPECT_TRUE(module.GetCompilerVariant(IKestoDevice::PLATFORM_UNKNOWN, false).isNull());
 }

@@ -14,6 +14,8 @@
 
 #include <unistd.h>
 
+using namespace Qt::StringLiterals;
+
 namespace {
 
 QDomDocument Parse(const QString &text)
@@ -26,30 +28,29 @@ QDomDocument Parse(const QString &text)
 TEST(XmlWriter, OrdersAttributesByNameAndIndentsOneBlankPerLevel)
 {
     QDomDocument doc;
-    QDomElement root = doc.createElement(QStringLiteral("manifest"));
+    QDomElement root = doc.createElement(u"manifest"_s);
     doc.appendChild(root);
-    QDomElement module = doc.createElement(QStringLiteral("module"));
+    QDomElement module = doc.createElement(u"module"_s);
     for (const char *name : {"zeta", "name", "alpha", "type", "id", "b"})
         module.setAttribute(QLatin1String(name), QLatin1String(name).toString().toUpper());
     root.appendChild(module);
-    QDomElement tc = doc.createElement(QStringLiteral("testcase"));
-    tc.appendChild(doc.createTextNode(QStringLiteral("Run & <check>")));
+    QDomElement tc = doc.createElement(u"testcase"_s);
+    tc.appendChild(doc.createTextNode(u"Run & <check>"_s));
     module.appendChild(tc);
 
     EXPECT_EQ(XmlWriter::ToString(doc),
-              QStringLiteral("<manifest>\n"
+              u"<manifest>\n"
                              " <module alpha=\"ALPHA\" b=\"B\" id=\"ID\" name=\"NAME\" type=\"TYPE\" zeta=\"ZETA\">\n"
                              "  <testcase>Run &amp; &lt;check&gt;</testcase>\n"
                              " </module>\n"
-                             "</manifest>\n"));
+                             "</manifest>\n"_s);
 }
 
 TEST(XmlWriter, WritesTheSameBytesInEveryProcess)
 {
     // Qt's own serialiser orders attributes by a per-process seed; two child
     // processes with different seeds must still agree with us.
-    const QString text = QStringLiteral(
-        "<a q=\"1\" w=\"2\" e=\"3\" r=\"4\" t=\"5\" y=\"6\" u=\"7\" i=\"8\"><b x=\"1\" y=\"2\"/></a>");
+    const QString text = u"<a q=\"1\" w=\"2\" e=\"3\" r=\"4\" t=\"5\" y=\"6\" u=\"7\" i=\"8\"><b x=\"1\" y=\"2\"/></a>"_s;
     const QByteArray ours = XmlWriter::Serialize(Parse(text));
     EXPECT_EQ(ours, QByteArray("<a e=\"3\" i=\"8\" q=\"1\" r=\"4\" t=\"5\" u=\"7\" w=\"2\" y=\"6\">\n"
                                " <b x=\"1\" y=\"2\"/>\n"
@@ -58,38 +59,36 @@ TEST(XmlWriter, WritesTheSameBytesInEveryProcess)
 
 TEST(XmlWriter, KeepsOnlyTheNodesTheDocumentHolds)
 {
-    EXPECT_FALSE(XmlWriter::ToString(Parse(QStringLiteral("<r/>"))).contains(QLatin1String("<?xml")));
+    EXPECT_FALSE(XmlWriter::ToString(Parse(u"<r/>"_s)).contains(QLatin1String("<?xml")));
     const QString withDecl = XmlWriter::ToString(
-        Parse(QStringLiteral("<?xml version=\"1.0\" encoding=\"UTF-8\"?><r><!--c--><?pi x?></r>")));
-    EXPECT_EQ(withDecl, QStringLiteral("<?xml version='1.0' encoding='UTF-8'?>\n"
-                                       "<r>\n <!--c-->\n <?pi x?>\n</r>\n"));
+        Parse(u"<?xml version=\"1.0\" encoding=\"UTF-8\"?><r><!--c--><?pi x?></r>"_s));
+    EXPECT_EQ(withDecl, u"<?xml version='1.0' encoding='UTF-8'?>\n<r>\n <!--c-->\n <?pi x?>\n</r>\n"_s);
 }
 
 TEST(XmlWriter, EscapesAttributesAndReplacesCharactersXmlCannotCarry)
 {
     QDomDocument doc;
-    QDomElement root = doc.createElement(QStringLiteral("r"));
-    root.setAttribute(QStringLiteral("v"), QStringLiteral("a\"b\nc<d>&"));
-    root.appendChild(doc.createTextNode(QString(QChar(0x01)) + QStringLiteral("x") + QChar(0xD800)));
+    QDomElement root = doc.createElement(u"r"_s);
+    root.setAttribute(u"v"_s, u"a\"b\nc<d>&"_s);
+    root.appendChild(doc.createTextNode(QString(QChar(0x01)) + u"x"_s + QChar(0xD800)));
     doc.appendChild(root);
     const QString text = XmlWriter::ToString(doc);
-    EXPECT_EQ(text, QStringLiteral("<r v=\"a&quot;b&#xa;c&lt;d&gt;&amp;\">") + QChar(0xFFFD)
-                        + QStringLiteral("x") + QChar(0xFFFD) + QStringLiteral("</r>\n"));
+    EXPECT_EQ(text, u"<r v=\"a&quot;b&#xa;c&lt;d&gt;&amp;\">"_s + QChar(0xFFFD) + u"x"_s + QChar(0xFFFD) + u"</r>\n"_s);
     QDomDocument back;
     ASSERT_TRUE(back.setContent(text));
-    EXPECT_EQ(back.documentElement().attribute(QStringLiteral("v")), QStringLiteral("a\"b\nc<d>&"));
+    EXPECT_EQ(back.documentElement().attribute(u"v"_s), u"a\"b\nc<d>&"_s);
 }
 
 TEST(FileWriter, AtomicWriteReplacesWholeFileOrLeavesItUntouched)
 {
     QTemporaryDir dir;
-    const QString path = dir.filePath(QStringLiteral("out.xml"));
+    const QString path = dir.filePath(u"out.xml"_s);
     ASSERT_TRUE(FileWriter::Write(path, "first"));
     ASSERT_TRUE(FileWriter::Write(path, "second"));
     EXPECT_EQ(testutil::ReadFile(path), QByteArray("second"));
 
     QString error;
-    EXPECT_FALSE(FileWriter::Write(dir.filePath(QStringLiteral("missing/out.xml")), "x", true, &error));
+    EXPECT_FALSE(FileWriter::Write(dir.filePath(u"missing/out.xml"_s), "x", true, &error));
     EXPECT_FALSE(error.isEmpty());
 
     if (::geteuid() != 0) {
@@ -102,33 +101,28 @@ TEST(FileWriter, AtomicWriteReplacesWholeFileOrLeavesItUntouched)
 
 TEST(XmlWriter, OutputIsWellFormedForXmllint)
 {
-    if (!testutil::HaveProgram(QStringLiteral("xmllint")))
+    if (!testutil::HaveProgram(u"xmllint"_s))
         GTEST_SKIP() << "xmllint not installed";
     QTemporaryDir dir;
-    const QString path = dir.filePath(QStringLiteral("doc.xml"));
-    QDomDocument doc = Parse(QStringLiteral("<r a='&lt;'><s>t</s></r>"));
-    doc.documentElement().appendChild(doc.createCDATASection(QStringLiteral("x]]>y")));
+    const QString path = dir.filePath(u"doc.xml"_s);
+    QDomDocument doc = Parse(u"<r a='&lt;'><s>t</s></r>"_s);
+    doc.documentElement().appendChild(doc.createCDATASection(u"x]]>y"_s));
     ASSERT_TRUE(XmlWriter::WriteDocument(doc, path));
     QByteArray out;
-    EXPECT_EQ(testutil::RunProgram(QStringLiteral("xmllint"), {QStringLiteral("--noout"), path}, &out), 0)
-        << out.constData();
+    EXPECT_EQ(testutil::RunProgram(u"xmllint"_s, {u"--noout"_s, path}, &out), 0) << out.constData();
 }
 
 TEST(XmlWriterDeclarations, DocumentTypeFollowsTheXmlDeclarationWithEntitiesByName)
 {
-    const QDomDocument doc = Parse(QStringLiteral(
-        "<?xml version=\"1.0\"?>\n"
+    const QDomDocument doc = Parse(u"<?xml version=\"1.0\"?>\n"
         "<!DOCTYPE pack [<!ENTITY zz SYSTEM \"z.xml\"><!ENTITY aa PUBLIC \"-//A//X\" \"a.xml\">"
         "<!ENTITY mm SYSTEM \"m.xml\">]>\n"
-        "<!--note--><pack/>"));
-    const QString expected = QStringLiteral("<?xml version='1.0'?>\n"
+        "<!--note--><pack/>"_s);
+    const QString expected = u"<?xml version='1.0'?>\n"
                                             "<!DOCTYPE pack [\n"
                                             "<!ENTITY aa PUBLIC \"-//A//X\" \"a.xml\">\n"
                                             "<!ENTITY mm SYSTEM \"m.xml\">\n"
-                                            "<!ENTITY zz SYSTEM \"z.xml\">\n"
-                                            "]>\n"
-                                            "<!--note-->\n"
-                                            "<pack/>\n");
+                                            "<!ENTITY zz SYSTEM \"z.xml\">\n]>\n<!--note-->\n<pack/>\n"_s;
     EXPECT_EQ(XmlWriter::ToString(doc), expected);
     // The same bytes from a fresh parse (declarations live in a seeded hash).
     EXPECT_EQ(XmlWriter::ToString(Parse(expected)), expected);
@@ -136,42 +130,40 @@ TEST(XmlWriterDeclarations, DocumentTypeFollowsTheXmlDeclarationWithEntitiesByNa
 
 TEST(XmlWriterDeclarations, DocumentTypeWithoutXmlDeclarationComesFirst)
 {
-    EXPECT_EQ(XmlWriter::ToString(Parse(QStringLiteral("<!DOCTYPE a SYSTEM \"a.dtd\"><a/>"))),
-              QStringLiteral("<!DOCTYPE a SYSTEM \"a.dtd\">\n<a/>\n"));
-    EXPECT_EQ(XmlWriter::ToString(Parse(QStringLiteral("<?xml version=\"1.0\"?><a/>"))),
-              QStringLiteral("<?xml version='1.0'?>\n<a/>\n"));
+    EXPECT_EQ(XmlWriter::ToString(Parse(u"<!DOCTYPE a SYSTEM \"a.dtd\"><a/>"_s)),
+              u"<!DOCTYPE a SYSTEM \"a.dtd\">\n<a/>\n"_s);
+    EXPECT_EQ(XmlWriter::ToString(Parse(u"<?xml version=\"1.0\"?><a/>"_s)), u"<?xml version='1.0'?>\n<a/>\n"_s);
 }
 
 TEST(XmlWriterDeclarations, EntityReferencesRunInline)
 {
     QDomDocument doc;
-    QDomElement root = doc.createElement(QStringLiteral("a"));
+    QDomElement root = doc.createElement(u"a"_s);
     doc.appendChild(root);
-    root.appendChild(doc.createTextNode(QStringLiteral("x")));
-    root.appendChild(doc.createEntityReference(QStringLiteral("ref")));
-    QDomElement b = doc.createElement(QStringLiteral("b"));
-    b.appendChild(doc.createEntityReference(QStringLiteral("only")));
+    root.appendChild(doc.createTextNode(u"x"_s));
+    root.appendChild(doc.createEntityReference(u"ref"_s));
+    QDomElement b = doc.createElement(u"b"_s);
+    b.appendChild(doc.createEntityReference(u"only"_s));
     root.appendChild(b);
-    EXPECT_EQ(XmlWriter::ToString(doc), QStringLiteral("<a>x&ref;<b>&only;</b>\n</a>\n"));
+    EXPECT_EQ(XmlWriter::ToString(doc), u"<a>x&ref;<b>&only;</b>\n</a>\n"_s);
 }
 
 TEST(XmlWriterDeclarations, AsciiStringEscapesEverythingBeyondAscii)
 {
     QDomDocument doc;
-    QDomElement root = doc.createElement(QStringLiteral("r"));
+    QDomElement root = doc.createElement(u"r"_s);
     doc.appendChild(root);
-    root.setAttribute(QStringLiteral("v"), QString::fromUtf8("\xc3\xa9\"\xf0\x9f\x98\x80"));
+    root.setAttribute(u"v"_s, QString::fromUtf8("\xc3\xa9\"\xf0\x9f\x98\x80"));
     root.appendChild(doc.createTextNode(QString::fromUtf8("caf\xc3\xa9 & \xe6\x97\xa5")));
     root.appendChild(doc.createCDATASection(QString::fromUtf8("a\xc3\xa9]]>b")));
     root.appendChild(doc.createCDATASection(QString()));
 
     const QString ascii = XmlWriter::ToAsciiString(doc);
-    EXPECT_EQ(ascii, QStringLiteral("<r v=\"&#xe9;&quot;&#x1f600;\">caf&#xe9; &amp; &#x65e5;"
-                                    "<![CDATA[a]]>&#xe9;<![CDATA[]]]]><![CDATA[>b]]><![CDATA[]]></r>\n"));
+    EXPECT_EQ(ascii, u"<r v=\"&#xe9;&quot;&#x1f600;\">caf&#xe9; &amp; &#x65e5;"
+                                    "<![CDATA[a]]>&#xe9;<![CDATA[]]]]><![CDATA[>b]]><![CDATA[]]></r>\n"_s);
     // Read back, it holds the same text.
     const QDomDocument back = Parse(ascii);
-    EXPECT_EQ(back.documentElement().attribute(QStringLiteral("v")),
-              QString::fromUtf8("\xc3\xa9\"\xf0\x9f\x98\x80"));
+    EXPECT_EQ(back.documentElement().attribute(u"v"_s), QString::fromUtf8("\xc3\xa9\"\xf0\x9f\x98\x80"));
     EXPECT_EQ(back.documentElement().text(), QString::fromUtf8("caf\xc3\xa9 & \xe6\x97\xa5" "a\xc3\xa9]]>b"));
 }
 
@@ -182,15 +174,12 @@ TEST(XmlWriterDeclarations, AsciiStringEscapesEverythingBeyondAscii)
 // nothing closes as an empty one.
 TEST(XmlWriterStream, PiecesGiveTheBytesOfTheWholeDocument)
 {
-    const QString text = QStringLiteral(
-        "<kit z=\"1\" a=\"x &amp; &quot;y&quot;\">"
+    const QString text = u"<kit z=\"1\" a=\"x &amp; &quot;y&quot;\">"
         "<modules>"
         "<module n=\"1\" b=\"2\"><case name=\"t&lt;1&gt;\"/><case name=\"t2\">text &amp; more</case></module>"
         "<module n=\"\u00e9\"/>"
         "</modules>"
-        "<empty k=\"v\"/>"
-        "<frameworks><framework name=\"ctf\"><variant/></framework></frameworks>"
-        "</kit>");
+        "<empty k=\"v\"/><frameworks><framework name=\"ctf\"><variant/></framework></frameworks></kit>"_s;
     const QDomDocument whole = Parse(text);
 
     XmlWriter::DocumentStream out;
@@ -220,13 +209,13 @@ TEST(XmlWriterStream, ADeviceReceivesTheSameBytesPieceByPiece)
     // Enough text to be passed on in several pieces, with characters whose
     // UTF-8 takes more than one byte.
     const auto write = [](XmlWriter::DocumentStream &out) {
-        XmlNode root(QStringLiteral("kit"));
-        root.SetAttribute(QStringLiteral("name"), QStringLiteral("caf\u00e9"));
+        XmlNode root(u"kit"_s);
+        root.SetAttribute(u"name"_s, u"caf\u00e9"_s);
         out.Open(root);
         for (int i = 0; i < 3000; ++i) {
-            XmlNode module(QStringLiteral("module"));
-            module.SetAttribute(QStringLiteral("n"), QString::number(i));
-            module.AppendElement(QStringLiteral("case")).SetAttribute(QStringLiteral("name"), QStringLiteral("\u65e5%1").arg(i));
+            XmlNode module(u"module"_s);
+            module.SetAttribute(u"n"_s, QString::number(i));
+            module.AppendElement(u"case"_s).SetAttribute(u"name"_s, u"\u65e5%1"_s.arg(i));
             out.Write(module);
         }
     };

@@ -86,8 +86,7 @@ void ExpectOnlyKnown(const char *table, const char *what,
     }
     for (const auto &[value, reason] : known) {
         if (!found.count(value))
-            ADD_FAILURE() << table << " " << what << Hex(value) << " agrees with iconv, though listed as: "
-                          << reason;
+            ADD_FAILURE() << table << " " << what << Hex(value) << " agrees with iconv, though listed as: " << reason;
     }
 }
 

@@ -51,10 +51,7 @@ protected:
         if (!testutil::HaveProgram(u"xmllint"_s))
             return;
         QByteArray messages;
-        EXPECT_EQ(testutil::RunProgram(u"xmllint"_s, {u"--noout"_s, output},
-                                       &messages),
-                  0)
-            << messages.toStdString();
+        EXPECT_EQ(testutil::RunProgram(u"xmllint"_s, {u"--noout"_s, output}, &messages), 0) << messages.toStdString();
     }
 
     QTemporaryDir temp;

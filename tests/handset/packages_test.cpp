@@ -18,6 +18,8 @@
 #include <signal.h>
 #include <unistd.h>
 
+using namespace Qt::StringLiterals;
+
 namespace {
 
 using testutil::HandsetFixture;
@@ -43,21 +45,21 @@ class PackageTest : public ::testing::Test
 protected:
     void SetUp() override
     {
-        fixture.AddHandset(QStringLiteral("phone"));
-        device = fixture.Connect(QStringLiteral("phone"));
+        fixture.AddHandset(u"phone"_s);
+        device = fixture.Connect(u"phone"_s);
         ASSERT_TRUE(device);
-        layout.directory = QStringLiteral("ctfmod");
+        layout.directory = u"ctfmod"_s;
         layout.classIds = {kClass, 0x01020305};
         layout.appletIds = {kApplet};
-        layout.programs = {{QStringLiteral("ctfmod_k"), QStringLiteral("-v")}};
-        layout.files = {{QStringLiteral("data/table.txt"), "rows"}};
+        layout.programs = {{u"ctfmod_k"_s, u"-v"_s}};
+        layout.files = {{u"data/table.txt"_s, "rows"}};
     }
 
     QString Host(const char *handsetPath) const
     {
-        return fixture.HostPath(QStringLiteral("phone"), QString::fromUtf8(handsetPath));
+        return fixture.HostPath(u"phone"_s, QString::fromUtf8(handsetPath));
     }
-    QString Fs() const { return fixture.HandsetFolder(QStringLiteral("phone")) + QStringLiteral("/fs"); }
+    QString Fs() const { return fixture.HandsetFolder(u"phone"_s) + u"/fs"_s; }
 
     HandsetFixture fixture;
     HandsetFixture::Device device;
@@ -66,24 +68,24 @@ protected:
 
 TEST_F(PackageTest, InstalledModuleIsFoundByClassAndAppletAndByItsClassDirectory)
 {
-    const QString package = fixture.MakePackage(QStringLiteral("ctfmod.kestix"), layout);
+    const QString package = fixture.MakePackage(u"ctfmod.kestix"_s, layout);
     ASSERT_EQ(device->InstallPackage(package), 0u);
     EXPECT_EQ(testutil::ReadFile(Host("fs:/usermods/ctfmod/data/table.txt")), QByteArray("rows"));
 
     QString directory;
     EXPECT_EQ(device->FindModule(kClass, directory), 0u);
-    EXPECT_EQ(directory, QStringLiteral("fs:/usermods/ctfmod/"));
+    EXPECT_EQ(directory, u"fs:/usermods/ctfmod/"_s);
     directory.clear();
     EXPECT_EQ(device->FindModule(kApplet, directory), 0u);
-    EXPECT_EQ(directory, QStringLiteral("fs:/usermods/ctfmod/"));
+    EXPECT_EQ(directory, u"fs:/usermods/ctfmod/"_s);
     EXPECT_NE(device->FindModule(0x0badc0de, directory), 0u);
 
     QSharedPointer<_DirectoryInfo> info;
-    ASSERT_EQ(device->ListDirectory(QStringLiteral("fs:/~0x0103abcd"), info), 0u);
+    ASSERT_EQ(device->ListDirectory(u"fs:/~0x0103abcd"_s, info), 0u);
     ASSERT_TRUE(info->HasFiles());
-    EXPECT_EQ(info->FirstFile()->fileName, QStringLiteral("fs:/usermods/ctfmod/ctfmod.mif"));
-    EXPECT_TRUE(device->FileExists(QStringLiteral("fs:/~0x01020304/data/table.txt")));
-    EXPECT_TRUE(device->CopyOnDevice(QStringLiteral("fs:/~0x01020304/ctfmod.mif"), QStringLiteral("fs:/mif/ctfmod.mif")));
+    EXPECT_EQ(info->FirstFile()->fileName, u"fs:/usermods/ctfmod/ctfmod.mif"_s);
+    EXPECT_TRUE(device->FileExists(u"fs:/~0x01020304/data/table.txt"_s));
+    EXPECT_TRUE(device->CopyOnDevice(u"fs:/~0x01020304/ctfmod.mif"_s, u"fs:/mif/ctfmod.mif"_s));
 
     // A copy of the module information elsewhere does not make a second module.
     EXPECT_EQ(device->DeleteDirectory(kApplet), 0u);
@@ -95,23 +97,21 @@ TEST_F(PackageTest, InstalledModuleIsFoundByClassAndAppletAndByItsClassDirectory
 
 TEST_F(PackageTest, PackageMadeByTheTarProgramInstalls)
 {
-    if (!testutil::HaveProgram(QStringLiteral("tar")))
+    if (!testutil::HaveProgram(u"tar"_s))
         GTEST_SKIP() << "tar is not installed";
-    const QString source = fixture.WorkFolder() + QStringLiteral("/src");
+    const QString source = fixture.WorkFolder() + u"/src"_s;
     for (const auto &member : testutil::ModuleMembers(layout))
         testutil::WriteFile(source + QLatin1Char('/') + member.first, member.second);
     // Two links to one file: GNU tar stores the second as a hard link.
-    ASSERT_EQ(::link(QFile::encodeName(source + QStringLiteral("/ctfmod/data/table.txt")).constData(),
-                     QFile::encodeName(source + QStringLiteral("/ctfmod/data/same.txt")).constData()),
+    ASSERT_EQ(::link(QFile::encodeName(source + u"/ctfmod/data/table.txt"_s).constData(),
+                     QFile::encodeName(source + u"/ctfmod/data/same.txt"_s).constData()),
               0);
-    const QString package = fixture.WorkFolder() + QStringLiteral("/gnu.kestix");
-    ASSERT_EQ(testutil::RunProgram(QStringLiteral("tar"), {QStringLiteral("-cf"), package, QStringLiteral("-C"),
-                                                           source, QStringLiteral(".")}),
-              0);
+    const QString package = fixture.WorkFolder() + u"/gnu.kestix"_s;
+    ASSERT_EQ(testutil::RunProgram(u"tar"_s, {u"-cf"_s, package, u"-C"_s, source, u"."_s}), 0);
     ASSERT_EQ(device->InstallPackage(package), 0u);
     QString directory;
     EXPECT_EQ(device->FindModule(kClass, directory), 0u);
-    EXPECT_EQ(directory, QStringLiteral("fs:/usermods/ctfmod/"));
+    EXPECT_EQ(directory, u"fs:/usermods/ctfmod/"_s);
     EXPECT_EQ(testutil::ReadFile(Host("fs:/usermods/ctfmod/data/same.txt")), QByteArray("rows"));
     EXPECT_EQ(testutil::ReadFile(Host("fs:/usermods/ctfmod/data/table.txt")), QByteArray("rows"));
 }
@@ -119,8 +119,8 @@ TEST_F(PackageTest, PackageMadeByTheTarProgramInstalls)
 TEST_F(PackageTest, ModuleInformationDirectlyInUsermodsNamesNoModule)
 {
     layout.directory.clear();
-    layout.mifName = QStringLiteral("loose.mif");
-    ASSERT_EQ(device->InstallPackage(fixture.MakePackage(QStringLiteral("loose.kestix"), layout)), 0u);
+    layout.mifName = u"loose.mif"_s;
+    ASSERT_EQ(device->InstallPackage(fixture.MakePackage(u"loose.kestix"_s, layout)), 0u);
     QString directory;
     EXPECT_EQ(device->FindModule(kClass, directory), HANDSET_ERROR_NOT_FOUND);
 }
@@ -128,12 +128,12 @@ TEST_F(PackageTest, ModuleInformationDirectlyInUsermodsNamesNoModule)
 TEST_F(PackageTest, FirstModuleByPathWinsWhenTwoListTheSameClass)
 {
     ModuleSpec other = layout;
-    other.directory = QStringLiteral("aaa");
-    ASSERT_EQ(device->InstallPackage(fixture.MakePackage(QStringLiteral("b.kestix"), layout)), 0u);
-    ASSERT_EQ(device->InstallPackage(fixture.MakePackage(QStringLiteral("a.kestix"), other)), 0u);
+    other.directory = u"aaa"_s;
+    ASSERT_EQ(device->InstallPackage(fixture.MakePackage(u"b.kestix"_s, layout)), 0u);
+    ASSERT_EQ(device->InstallPackage(fixture.MakePackage(u"a.kestix"_s, other)), 0u);
     QString directory;
     EXPECT_EQ(device->FindModule(kClass, directory), 0u);
-    EXPECT_EQ(directory, QStringLiteral("fs:/usermods/aaa/"));
+    EXPECT_EQ(directory, u"fs:/usermods/aaa/"_s);
 }
 
 struct BadPackage
@@ -146,25 +146,24 @@ class HostilePackage : public PackageTest, public ::testing::WithParamInterface<
 
 TEST_P(HostilePackage, IsRefusedAsAWholeAndLeavesNothingBehind)
 {
-    if (!testutil::HaveProgram(QStringLiteral("tar")))
+    if (!testutil::HaveProgram(u"tar"_s))
         GTEST_SKIP() << "tar is not installed";
     // The members are real files below work/a/b so that "../" names resolve.
-    const QString base = fixture.WorkFolder() + QStringLiteral("/a/b");
-    testutil::WriteFile(base + QStringLiteral("/good/good.txt"), "good");
-    testutil::WriteFile(fixture.WorkFolder() + QStringLiteral("/a/evil.txt"), "evil");
-    QStringList arguments{QStringLiteral("-P"), QStringLiteral("-cf"), fixture.WorkFolder() + QStringLiteral("/bad.tar"),
-                          QStringLiteral("good/good.txt")};
+    const QString base = fixture.WorkFolder() + u"/a/b"_s;
+    testutil::WriteFile(base + u"/good/good.txt"_s, "good");
+    testutil::WriteFile(fixture.WorkFolder() + u"/a/evil.txt"_s, "evil");
+    QStringList arguments{u"-P"_s, u"-cf"_s, fixture.WorkFolder() + u"/bad.tar"_s, u"good/good.txt"_s};
     for (const char *name : GetParam().names)
-        arguments.append(QString::fromUtf8(name).replace(QStringLiteral("@WORK@"), fixture.WorkFolder()));
-    ASSERT_EQ(testutil::RunProgram(QStringLiteral("tar"), arguments, nullptr, base), 0);
+        arguments.append(QString::fromUtf8(name).replace(u"@WORK@"_s, fixture.WorkFolder()));
+    ASSERT_EQ(testutil::RunProgram(u"tar"_s, arguments, nullptr, base), 0);
 
     QDir().mkpath(Host("fs:/usermods/existing"));
     const QStringList before = Tree(Fs());
-    EXPECT_EQ(device->InstallPackage(fixture.WorkFolder() + QStringLiteral("/bad.tar")), HANDSET_ERROR_BAD_PACKAGE);
+    EXPECT_EQ(device->InstallPackage(fixture.WorkFolder() + u"/bad.tar"_s), HANDSET_ERROR_BAD_PACKAGE);
     EXPECT_EQ(device->lastError, HANDSET_ERROR_BAD_PACKAGE);
     EXPECT_EQ(Tree(Fs()), before);
-    EXPECT_FALSE(QFileInfo::exists(fixture.HandsetsFolder() + QStringLiteral("/phone/fs/evil.txt")));
-    EXPECT_FALSE(QFileInfo::exists(fixture.HandsetsFolder() + QStringLiteral("/phone/evil.txt")));
+    EXPECT_FALSE(QFileInfo::exists(fixture.HandsetsFolder() + u"/phone/fs/evil.txt"_s));
+    EXPECT_FALSE(QFileInfo::exists(fixture.HandsetsFolder() + u"/phone/evil.txt"_s));
 }
 
 INSTANTIATE_TEST_SUITE_P(Members, HostilePackage,
@@ -175,24 +174,24 @@ INSTANTIATE_TEST_SUITE_P(Members, HostilePackage,
 
 TEST_F(PackageTest, MemberLeadingThroughALinkOutOfTheHandsetRefusesThePackage)
 {
-    const QString outside = fixture.WorkFolder() + QStringLiteral("/outside");
+    const QString outside = fixture.WorkFolder() + u"/outside"_s;
     QDir().mkpath(outside);
     QDir().mkpath(Host("fs:/usermods"));
     ASSERT_TRUE(QFile::link(outside, Host("fs:/usermods/ctfmod")));
-    EXPECT_EQ(device->InstallPackage(fixture.MakePackage(QStringLiteral("p.kestix"), layout)), HANDSET_ERROR_BAD_PACKAGE);
+    EXPECT_EQ(device->InstallPackage(fixture.MakePackage(u"p.kestix"_s, layout)), HANDSET_ERROR_BAD_PACKAGE);
     EXPECT_TRUE(QDir(outside).isEmpty());
-    EXPECT_EQ(Tree(Fs()), (QStringList{QStringLiteral("usermods"), QStringLiteral("usermods/ctfmod")}));
+    EXPECT_EQ(Tree(Fs()), (QStringList{u"usermods"_s, u"usermods/ctfmod"_s}));
 }
 
 TEST_F(PackageTest, DamagedPackageIsRefusedWithItsReasonAndInstallsNothing)
 {
     Log log;
-    log.SetLogPath(fixture.WorkFolder() + QStringLiteral("/log.txt"));
-    device = fixture.Connect(QStringLiteral("phone"), &log);
+    log.SetLogPath(fixture.WorkFolder() + u"/log.txt"_s);
+    device = fixture.Connect(u"phone"_s, &log);
     ASSERT_TRUE(device);
-    const QString package = fixture.MakePackage(QStringLiteral("p.kestix"),
-                                                testutil::Members{{QStringLiteral("m/a.txt"), "a"},
-                                                                  {QStringLiteral("m/big.bin"), QByteArray(4096, 'x')}});
+    const QString package = fixture.MakePackage(u"p.kestix"_s,
+                                                testutil::Members{{u"m/a.txt"_s, "a"},
+                                                                  {u"m/big.bin"_s, QByteArray(4096, 'x')}});
     QByteArray bytes = testutil::ReadFile(package);
     const struct
     {
@@ -209,8 +208,8 @@ TEST_F(PackageTest, DamagedPackageIsRefusedWithItsReasonAndInstallsNothing)
         testutil::WriteFile(path, c.bytes);
         EXPECT_EQ(device->InstallPackage(path), HANDSET_ERROR_BAD_PACKAGE) << c.name;
         EXPECT_TRUE(Tree(Fs()).isEmpty()) << c.name;
-        EXPECT_TRUE(testutil::ReadFile(fixture.WorkFolder() + QStringLiteral("/log.txt"))
-                        .contains(QStringLiteral("EmulatedHandset::InstallPackage refused %1: %2\n")
+        EXPECT_TRUE(testutil::ReadFile(fixture.WorkFolder() + u"/log.txt"_s)
+                        .contains(u"EmulatedHandset::InstallPackage refused %1: %2\n"_s
                                       .arg(path, QLatin1String(c.reason))
                                       .toLatin1()))
             << c.name;
@@ -221,17 +220,16 @@ TEST_F(PackageTest, WriteFailureTakesBackWhatThePackageWrote)
 {
     // "m/x" exists as a folder, so the second member cannot be written.
     QDir().mkpath(Host("fs:/usermods/m/x/inner"));
-    const QString package = fixture.MakePackage(QStringLiteral("p.kestix"),
-                                                testutil::Members{{QStringLiteral("new/deep/a.txt"), "a"},
-                                                                  {QStringLiteral("m/x"), "b"}});
+    const QString package = fixture.MakePackage(u"p.kestix"_s,
+                                                testutil::Members{{u"new/deep/a.txt"_s, "a"},
+                                                                  {u"m/x"_s, "b"}});
     EXPECT_EQ(device->InstallPackage(package), HANDSET_ERROR_IO);
-    EXPECT_EQ(Tree(Fs()), (QStringList{QStringLiteral("usermods"), QStringLiteral("usermods/m"),
-                                       QStringLiteral("usermods/m/x"), QStringLiteral("usermods/m/x/inner")}));
+    EXPECT_EQ(Tree(Fs()), (QStringList{u"usermods"_s, u"usermods/m"_s, u"usermods/m/x"_s, u"usermods/m/x/inner"_s}));
 }
 
 TEST_F(PackageTest, ArchiveWithoutFilesIsRefused)
 {
-    EXPECT_EQ(device->InstallPackage(fixture.MakePackage(QStringLiteral("empty.kestix"), testutil::Members{})),
+    EXPECT_EQ(device->InstallPackage(fixture.MakePackage(u"empty.kestix"_s, testutil::Members{})),
               HANDSET_ERROR_BAD_PACKAGE);
 }
 
@@ -244,33 +242,33 @@ protected:
         // Logs what it was asked and where it ran.
         layout.behaviour = "echo \"$1 $2 [$3] [$4] $(pwd) $HANDSET_FS\" > \"$HANDSET_MODULE_DIR/run.log\"\n"
                          "echo '[/VERBOSE]' >> \"$HANDSET_MODULE_DIR/run.log\"\n";
-        ASSERT_EQ(device->InstallPackage(fixture.MakePackage(QStringLiteral("ctfmod.kestix"), layout)), 0u);
+        ASSERT_EQ(device->InstallPackage(fixture.MakePackage(u"ctfmod.kestix"_s, layout)), 0u);
     }
 
     QByteArray RunLog()
     {
-        const QString copy = fixture.WorkFolder() + QStringLiteral("/run.log");
+        const QString copy = fixture.WorkFolder() + u"/run.log"_s;
         QFile::remove(copy);
-        EXPECT_EQ(device->CopyFileFromDevice(QStringLiteral("fs:/~0x01020304/run.log"), copy), 0u);
+        EXPECT_EQ(device->CopyFileFromDevice(u"fs:/~0x01020304/run.log"_s, copy), 0u);
         return testutil::ReadFile(copy);
     }
 };
 
 TEST_F(BehaviourTest, ProgramRunsItsBehaviourToTheEndAndLeavesItsLog)
 {
-    ASSERT_EQ(device->StartProgram(QStringLiteral("ctfmod_k"), QStringLiteral("  -v  two words ")), 0u);
-    EXPECT_FALSE(device->IsProgramRunning(QStringLiteral("ctfmod_k")));
+    ASSERT_EQ(device->StartProgram(u"ctfmod_k"_s, u"  -v  two words "_s), 0u);
+    EXPECT_FALSE(device->IsProgramRunning(u"ctfmod_k"_s));
     const QByteArray fs = QDir(Fs()).canonicalPath().toUtf8();
     EXPECT_EQ(RunLog(), "program ctfmod_k [-v] [two] " + fs + " " + Fs().toUtf8() + "\n[/VERBOSE]\n");
 
     QSharedPointer<_DirectoryInfo> info;
-    ASSERT_EQ(device->ListDirectory(QStringLiteral("fs:/~0x01020304"), info), 0u);
+    ASSERT_EQ(device->ListDirectory(u"fs:/~0x01020304"_s, info), 0u);
     QStringList names;
     for (auto it = info->FirstFile(); it != info->LastFile(); ++it)
         names.append(it->fileName);
-    EXPECT_TRUE(names.contains(QStringLiteral("fs:/usermods/ctfmod/run.log")));
-    EXPECT_EQ(device->DeleteFile(QStringLiteral("fs:/usermods/ctfmod/run.log")), 0u);
-    EXPECT_FALSE(device->FileExists(QStringLiteral("fs:/~0x01020304/run.log")));
+    EXPECT_TRUE(names.contains(u"fs:/usermods/ctfmod/run.log"_s));
+    EXPECT_EQ(device->DeleteFile(u"fs:/usermods/ctfmod/run.log"_s), 0u);
+    EXPECT_FALSE(device->FileExists(u"fs:/~0x01020304/run.log"_s));
 }
 
 TEST_F(BehaviourTest, AppletRunsItsBehaviourWithTheClassId)
@@ -283,9 +281,9 @@ TEST_F(BehaviourTest, AppletRunsItsBehaviourWithTheClassId)
 TEST_F(BehaviourTest, ModuleWithoutBehaviourStartsAndEndsAtOnce)
 {
     ModuleSpec quiet;
-    quiet.directory = QStringLiteral("quiet");
+    quiet.directory = u"quiet"_s;
     quiet.appletIds = {0x77};
-    ASSERT_EQ(device->InstallPackage(fixture.MakePackage(QStringLiteral("quiet.kestix"), quiet)), 0u);
+    ASSERT_EQ(device->InstallPackage(fixture.MakePackage(u"quiet.kestix"_s, quiet)), 0u);
     EXPECT_EQ(device->StartApplet(0x77, QString()), 0u);
     EXPECT_FALSE(device->IsAppletRunning(0x77));
 }
@@ -293,24 +291,24 @@ TEST_F(BehaviourTest, ModuleWithoutBehaviourStartsAndEndsAtOnce)
 TEST_F(BehaviourTest, ProgramsOfEitherProgramTypeAreFoundByTheirExactName)
 {
     ModuleSpec other;
-    other.directory = QStringLiteral("other");
-    other.programs = {{QStringLiteral("abc"), QString(), 0x0102C305}, {QStringLiteral("Main"), QString()}};
+    other.directory = u"other"_s;
+    other.programs = {{u"abc"_s, QString(), 0x0102C305}, {u"Main"_s, QString()}};
     other.behaviour = "echo \"$2\" > \"$HANDSET_MODULE_DIR/run.log\"\n";
-    ASSERT_EQ(device->InstallPackage(fixture.MakePackage(QStringLiteral("other.kestix"), other)), 0u);
-    EXPECT_EQ(device->StartProgram(QStringLiteral("abc"), QString()), 0u);
+    ASSERT_EQ(device->InstallPackage(fixture.MakePackage(u"other.kestix"_s, other)), 0u);
+    EXPECT_EQ(device->StartProgram(u"abc"_s, QString()), 0u);
     EXPECT_EQ(testutil::ReadFile(Host("fs:/usermods/other/run.log")), QByteArray("abc\n"));
-    EXPECT_EQ(device->StartProgram(QStringLiteral("Main"), QString()), 0u);
-    EXPECT_EQ(device->StartProgram(QStringLiteral("main"), QString()), HANDSET_ERROR_NOT_FOUND);
-    EXPECT_EQ(device->StartProgram(QStringLiteral("ab"), QString()), HANDSET_ERROR_NOT_FOUND);
+    EXPECT_EQ(device->StartProgram(u"Main"_s, QString()), 0u);
+    EXPECT_EQ(device->StartProgram(u"main"_s, QString()), HANDSET_ERROR_NOT_FOUND);
+    EXPECT_EQ(device->StartProgram(u"ab"_s, QString()), HANDSET_ERROR_NOT_FOUND);
 }
 
 TEST_F(BehaviourTest, BehaviourLinkedToAHostFileOutsideTheHandsetIsNotRun)
 {
-    const QString outside = fixture.WorkFolder() + QStringLiteral("/outside.sh");
+    const QString outside = fixture.WorkFolder() + u"/outside.sh"_s;
     testutil::WriteFile(outside, "echo ran > \"$HANDSET_MODULE_DIR/run.log\"\n");
     ASSERT_TRUE(QFile::remove(Host("fs:/usermods/ctfmod/behaviour")));
     ASSERT_TRUE(QFile::link(outside, Host("fs:/usermods/ctfmod/behaviour")));
-    EXPECT_EQ(device->StartProgram(QStringLiteral("ctfmod_k"), QString()), HANDSET_ERROR_BAD_PATH);
+    EXPECT_EQ(device->StartProgram(u"ctfmod_k"_s, QString()), HANDSET_ERROR_BAD_PATH);
     EXPECT_FALSE(QFileInfo::exists(Host("fs:/usermods/ctfmod/run.log")));
 }
 
@@ -318,7 +316,7 @@ TEST_F(BehaviourTest, BehaviourThatDoesNotEndIsKilledAfterTheTimeout)
 {
     testutil::WriteFile(Host("fs:/usermods/ctfmod/behaviour"), "echo started > \"$HANDSET_MODULE_DIR/run.log\"\nsleep 30\n");
     static_cast<EmulatedHandset *>(device.get())->SetBehaviourTimeout(200);
-    ASSERT_EQ(device->StartProgram(QStringLiteral("ctfmod_k"), QString()), 0u);
+    ASSERT_EQ(device->StartProgram(u"ctfmod_k"_s, QString()), 0u);
     EXPECT_EQ(RunLog(), QByteArray("started\n"));
 }
 
@@ -327,16 +325,15 @@ bool IsAlive(qint64 pid)
 {
     if (::kill(pid_t(pid), 0) != 0)
         return false;
-    const QByteArray stat = testutil::ReadFile(QStringLiteral("/proc/%1/stat").arg(pid));
+    const QByteArray stat = testutil::ReadFile(u"/proc/%1/stat"_s.arg(pid));
     const int close = stat.lastIndexOf(')');
     return close < 0 || stat.mid(close + 2, 1) != "Z";
 }
 
 TEST_F(BehaviourTest, NothingTheBehaviourStartedOutlivesTheStartCall)
 {
-    testutil::WriteFile(Host("fs:/usermods/ctfmod/behaviour"),
-                        "sleep 30 &\necho $! > \"$HANDSET_MODULE_DIR/pid\"\n");
-    ASSERT_EQ(device->StartProgram(QStringLiteral("ctfmod_k"), QString()), 0u);
+    testutil::WriteFile(Host("fs:/usermods/ctfmod/behaviour"), "sleep 30 &\necho $! > \"$HANDSET_MODULE_DIR/pid\"\n");
+    ASSERT_EQ(device->StartProgram(u"ctfmod_k"_s, QString()), 0u);
     const qint64 pid = testutil::ReadFile(Host("fs:/usermods/ctfmod/pid")).trimmed().toLongLong();
     ASSERT_GT(pid, 0);
     // The kill is immediate; only the reaping of the orphan may take a moment.

@@ -17,6 +17,8 @@
 
 #include <gtest/gtest.h>
 
+using namespace Qt::StringLiterals;
+
 namespace moduletest {
 
 using Pairs = QList<QPair<QString, QString>>;
@@ -37,7 +39,7 @@ inline QSharedPointer<_CompilerVariant> Target(const QString &package,
     QSharedPointer<_CompilerVariant> variant(new _CompilerVariant);
     variant->name = QFileInfo(package).completeBaseName();
     variant->arch = arch;
-    variant->build = QStringLiteral("Release");
+    variant->build = u"Release"_s;
     variant->packagePath = package;
     return variant;
 }
@@ -46,7 +48,7 @@ inline QSharedPointer<_CompilerVariant> Target(const QString &package,
 class ModuleFolder : public ::testing::Test
 {
 protected:
-    ModuleFolder() { log.SetLogPath(dir.filePath(QStringLiteral("log.txt"))); }
+    ModuleFolder() { log.SetLogPath(dir.filePath(u"log.txt"_s)); }
     // Writes bytes to name in the folder; the file's path.
     QString Write(const QString &name, const QByteArray &bytes)
     {
@@ -54,7 +56,7 @@ protected:
         testutil::WriteFile(path, bytes);
         return path;
     }
-    QString LogText() const { return QString::fromLatin1(testutil::ReadFile(dir.filePath(QStringLiteral("log.txt")))); }
+    QString LogText() const { return QString::fromLatin1(testutil::ReadFile(dir.filePath(u"log.txt"_s))); }
 
     QTemporaryDir dir;
     Log log;

@@ -85,8 +85,7 @@ protected:
         QString arguments;
         module.SetRunOption(option);
         module.SetTestCases(cases);
-        EXPECT_CALL(device, StartApplet(0x01010001u, _))
-            .WillOnce(DoAll(::testing::SaveArg<1>(&arguments), Return(0u)));
+        EXPECT_CALL(device, StartApplet(0x01010001u, _)).WillOnce(DoAll(::testing::SaveArg<1>(&arguments), Return(0u)));
         EXPECT_TRUE(module.Run(&device, env));
         EXPECT_TRUE(module.runOption.isEmpty());
         return arguments;
@@ -187,8 +186,7 @@ TEST(OatFramework, IsLoadedUsesTheFixedClassIdAndUnloadRemovesEveryOatFolder)
     _OatFramework framework;
     framework.classId = 5;
     EXPECT_CALL(device, FindModule(0x01010001u, _)).WillRepeatedly(Return(1u));
-    EXPECT_CALL(device, ListDirectory(u"fs:/~0x01010001"_s, _))
-        .WillOnce(ListingOf({u"fs:/~0x01010001/oat.mif"_s}));
+    EXPECT_CALL(device, ListDirectory(u"fs:/~0x01010001"_s, _)).WillOnce(ListingOf({u"fs:/~0x01010001/oat.mif"_s}));
     EXPECT_TRUE(framework.IsLoaded(&device));
 
     ::testing::InSequence order;

@@ -104,8 +104,7 @@ TEST_F(RunContract, KindsRenameTheirLogsOnTheHost)
 
     CtfAppletTestModule applet;
     applet.applets << AppletWithId(0x20);
-    EXPECT_CALL(device, FindModule(0x20u, _))
-        .WillRepeatedly(DoAll(SetArgReferee<1>(u"fs:/usermods/a/"_s), Return(0u)));
+    EXPECT_CALL(device, FindModule(0x20u, _)).WillRepeatedly(DoAll(SetArgReferee<1>(u"fs:/usermods/a/"_s), Return(0u)));
     EXPECT_CALL(device, ListDirectory(u"fs:/usermods/a/"_s, _))
         .WillRepeatedly(ListingOf({u"fs:/usermods/a/suite_K.LOG"_s, u"fs:/usermods/a/other_k.log"_s,
                                    u"fs:/usermods/a/notes.txt"_s}));
@@ -229,8 +228,7 @@ TEST_F(RunContract, LogWaitsGiveUpWhenTheEndMarkerNeverComes)
     EXPECT_CALL(device, FileExists(u"fs:/shared/pek/log/timer_u.oat"_s)).WillRepeatedly(Return(true));
     EXPECT_CALL(device, CopyFileFromDevice(u"fs:/shared/pek/log/timer_u.oat"_s, _))
         .WillOnce(Return(1u))
-        .WillOnce(Invoke(CopiesContent("@Timer\n")))
-        .WillOnce(Invoke(CopiesContent("@Timer\nRESULT: done\n")));
+        .WillOnce(Invoke(CopiesContent("@Timer\n"))).WillOnce(Invoke(CopiesContent("@Timer\nRESULT: done\n")));
     EXPECT_TRUE(oat.IsLogComplete(&device));
 }
 
@@ -262,8 +260,7 @@ TEST_F(RunContract, UtCompletionNeedsBothMarkers)
         .WillRepeatedly(ListingOf({u"fs:/usermods/ut/log/r.txt"_s, u"fs:/usermods/ut/log/r.xml"_s}));
     int textCopies = 0;
     EXPECT_CALL(device, CopyFileFromDevice(u"fs:/usermods/ut/log/r.xml"_s, _))
-        .WillOnce(Invoke(CopiesContent("<TestRunLog>")))
-        .WillOnce(Invoke(CopiesContent("<TestRunLog></TestRunLog>")));
+        .WillOnce(Invoke(CopiesContent("<TestRunLog>"))).WillOnce(Invoke(CopiesContent("<TestRunLog></TestRunLog>")));
     EXPECT_CALL(device, CopyFileFromDevice(u"fs:/usermods/ut/log/r.txt"_s, _))
         .WillRepeatedly(Invoke([&textCopies](const QString &, const QString &host) {
             return CopiesContent(++textCopies < 4 ? "elapsed time: lower case\n" : "Elapsed Time: 1s\n")(QString(), host);
@@ -324,9 +321,7 @@ TEST_F(RunContract, CtfRunResetsTheLogAndStartsThePreferredProgram)
     EXPECT_CALL(device, CopyFileToDevice(QDir::cleanPath(dir.path()) + u"/CTF.log"_s,
                                          u"fs:/usermods/CTF/CTF.log"_s)).WillRepeatedly(Return(0u));
     EXPECT_CALL(device, InstallPackage(_)).WillRepeatedly(Return(0u));
-    EXPECT_CALL(device, StartProgram(u"Foo_k_main"_s, u"-v"_s))
-        .WillOnce(Return(0u))
-        .WillOnce(Return(2u));
+    EXPECT_CALL(device, StartProgram(u"Foo_k_main"_s, u"-v"_s)).WillOnce(Return(0u)).WillOnce(Return(2u));
     EXPECT_CALL(device, IsProgramRunning(_)).WillRepeatedly(Return(true));
     EXPECT_TRUE(ctf.Run(&device, env)); // still running at the limit: true all the same
     EXPECT_TRUE(QFile::exists(dir.filePath(u"CTF.log"_s)));

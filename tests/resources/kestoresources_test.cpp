@@ -27,16 +27,12 @@ bool HasConverter(quint16 format)
 TEST(KestoResources, NamesTheKnownTypesAndFormats)
 {
     KestoResources resources;
-    EXPECT_EQ(resources.GetResourceTypeName(0x0001), u"Strings"_s);
-    EXPECT_EQ(resources.GetResourceTypeName(0x0006), u"Objects"_s);
-    EXPECT_EQ(resources.GetResourceTypeName(0x5000), u"Binaries"_s);
-    EXPECT_EQ(resources.GetResourceTypeName(0x6000), u"Sys Resource"_s);
-    EXPECT_EQ(resources.GetResourceTypeName(0x6001), u"Granted Priviledges"_s);
-    EXPECT_EQ(resources.GetResourceTypeName(0x6002), u"Required Priviledges"_s);
-    EXPECT_EQ(resources.GetResourceTypeName(0x6011), u"Priviledge Data"_s);
-    EXPECT_EQ(resources.GetResourceTypeName(7), u"Type: 7 (0x0007)"_s);
-    EXPECT_EQ(resources.GetResourceTypeName(4096), u"Type: 4096 (0x1000)"_s);
-    EXPECT_EQ(resources.GetResourceTypeName(0xBEEF), u"Type: 48879 (0xbeef)"_s);
+    const std::pair<quint16, const char *> types[] = {
+        {0x0001, "Strings"}, {0x0006, "Objects"}, {0x5000, "Binaries"}, {0x6000, "Sys Resource"},
+        {0x6001, "Granted Priviledges"}, {0x6002, "Required Priviledges"}, {0x6011, "Priviledge Data"},
+        {7, "Type: 7 (0x0007)"}, {4096, "Type: 4096 (0x1000)"}, {0xBEEF, "Type: 48879 (0xbeef)"}};
+    for (const auto &[type, name] : types)
+        EXPECT_EQ(resources.GetResourceTypeName(type), QLatin1String(name));
 
     // The seven formats, as the encoding converters name them.
     QList<QPair<unsigned int, QString>> formats;

@@ -186,26 +186,16 @@ TEST(ResourceStream, EmptyBlockBetweenTwoOthersKeepsItsOwnIndex)
     EXPECT_EQ(Save(loaded), bytes);
 }
 
-TEST(ResourceStream, MapRangeLoadsAsConsecutiveIds)
-{
-    const QByteArray file = Compose({{5, 10, 2, 0}}, {52, 53, 55, 58}, "ABBCCC", 3);
-    ResourceStream stream;
-    ASSERT_TRUE(stream.LoadFrom(file));
-    QVector<quint16> ids;
-    EXPECT_EQ(stream.GetResourceIDs(5, ids), 3u);
-    EXPECT_EQ(ids, (QVector<quint16>{10, 11, 12}));
-    EXPECT_EQ(stream.GetResource(5, 10), QByteArray("A"));
-    EXPECT_EQ(stream.GetResource(5, 11), QByteArray("BB"));
-    EXPECT_EQ(stream.GetResource(5, 12), QByteArray("CCC"));
-    EXPECT_EQ(stream.GetResourceHeader()->resourceCount, 3u);
-}
-
 TEST(ResourceStream, RichFileLoadsAndOverlappingRangesLetTheFirstEntryWin)
 {
     ResourceStream stream;
     ASSERT_TRUE(stream.LoadFrom(RichFile()));
     QVector<ResourceEntry> entries;
     ASSERT_EQ(stream.GetResources(entries), 6u);
+    EXPECT_EQ(stream.GetResourceHeader()->resourceCount, 5u);
+    QVector<quint16> ids;
+    EXPECT_EQ(stream.GetResourceIDs(5, ids), 4u);
+    EXPECT_EQ(ids, (QVector<quint16>{10, 11, 12, 20}));
     EXPECT_EQ(stream.GetResource(1, 6), QByteArray("abc"));
     EXPECT_TRUE(stream.GetResource(5, 10).isEmpty());
     EXPECT_EQ(stream.GetResource(5, 11), QByteArray("wxyz"));
