@@ -14,6 +14,8 @@
 
 #include <memory>
 
+using namespace Qt::StringLiterals;
+
 namespace {
 
 using controllertest::ReadResults;
@@ -28,15 +30,15 @@ class ShardedRunTest : public ::testing::Test
 {
 protected:
     ShardedRunTest()
-        : m_env("KESTIX_DATA_ROOT", m_dir.filePath(QStringLiteral("data"))),
-          m_kit(m_dir.path(), kCtfModules, kAppletModules, QStringLiteral("0.05"))
+        : m_env("KESTIX_DATA_ROOT", m_dir.filePath(u"data"_s))
+        , m_kit(m_dir.path(), kCtfModules, kAppletModules, u"0.05"_s)
     {
     }
 
     void SetUp() override
     {
         ASSERT_TRUE(m_dir.isValid());
-        ASSERT_TRUE(m_kit.Ok()) << m_kit.Errors().join(QLatin1Char('\n')).toStdString();
+        ASSERT_TRUE(m_kit.Ok()) << m_kit.Errors().join(u'\n').toStdString();
     }
 
     void TearDown() override
@@ -45,7 +47,7 @@ protected:
             harness->DisconnectTarget();
     }
 
-    QString LogRoot() const { return m_dir.filePath(QStringLiteral("logs")); }
+    QString LogRoot() const { return m_dir.filePath(u"logs"_s); }
 
     // One configured Harness per handset, added to run.
     void AddWorkers(ShardedRun &run, const QStringList &handsets)
@@ -63,7 +65,7 @@ protected:
         m_harnesses.push_back(std::make_unique<Harness>());
         m_kit.Configure(*m_harnesses.back(), QString(), LogRoot(), nullptr);
         QList<QSharedPointer<_TestModule>> modules;
-        m_harnesses.back()->GetTestModules(modules, {QStringLiteral("*")}, QString(), QString());
+        m_harnesses.back()->GetTestModules(modules, {u"*"_s}, QString(), QString());
         return modules;
     }
 
@@ -71,11 +73,10 @@ protected:
     // of the modules that ran there.
     QMap<QString, QString> Verdicts(const QString &handset, const QStringList &modules)
     {
-        const controllertest::ResultsView view = ReadResults(
-            TestDirectories::GetProcessResultsPath(handset));
+        const controllertest::ResultsView view = ReadResults(TestDirectories::GetProcessResultsPath(handset));
         QMap<QString, QString> verdicts;
         for (auto it = view.verdicts.cbegin(); it != view.verdicts.cend(); ++it) {
-            if (modules.contains(it.key().section(QLatin1Char('/'), 0, 0)))
+            if (modules.contains(it.key().section(u'/', 0, 0)))
                 verdicts.insert(it.key(), it.value());
         }
         return verdicts;
@@ -86,8 +87,8 @@ protected:
     {
         QMap<QString, QStringList> done;
         for (const QString &line : shardkit::ShardKit::Runs(m_handsets)) {
-            const QStringList words = line.split(QLatin1Char(' '));
-            if (words.size() == 3 && words.at(0) == QLatin1String("done"))
+            const QStringList words = line.split(u' ');
+            if (words.size() == 3 && words.at(0) == u"done"_s)
                 done[words.at(1)].append(words.at(2));
         }
         return done;
@@ -104,18 +105,18 @@ protected:
 TEST_F(ShardedRunTest, FourHandsetsShareTheQueueAndMatchAOneHandsetRun)
 {
     const QStringList handsets = shardkit::ShardKit::AddHandsets(m_handsets, 4);
-    shardkit::ShardKit::AddHandsets(m_handsets, 1, QStringLiteral("solo"));
+    shardkit::ShardKit::AddHandsets(m_handsets, 1, u"solo"_s);
     const QList<QSharedPointer<_TestModule>> selection = Selection();
     ASSERT_EQ(selection.size(), kCtfModules + kAppletModules);
 
     // The reference: the same selection on one handset through Run().
     Harness solo;
-    m_kit.Configure(solo, QStringLiteral("solo1"), LogRoot(), m_log.log());
+    m_kit.Configure(solo, u"solo1"_s, LogRoot(), m_log.log());
     for (const QSharedPointer<_TestModule> &module : selection)
         solo.AddTest(solo.FindTestModule(module->moduleName, module->Source()));
     ASSERT_TRUE(solo.Run()) << m_log.Text().toStdString();
     solo.DisconnectTarget();
-    const QMap<QString, QString> reference = Verdicts(QStringLiteral("solo1"), m_kit.ModuleNames());
+    const QMap<QString, QString> reference = Verdicts(u"solo1"_s, m_kit.ModuleNames());
     ASSERT_EQ(reference.size(), 2 * selection.size());
 
     ShardedRun run(m_log.log());
@@ -152,9 +153,9 @@ TEST_F(ShardedRunTest, FourHandsetsShareTheQueueAndMatchAOneHandsetRun)
         EXPECT_EQ(handset.modulesRun, byHandset.value(handset.handset).size());
         total += handset.modulesRun;
         // Everything the run put on the handset is gone again.
-        EXPECT_TRUE(QDir(m_handsets.HostPath(handset.handset, QStringLiteral("fs:/usermods")))
+        EXPECT_TRUE(QDir(m_handsets.HostPath(handset.handset, u"fs:/usermods"_s))
                         .entryList(QDir::Dirs | QDir::NoDotAndDotDot)
-                        .filter(QRegularExpression(QStringLiteral("^(ctf|ctfapplet|Ctf\\d+|App\\d+)$")))
+                        .filter(QRegularExpression(u"^(ctf|ctfapplet|Ctf\\d+|App\\d+)$"_s))
                         .isEmpty())
             << handset.handset.toStdString();
     }
@@ -176,7 +177,7 @@ TEST_F(ShardedRunTest, AHandsetGoingOfflineHandsItsModuleToTheOthers)
 {
     const QStringList handsets = shardkit::ShardKit::AddHandsets(m_handsets, 2);
     // h2 goes offline while running its second module.
-    WriteFile(m_handsets.HandsetFolder(QStringLiteral("h2")) + QStringLiteral("/drop-at"), "2\n");
+    WriteFile(m_handsets.HandsetFolder(u"h2"_s) + u"/drop-at"_s, "2\n");
     ShardedRun run(m_log.log());
     AddWorkers(run, handsets);
     const QList<QSharedPointer<_TestModule>> selection = Selection();
@@ -186,45 +187,45 @@ TEST_F(ShardedRunTest, AHandsetGoingOfflineHandsItsModuleToTheOthers)
     ASSERT_EQ(results.size(), 2);
     EXPECT_FALSE(results.at(0).lost);
     EXPECT_TRUE(results.at(1).lost);
-    EXPECT_EQ(results.at(1).handset, QStringLiteral("h2"));
+    EXPECT_EQ(results.at(1).handset, u"h2"_s);
     EXPECT_EQ(results.at(1).modulesRun, 1);
     EXPECT_TRUE(results.at(1).lostAt.isValid());
     // Dropped at once, not after the ten minutes a log may take.
     EXPECT_LT(results.at(1).lostAfterMs, 600000);
-    EXPECT_TRUE(m_log.Text().contains(QStringLiteral("Handset h2 dropped out at ")));
+    EXPECT_TRUE(m_log.Text().contains(u"Handset h2 dropped out at "_s));
 
     // The module h2 had in hand started there, ran to the end on h1, and
     // nothing ran to the end twice.
     QString interrupted;
     for (const QString &line : shardkit::ShardKit::Runs(m_handsets)) {
-        if (line.startsWith(QLatin1String("start ")) && line.endsWith(QLatin1String(" h2")))
-            interrupted = line.section(QLatin1Char(' '), 1, 1);
+        if (line.startsWith(u"start "_s) && line.endsWith(u" h2"_s))
+            interrupted = line.section(u' ', 1, 1);
     }
     ASSERT_FALSE(interrupted.isEmpty());
     const QMap<QString, QStringList> done = Completions();
     for (const QString &name : m_kit.ModuleNames())
         EXPECT_EQ(done.value(name).size(), 1) << name.toStdString();
-    EXPECT_EQ(done.value(interrupted), QStringList{QStringLiteral("h1")});
+    EXPECT_EQ(done.value(interrupted), QStringList{u"h1"_s});
     for (const ShardedRun::ModuleResult &module : run.Modules()) {
         EXPECT_EQ(module.outcome, ModuleSource::Recorded) << module.name.toStdString();
         EXPECT_EQ(module.attempts, module.name == interrupted ? 2 : 1) << module.name.toStdString();
     }
     // h2's results file holds only the module it completed.
-    const QMap<QString, QString> onH2 = Verdicts(QStringLiteral("h2"), m_kit.ModuleNames());
+    const QMap<QString, QString> onH2 = Verdicts(u"h2"_s, m_kit.ModuleNames());
     int executed = 0;
     for (const QString &verdict : onH2)
-        executed += verdict != QLatin1String("unexecuted");
+        executed += verdict != u"unexecuted"_s;
     EXPECT_EQ(executed, 2);
-    EXPECT_EQ(onH2.value(interrupted + QStringLiteral("/first")), QStringLiteral("unexecuted"));
+    EXPECT_EQ(onH2.value(interrupted + u"/first"_s), u"unexecuted"_s);
 }
 
 TEST_F(ShardedRunTest, WhenEveryHandsetIsGoneTheModulesLeftAreListed)
 {
     const QStringList handsets = shardkit::ShardKit::AddHandsets(m_handsets, 3);
-    WriteFile(m_handsets.HandsetFolder(QStringLiteral("h1")) + QStringLiteral("/drop-at"), "2\n");
-    WriteFile(m_handsets.HandsetFolder(QStringLiteral("h2")) + QStringLiteral("/drop-at"), "1\n");
+    WriteFile(m_handsets.HandsetFolder(u"h1"_s) + u"/drop-at"_s, "2\n");
+    WriteFile(m_handsets.HandsetFolder(u"h2"_s) + u"/drop-at"_s, "1\n");
     // h3 refuses the connection from the start.
-    WriteFile(m_handsets.HandsetFolder(QStringLiteral("h3")) + QStringLiteral("/offline"), "");
+    WriteFile(m_handsets.HandsetFolder(u"h3"_s) + u"/offline"_s, "");
     ShardedRun run(m_log.log());
     AddWorkers(run, handsets);
     EXPECT_FALSE(run.Run(Selection()));
@@ -240,17 +241,16 @@ TEST_F(ShardedRunTest, WhenEveryHandsetIsGoneTheModulesLeftAreListed)
     EXPECT_EQ(notRun.size(), kCtfModules + kAppletModules - 1);
     for (const ShardedRun::ModuleResult &module : run.Modules())
         EXPECT_EQ(module.ran, !notRun.contains(module.name)) << module.name.toStdString();
-    EXPECT_TRUE(m_log.Text().contains(
-        QStringLiteral("Every handset has dropped out; %1 modules never ran: ").arg(notRun.size())));
+    EXPECT_TRUE(m_log.Text().contains(u"Every handset has dropped out; %1 modules never ran: "_s.arg(notRun.size())));
 }
 
 TEST_F(ShardedRunTest, NothingToRunOrNoHandsetIsRefused)
 {
     ShardedRun run(m_log.log());
     EXPECT_FALSE(run.Run({}));
-    EXPECT_TRUE(m_log.Text().contains(QStringLiteral("No modules to run.")));
+    EXPECT_TRUE(m_log.Text().contains(u"No modules to run."_s));
     EXPECT_FALSE(run.Run(Selection()));
-    EXPECT_TRUE(m_log.Text().contains(QStringLiteral("No handsets to run on.\n")));
+    EXPECT_TRUE(m_log.Text().contains(u"No handsets to run on.\n"_s));
     EXPECT_EQ(run.NotRun().size(), kCtfModules + kAppletModules);
 }
 

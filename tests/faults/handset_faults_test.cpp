@@ -33,14 +33,12 @@ using testutil::WriteFile;
 
 // A CTF module's behaviour: the shared CTF log with two verdicts, ended by
 // the end marker unless told otherwise.
-QByteArray CtfBehaviour(const QString &suite, const QString &passing, const QString &failing,
-                        bool ends = true)
+QByteArray CtfBehaviour(const QString &suite, const QString &passing, const QString &failing, bool ends = true)
 {
     return u"mkdir -p usermods/CTF\n"
-                          "printf 'Suite: %1\\nTest: %2\\nResult: Pass\\nTest: %3\\nResult: Fail\\n%4' "
-                          "> usermods/CTF/CTF.log\n"_s
-        .arg(suite, passing, failing, ends ? u"[/VERBOSE]\\n"_s : QString())
-        .toUtf8();
+           "printf 'Suite: %1\\nTest: %2\\nResult: Pass\\nTest: %3\\nResult: Fail\\n%4' "
+           "> usermods/CTF/CTF.log\n"_s.arg(suite, passing, failing, ends ? u"[/VERBOSE]\\n"_s : QString())
+               .toUtf8();
 }
 
 kitbuilder::Module CtfModule(const QString &name, unsigned int classId, const QStringList &cases)
@@ -62,8 +60,8 @@ class HandsetFaultTest : public ::testing::Test
 {
 protected:
     HandsetFaultTest()
-        : m_env("KESTIX_DATA_ROOT", m_dir.filePath(u"data"_s)),
-          m_kit(m_dir.filePath(u"kit"_s))
+        : m_env("KESTIX_DATA_ROOT", m_dir.filePath(u"data"_s))
+        , m_kit(m_dir.filePath(u"kit"_s))
     {
     }
 
@@ -73,7 +71,7 @@ protected:
         m_kit.AddFrameworkPackage(u"testframeworks"_s, u"ctf"_s, u"Win32"_s, u"Debug"_s);
         AddModule(CtfModule(u"Audio"_s, 0x01230001, {u"play"_s, u"record"_s}));
         AddModule(CtfModule(u"Video"_s, 0x01230002, {u"show"_s, u"seek"_s}));
-        ASSERT_TRUE(m_kit.Ok()) << m_kit.Errors().join(QLatin1Char('\n')).toStdString();
+        ASSERT_TRUE(m_kit.Ok()) << m_kit.Errors().join(u'\n').toStdString();
         m_handsets.AddHandset(u"phone"_s, u"Emulated phone"_s, u"win32"_s);
     }
 
@@ -138,11 +136,10 @@ protected:
     CapturedLog m_log;
 };
 
-const QMap<QString, QString> kAllRecorded{
-    {u"Audio/play"_s, u"pass"_s},
-    {u"Audio/record"_s, u"fail"_s},
-    {u"Video/show"_s, u"pass"_s},
-    {u"Video/seek"_s, u"fail"_s}};
+const QMap<QString, QString> kAllRecorded{{u"Audio/play"_s, u"pass"_s},
+                                          {u"Audio/record"_s, u"fail"_s},
+                                          {u"Video/show"_s, u"pass"_s},
+                                          {u"Video/seek"_s, u"fail"_s}};
 
 // The step of a module's run at which the handset was lost, told from the
 // messages of one run; empty when it was not lost.
@@ -204,9 +201,7 @@ TEST_F(HandsetFaultTest, HandsetLostAtAnyStepEndsTheRunAndKeepsRecordedVerdicts)
     }
     EXPECT_TRUE(completed);
     SetHandsetKey(u"offlineAfter"_s, QVariant());
-    EXPECT_EQ(steps, (std::set<QString>{u"install"_s, u"start"_s,
-                                        u"log wait"_s, u"copy"_s,
-                                        u"remove"_s, u"unload"_s}));
+    EXPECT_EQ(steps, (std::set<QString>{u"install"_s, u"start"_s, u"log wait"_s, u"copy"_s, u"remove"_s, u"unload"_s}));
 }
 
 class NeverEndingLogTest : public HandsetFaultTest
@@ -245,13 +240,12 @@ protected:
         kitbuilder::Module chatty = CtfModule(u"Chatty"_s, 0x01230004, {u"early"_s, u"late"_s});
         // About 24 MB: a verdict, half a million lines of chatter, one line
         // of 4 MB without a break, then the last verdict and the end marker.
-        chatty.package.behaviour =
-            "mkdir -p usermods/CTF\n"
-            "{ printf 'Suite: Chatty\\nTest: early\\nResult: Pass\\n'\n"
-            "  yes 'chatter from a test that tells everything it does' | head -n 400000\n"
-            "  head -c 4000000 /dev/zero | tr '\\0' 'x'\n"
-            "  printf '\\nTest: late\\nResult: Fail\\n[/VERBOSE]\\n'\n"
-            "} > usermods/CTF/CTF.log\n";
+        chatty.package.behaviour = "mkdir -p usermods/CTF\n"
+                                   "{ printf 'Suite: Chatty\\nTest: early\\nResult: Pass\\n'\n"
+                                   "  yes 'chatter from a test that tells everything it does' | head -n 400000\n"
+                                   "  head -c 4000000 /dev/zero | tr '\\0' 'x'\n"
+                                   "  printf '\\nTest: late\\nResult: Fail\\n[/VERBOSE]\\n'\n"
+                                   "} > usermods/CTF/CTF.log\n";
         AddModule(chatty);
         ASSERT_TRUE(m_kit.Ok());
     }
@@ -286,7 +280,7 @@ TEST_P(CorruptMifTest, ModuleFailsToStartAndTheRunGoesOn)
     // The package, written again with the damaged file in place.
     testutil::Members members = testutil::ModuleMembers(broken.package);
     for (auto &member : members) {
-        if (member.first.endsWith(QLatin1String(".mif")))
+        if (member.first.endsWith(u".mif"_s))
             member.second = mif;
     }
     m_kit.AddPackage(folder + u"/package"_s, u"Broken_Win32_Debug"_s, members);

@@ -34,7 +34,7 @@ using moduletest::Target;
 // The lines of a host file, without line ends.
 QStringList Lines(const QString &path)
 {
-    return QString::fromUtf8(testutil::ReadFile(path)).split(QLatin1Char('\n'));
+    return QString::fromUtf8(testutil::ReadFile(path)).split(u'\n');
 }
 
 class EndToEnd : public ::testing::Test
@@ -70,7 +70,7 @@ protected:
     void ExpectHeaderBefore(const QStringList &lines, const QString &anchor, _TestModule &module)
     {
         const qsizetype at = lines.indexOf(anchor);
-        ASSERT_GE(at, 3) << lines.join(QLatin1Char('\n')).toStdString();
+        ASSERT_GE(at, 3) << lines.join(u'\n').toStdString();
         EXPECT_EQ(lines.at(at - 3), u"GUID:"_s + env.value(u"TestRunID"_s));
         EXPECT_EQ(lines.at(at - 2), u"Manifest Name:"_s + module.moduleName);
         EXPECT_EQ(lines.at(at - 1), u"ID Hash:"_s + module.IDHash());
@@ -93,10 +93,10 @@ TEST_F(EndToEnd, CtfModuleRunsItsProgramAndLeavesNothingBehind)
     layout.directory = u"ITimer"_s;
     layout.programs = {{u"Helper"_s, QString(), 0x0102FAF7}, {u"ITimer_k_main"_s, u"-suite all"_s, 0x0102FAF7}};
     layout.behaviour = "log=usermods/CTF/CTF.log\n"
-                     "[ -f \"$log\" ] || exit 3\n"
-                     "{ echo \"Suite: ITimer\"; echo \"Args: $3 $4\"; echo \"Time: 2026/12/03 14:05:09\";\n"
-                     "  echo \"Test: t1\"; echo \"Result: PASS\"; echo \"Result: Fail\"; echo \"Test: t2\";\n"
-                     "  echo \"[/VERBOSE]\"; } >> \"$log\"\n";
+                       "[ -f \"$log\" ] || exit 3\n"
+                       "{ echo \"Suite: ITimer\"; echo \"Args: $3 $4\"; echo \"Time: 2026/12/03 14:05:09\";\n"
+                       "  echo \"Test: t1\"; echo \"Result: PASS\"; echo \"Result: Fail\"; echo \"Test: t2\";\n"
+                       "  echo \"[/VERBOSE]\"; } >> \"$log\"\n";
     const QString package = fixture.MakePackage(u"ITimer_Win32_Release.kestix"_s, layout);
 
     CtfTestModule module;
@@ -144,9 +144,9 @@ TEST_F(EndToEnd, CtfAppletModuleRunsByClassId)
     layout.directory = u"suite"_s;
     layout.appletIds = {0x10001000};
     layout.behaviour = "[ \"$1 $2\" = \"applet 0x10001000\" ] || exit 4\n"
-                     "{ echo \"Suite: Suite_k\"; echo \"Test: t1 with words\"; echo \"Result: Pass\";\n"
-                     "  echo \"[/VERBOSE]\"; } > usermods/suite/suite_k.log\n"
-                     "echo notes > usermods/suite/notes.txt\n";
+                       "{ echo \"Suite: Suite_k\"; echo \"Test: t1 with words\"; echo \"Result: Pass\";\n"
+                       "  echo \"[/VERBOSE]\"; } > usermods/suite/suite_k.log\n"
+                       "echo notes > usermods/suite/notes.txt\n";
     const QString package = fixture.MakePackage(u"Suite_Win32_Release.kestix"_s, layout);
 
     CtfAppletTestModule module;
@@ -157,7 +157,8 @@ TEST_F(EndToEnd, CtfAppletModuleRunsByClassId)
     RunModule(module);
 
     ASSERT_EQ(module.desktopLogFiles.size(), 1);
-    EXPECT_TRUE(QFileInfo(module.desktopLogFiles[0]).fileName().contains(QRegularExpression(u"^suite"_s + kStamp + u"log$"_s)));
+    EXPECT_TRUE(
+        QFileInfo(module.desktopLogFiles[0]).fileName().contains(QRegularExpression(u"^suite"_s + kStamp + u"log$"_s)));
     ExpectHeaderBefore(Lines(module.desktopLogFiles[0]), u"Test: t1 with words"_s, module);
     TestResults results;
     ASSERT_TRUE(module.ParseLog(results));
@@ -258,12 +259,13 @@ TEST_F(EndToEnd, UtModuleReadsItsConfigurationAndWritesBothLogs)
     testutil::ModuleSpec layout;
     layout.directory = u"uttimer"_s;
     layout.appletIds = {0x20002000};
-    layout.behaviour = "allow=$(sed -n 's/^Allow=//p' mod/ututtimer/utconfig.dat)\n"
-                     "mkdir -p usermods/uttimer/log\n"
-                     "{ echo \"Unit test run\"; echo \"SuiteName: UTTimer 14:05:09 03-Dec-2026\";\n"
-                     "  echo \"------------\"; for t in $(echo $allow | tr , ' '); do echo \"$t PASSED 12 ms\"; done;\n"
-                     "  echo \"t9 Failed\"; echo \"------------\"; echo \"Elapsed Time: 1s\"; } > usermods/uttimer/log/run.txt\n"
-                     "echo '<TestRunLog cases=\"'$allow'\"></TestRunLog>' > usermods/uttimer/log/run.xml\n";
+    layout.behaviour
+        = "allow=$(sed -n 's/^Allow=//p' mod/ututtimer/utconfig.dat)\n"
+          "mkdir -p usermods/uttimer/log\n"
+          "{ echo \"Unit test run\"; echo \"SuiteName: UTTimer 14:05:09 03-Dec-2026\";\n"
+          "  echo \"------------\"; for t in $(echo $allow | tr , ' '); do echo \"$t PASSED 12 ms\"; done;\n"
+          "  echo \"t9 Failed\"; echo \"------------\"; echo \"Elapsed Time: 1s\"; } > usermods/uttimer/log/run.txt\n"
+          "echo '<TestRunLog cases=\"'$allow'\"></TestRunLog>' > usermods/uttimer/log/run.xml\n";
     const QString package = fixture.MakePackage(u"UTTimer_Win32_Release.kestix"_s, layout);
     const QString source = fixture.WorkFolder() + u"/src"_s;
     testutil::WriteFile(source + u"/utconfig.dat"_s, "[Defaults]\nLevel=2");
@@ -277,10 +279,12 @@ TEST_F(EndToEnd, UtModuleReadsItsConfigurationAndWritesBothLogs)
     const auto scratch = [] { return QDir::temp().entryList({u"test_*.dat"_s}, QDir::Files); };
     const QStringList before = scratch();
     RunModule(module);
-    EXPECT_EQ(scratch(), before);  // the configuration's way to the handset leaves nothing behind
+    EXPECT_EQ(scratch(), before); // the configuration's way to the handset leaves nothing behind
 
-    EXPECT_EQ(testutil::ReadFile(fixture.HostPath(u"phone"_s, u"fs:/mod/ututtimer/utconfig.dat"_s)),
-              QByteArray("[Defaults]\nLevel=2\n[TestFramework]\nSkipIfNoGolden=1\nLogSkippedGoldens=0\nSkipKnown=1\nAllow=t1,t2\n"));
+    EXPECT_EQ(
+        testutil::ReadFile(fixture.HostPath(u"phone"_s, u"fs:/mod/ututtimer/utconfig.dat"_s)),
+        QByteArray(
+            "[Defaults]\nLevel=2\n[TestFramework]\nSkipIfNoGolden=1\nLogSkippedGoldens=0\nSkipKnown=1\nAllow=t1,t2\n"));
     ASSERT_EQ(module.desktopLogFiles.size(), 2);
     const QString text = module.desktopLogFiles.filter(QRegularExpression(u"\\.txt$"_s)).value(0);
     const QString xml = module.desktopLogFiles.filter(QRegularExpression(u"\\.xml$"_s)).value(0);

@@ -4,6 +4,8 @@
 
 #include <QDir>
 
+using namespace Qt::StringLiterals;
+
 namespace shardkit {
 namespace {
 
@@ -30,43 +32,39 @@ constexpr unsigned int kFirstClassId = 0x01500000;
 } // namespace
 
 ShardKit::ShardKit(const QString &root, int ctfModules, int appletModules, const QString &seconds)
-    : m_kit(root + QStringLiteral("/kit"))
+    : m_kit(root + u"/kit"_s)
 {
-    const QStringList verdicts{QStringLiteral("Pass"), QStringLiteral("Fail"),
-                               QStringLiteral("Unsupported")};
+    const QStringList verdicts{u"Pass"_s, u"Fail"_s, u"Unsupported"_s};
     for (int i = 0; i < ctfModules + appletModules; ++i) {
         const bool applet = i >= ctfModules;
-        const QString name = (applet ? QStringLiteral("App%1") : QStringLiteral("Ctf%1"))
-                                 .arg(applet ? i - ctfModules : i, 2, 10, QLatin1Char('0'));
+        const QString name = (applet ? u"App%1"_s : u"Ctf%1"_s).arg(applet ? i - ctfModules : i, 2, 10, u'0');
         const QString log = QStringLiteral("Suite: %1\nTest: first\nResult: Pass\nTest: second\n"
                                            "Result: %2\n[/VERBOSE]\n")
                                 .arg(name, verdicts.at(i % 3));
-        const QString write =
-            applet ? QStringLiteral("printf '%1' > \"$HANDSET_MODULE_DIR/%2_k.log\"")
-                         .arg(QString(log).replace(QLatin1Char('\n'), QStringLiteral("\\n")), name.toLower())
-                   : QStringLiteral("mkdir -p usermods/CTF\nprintf '%1' > usermods/CTF/CTF.log")
-                         .arg(QString(log).replace(QLatin1Char('\n'), QStringLiteral("\\n")));
+        const QString write = applet
+            ? u"printf '%1' > \"$HANDSET_MODULE_DIR/%2_k.log\""_s.arg(QString(log).replace(u'\n', u"\\n"_s),
+                                                                      name.toLower())
+            : u"mkdir -p usermods/CTF\nprintf '%1' > usermods/CTF/CTF.log"_s.arg(QString(log).replace(u'\n', u"\\n"_s));
 
         kitbuilder::Module module;
-        module.kind = applet ? QStringLiteral("ctfapplet") : QStringLiteral("ctf");
+        module.kind = applet ? u"ctfapplet"_s : u"ctf"_s;
         module.name = name;
-        module.family = QStringLiteral("shard");
-        module.testCases = {QStringLiteral("first"), QStringLiteral("second")};
-        module.variants = {QStringLiteral("Win32_Debug")};
+        module.family = u"shard"_s;
+        module.testCases = {u"first"_s, u"second"_s};
+        module.variants = {u"Win32_Debug"_s};
         module.package.directory = name;
         if (applet)
             module.package.appletIds = {kFirstClassId + unsigned(i)};
         else
             module.package.classIds = {kFirstClassId + unsigned(i)};
         if (!applet)
-            module.package.programs = {{name + QStringLiteral("_k"), QStringLiteral("-v")}};
+            module.package.programs = {{name + u"_k"_s, u"-v"_s}};
         module.package.behaviour = QString::fromLatin1(kBehaviour).arg(name, seconds, write).toLatin1();
-        m_kit.AddSourceModule(QStringLiteral("tests/") + name.toLower(), module);
+        m_kit.AddSourceModule(u"tests/"_s + name.toLower(), module);
         m_names.append(name);
     }
     for (const char *framework : {"ctf", "ctfapplet"})
-        m_kit.AddFrameworkPackage(QStringLiteral("testframeworks"), QString::fromLatin1(framework),
-                                  QStringLiteral("Win32"), QStringLiteral("Debug"));
+        m_kit.AddFrameworkPackage(u"testframeworks"_s, QString::fromLatin1(framework), u"Win32"_s, u"Debug"_s);
 }
 
 QStringList ShardKit::AddHandsets(testutil::HandsetFixture &fixture, int count, const QString &prefix)
@@ -74,7 +72,7 @@ QStringList ShardKit::AddHandsets(testutil::HandsetFixture &fixture, int count, 
     QStringList names;
     for (int i = 1; i <= count; ++i) {
         names.append(prefix + QString::number(i));
-        fixture.AddHandset(names.last(), QStringLiteral("Emulated ") + names.last(), QStringLiteral("win32"));
+        fixture.AddHandset(names.last(), u"Emulated "_s + names.last(), u"win32"_s);
     }
     return names;
 }
@@ -84,15 +82,15 @@ void ShardKit::Configure(Harness &harness, const QString &handset, const QString
     harness.SetLogger(log);
     harness.SetTestkit(KitPath());
     harness.SetTarget(handset);
-    const QString logs = logRoot + QLatin1Char('/') + handset;
+    const QString logs = logRoot + u'/' + handset;
     QDir().mkpath(logs);
     harness.SetLogOutputPath(logs);
 }
 
 QStringList ShardKit::Runs(const testutil::HandsetFixture &fixture)
 {
-    return QString::fromLatin1(testutil::ReadFile(fixture.HandsetsFolder() + QStringLiteral("/runs.txt")))
-        .split(QLatin1Char('\n'), Qt::SkipEmptyParts);
+    return QString::fromLatin1(testutil::ReadFile(fixture.HandsetsFolder() + u"/runs.txt"_s))
+        .split(u'\n', Qt::SkipEmptyParts);
 }
 
 } // namespace shardkit

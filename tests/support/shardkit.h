@@ -15,6 +15,8 @@
 #include <QString>
 #include <QStringList>
 
+using namespace Qt::StringLiterals;
+
 class Harness;
 class Log;
 
@@ -37,8 +39,7 @@ public:
 
     // Adds handsets "<prefix>1" ... "<prefix>count" (win32) to the fixture;
     // returns their names.
-    static QStringList AddHandsets(testutil::HandsetFixture &fixture, int count,
-                                   const QString &prefix = QStringLiteral("h"));
+    static QStringList AddHandsets(testutil::HandsetFixture &fixture, int count, const QString &prefix = u"h"_s);
 
     // Sets up harness for this kit and handset, with logs in
     // logRoot/<handset> and the given logger.
