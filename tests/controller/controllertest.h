@@ -116,37 +116,7 @@ inline QSharedPointer<Manifest> MakeCatalogue(const QString &path, bool isPlatfo
     return catalogue;
 }
 
-// The verdicts of a results file: "module/testcase" -> result, plus the
-// order of test case names per module.
-struct ResultsView
-{
-    bool ok = false;
-    QDomElement root;
-    QMap<QString, QString> verdicts;
-    QMap<QString, QStringList> caseOrder;
-    QMap<QString, QDomElement> modules;
-};
-
-inline ResultsView ReadResults(const QString &path)
-{
-    ResultsView view;
-    QDomDocument document;
-    if (!document.setContent(testutil::ReadFile(path)))
-        return view;
-    view.ok = true;
-    view.root = document.documentElement();
-    for (QDomElement module = view.root.firstChildElement(u"module"_s); !module.isNull();
-         module = module.nextSiblingElement(u"module"_s)) {
-        const QString name = module.attribute(u"name"_s);
-        view.modules.insert(name, module);
-        for (QDomElement testCase = module.firstChildElement(u"testcase"_s); !testCase.isNull();
-             testCase = testCase.nextSiblingElement(u"testcase"_s)) {
-            const QString caseName = testCase.attribute(u"name"_s);
-            view.verdicts.insert(name + u'/' + caseName, testCase.attribute(u"result"_s));
-            view.caseOrder[name].append(caseName);
-        }
-    }
-    return view;
-}
+using testutil::ReadResults;
+using testutil::ResultsView;
 
 } // namespace controllertest

@@ -7,7 +7,7 @@
 #include "controller/harness.h"
 #include "log/log.h"
 
-#include "support/testutil.h"
+#include "support/kitrun.h"
 
 #include <QDir>
 #include <QFile>
@@ -34,18 +34,7 @@ public:
 
 namespace harnesstest {
 
-// A log file of its own in a temporary folder.
-class CapturedLog
-{
-public:
-    CapturedLog() { m_log.SetLogPath(m_dir.filePath(u"log.txt"_s)); }
-    Log *log() { return &m_log; }
-    QString Text() const { return QString::fromLatin1(testutil::ReadFile(m_dir.filePath(u"log.txt"_s))); }
-
-private:
-    QTemporaryDir m_dir;
-    Log m_log;
-};
+using testutil::CapturedLog;
 
 // A temporary toolset named by KESTIX_TOOLSET, whose resource compilers are
 // shell scripts. Every call of a stand-in appends its arguments, one per

@@ -5,13 +5,8 @@
 #include "controller/moduletimings.h"
 #include "controller/resultsmerge.h"
 #include "controller/shardplan.h"
-#include "environment/testdirectories.h"
-#include "support/handsetfixture.h"
-#include "support/shardkit.h"
 
 #include <QTimeZone>
-
-#include <memory>
 
 using namespace Qt::StringLiterals;
 
@@ -100,46 +95,33 @@ TEST(ResultsMergeTest, RefusesFilesItCannotMergeAndKeepsWhatItHas)
 // the merge gives the same verdicts, and shard 2's modules as not run.
 TEST(ResultsMergeTest, MergedShardsEqualOneRunOfTheSelection)
 {
-    QTemporaryDir dir;
-    testutil::EnvGuard env("KESTIX_DATA_ROOT", dir.filePath(u"data"_s));
-    testutil::HandsetFixture handsets;
-    const shardkit::ShardKit kit(dir.path(), 8, 2, u"0"_s);
-    ASSERT_TRUE(kit.Ok()) << kit.Errors().join(u'\n').toStdString();
-    const QStringList names = shardkit::ShardKit::AddHandsets(handsets, 3);
-    harnesstest::CapturedLog log;
-
-    Harness selector;
-    kit.Configure(selector, QString(), dir.filePath(u"logs"_s), nullptr);
-    QList<QSharedPointer<_TestModule>> selection;
-    selector.GetTestModules(selection, {u"*"_s}, QString(), QString());
+    testutil::KitRun run;
+    testutil::AddShardModules(run.Kit(), 8, 2, u"0"_s);
+    ASSERT_TRUE(run.KitOk());
+    const QStringList names = run.AddHandsets(3);
+    const QList<QSharedPointer<_TestModule>> selection = run.Select();
     QList<ShardPlan::Module> planned;
-    for (const QSharedPointer<_TestModule> &module : std::as_const(selection))
+    for (const QSharedPointer<_TestModule> &module : selection)
         planned.append({module->moduleName, module->Source(), int(module->testCases.size()), -1});
     const QList<ResultsMerge::Expected> expected = ResultsMerge::ExpectedOf(selection);
     const ShardPlan plan = ShardPlan::Make(planned, 3);
 
     // Handset i runs shard i (0, 1); the last handset runs everything.
     for (int i = 0; i < 3; ++i) {
-        Harness harness;
-        kit.Configure(harness, names.at(i), dir.filePath(u"logs"_s), log.log());
-        for (const QSharedPointer<_TestModule> &module : std::as_const(selection)) {
-            const auto entry
-                = std::find_if(plan.Modules().cbegin(), plan.Modules().cend(), [&](const ShardPlan::Entry &e) {
-                      return e.name == module->moduleName && e.source == module->Source();
-                  });
-            if (i == 2 || entry->shard == i)
-                harness.AddTest(harness.FindTestModule(module->moduleName, module->Source()));
+        QStringList shard;
+        for (const ShardPlan::Entry &entry : plan.Modules()) {
+            if (i == 2 || entry.shard == i)
+                shard.append(entry.name);
         }
-        ASSERT_TRUE(harness.Run()) << log.Text().toStdString();
-        harness.DisconnectTarget();
+        ASSERT_TRUE(run.RunModules(run.NewHarness(names.at(i)), shard)) << run.LogText().toStdString();
     }
 
     ResultsMerge shards;
-    ASSERT_TRUE(shards.Add(TestDirectories::GetProcessResultsPath(names.at(0))));
-    ASSERT_TRUE(shards.Add(TestDirectories::GetProcessResultsPath(names.at(1))));
+    ASSERT_TRUE(shards.Add(run.ResultsPath(names.at(0))));
+    ASSERT_TRUE(shards.Add(run.ResultsPath(names.at(1))));
     shards.Expect(expected);
     ResultsMerge whole;
-    ASSERT_TRUE(whole.Add(TestDirectories::GetProcessResultsPath(names.at(2))));
+    ASSERT_TRUE(whole.Add(run.ResultsPath(names.at(2))));
     whole.Expect(expected);
 
     const QList<ResultsMerge::Row> merged = shards.Rows();
