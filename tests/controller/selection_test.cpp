@@ -59,24 +59,36 @@ protected:
     QSharedPointer<Manifest> m_platform;
 };
 
-TEST_F(FeatureListTest, FeatureWithoutTestModuleAttributeSelectsNothing)
+TEST_F(FeatureListTest, FeaturesSelectTheirModulesAndUnknownNamesAreWarnedOneByOne)
 {
-    Modules modules{QSharedPointer<_TestModule>(new ScriptedModule(u"stale"_s))};
-    const QString path = Features("<features><feature testModule=\"Bar\"/>"
-                                  "<feature name=\"no module\"/></features>");
-    EXPECT_EQ(m_harness.GetTestModules(modules, path), 1u);
-    EXPECT_EQ(Names(modules), QStringList{u"Bar"_s});
-    EXPECT_FALSE(m_log.Text().contains(u"Warning"_s));
-}
-
-TEST_F(FeatureListTest, NamesMatchInAnyLetterCaseAtAnyDepth)
-{
-    const QString path = Features("<root><group><sub><feature testModule=\"foo\"/></sub></group>"
-                                  "<Feature testModule=\"SHELL\"/></root>");
-    Modules modules;
-    EXPECT_EQ(m_harness.GetTestModules(modules, path), 2u);
-    EXPECT_EQ(Names(modules), (QStringList{u"Foo"_s, u"Shell"_s}));
-    EXPECT_FALSE(m_log.Text().contains(u"Warning"_s));
+    const struct
+    {
+        const char *xml;
+        QStringList selected;
+        QStringList warned;
+    } rows[] = {
+        {"<features><feature testModule=\"Bar\"/><feature name=\"no module\"/></features>", {u"Bar"_s}, {}},
+        // Any letter case, any depth.
+        {"<root><group><sub><feature testModule=\"foo\"/></sub></group><Feature testModule=\"SHELL\"/></root>",
+         {u"Foo"_s, u"Shell"_s},
+         {}},
+        // A secondary module is never selected, and a pattern is not a module name.
+        {"<f><feature testModule=\"Ghost\"/><feature testModule=\"Bar\"/>"
+         "<feature testModule=\"Lib\"/><feature testModule=\"Fo*\"/></f>",
+         {u"Bar"_s, u"Foo"_s, u"FooPlus"_s},
+         {u"Ghost"_s, u"Lib"_s, u"Fo*"_s}},
+    };
+    for (const auto &row : rows) {
+        SCOPED_TRACE(row.xml);
+        const qsizetype logged = m_log.Text().size();
+        Modules modules{QSharedPointer<_TestModule>(new ScriptedModule(u"stale"_s))};
+        EXPECT_EQ(m_harness.GetTestModules(modules, Features(row.xml)), uint(row.selected.size()));
+        EXPECT_EQ(Names(modules), row.selected);
+        QString expected;
+        for (const QString &name : row.warned)
+            expected += u"   Warning: Testmodule \"%1\" not found in test manifests."_s.arg(name);
+        EXPECT_EQ(m_log.Text().mid(logged), expected);
+    }
 }
 
 TEST_F(FeatureListTest, DeeplyNestedFeatureIsFoundAndRootFeatureCounts)
@@ -92,21 +104,6 @@ TEST_F(FeatureListTest, DeeplyNestedFeatureIsFoundAndRootFeatureCounts)
     Modules modules;
     EXPECT_EQ(m_harness.GetTestModules(modules, Features(xml)), 3u);
     EXPECT_EQ(Names(modules), (QStringList{u"Bar"_s, u"Foo"_s, u"Shell"_s}));
-}
-
-TEST_F(FeatureListTest, UnknownNamesAreWarnedOneByOne)
-{
-    const QString path = Features("<f><feature testModule=\"Ghost\"/><feature testModule=\"Bar\"/>"
-                                  "<feature testModule=\"Lib\"/><feature testModule=\"Fo*\"/></f>");
-    Modules modules;
-    EXPECT_EQ(m_harness.GetTestModules(modules, path), 3u);
-    EXPECT_EQ(Names(modules), (QStringList{u"Bar"_s, u"Foo"_s, u"FooPlus"_s}));
-    const QString log = m_log.Text();
-    EXPECT_TRUE(log.contains(u"   Warning: Testmodule \"Ghost\" not found in test manifests."_s));
-    // A secondary module is never selected, and a pattern is not a module name.
-    EXPECT_TRUE(log.contains(u"   Warning: Testmodule \"Lib\" not found in test manifests."_s));
-    EXPECT_TRUE(log.contains(u"   Warning: Testmodule \"Fo*\" not found in test manifests."_s));
-    EXPECT_FALSE(log.contains(u"\"Bar\""_s));
 }
 
 TEST_F(FeatureListTest, PlatformOnlySelectionDrawsOnThePlatformCatalogue)
