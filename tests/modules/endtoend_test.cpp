@@ -66,24 +66,12 @@ protected:
         module.PostProcess(env);
     }
 
-    // The header lines stamped before the anchor at index anchor.
-    void ExpectHeaderBefore(const QStringList &lines, const QString &anchor, _TestModule &module)
-    {
-        const qsizetype at = lines.indexOf(anchor);
-        ASSERT_GE(at, 3) << lines.join(u'\n').toStdString();
-        EXPECT_EQ(lines.at(at - 3), u"GUID:"_s + env.value(u"TestRunID"_s));
-        EXPECT_EQ(lines.at(at - 2), u"Manifest Name:"_s + module.moduleName);
-        EXPECT_EQ(lines.at(at - 1), u"ID Hash:"_s + module.IDHash());
-    }
-
     testutil::HandsetFixture fixture;
     testutil::HandsetFixture::Device device;
     QString logs;
     Log log;
     QMap<QString, QString> env;
 };
-
-const QString kStamp = u"-\\d{4}-\\d\\d-\\d\\d-\\d\\d-\\d\\d-\\d\\d\\."_s;
 
 } // namespace
 
@@ -115,12 +103,9 @@ TEST_F(EndToEnd, CtfModuleRunsItsProgramAndLeavesNothingBehind)
     RunModule(module);
 
     ASSERT_EQ(module.desktopLogFiles.size(), 1);
-    const QString copied = module.desktopLogFiles.first();
-    EXPECT_TRUE(QFileInfo(copied).fileName().contains(QRegularExpression(u"^ITimer-CTF"_s + kStamp + u"log$"_s)));
-    const QStringList lines = Lines(copied);
+    const QStringList lines = Lines(module.desktopLogFiles.first());
     EXPECT_EQ(lines.first(), u"Suite: ITimer"_s);
     EXPECT_TRUE(lines.contains(u"Args: -suite all"_s));
-    ExpectHeaderBefore(lines, u"Test: t1"_s, module);
 
     TestResults results;
     ASSERT_TRUE(module.ParseLog(results));
@@ -157,9 +142,6 @@ TEST_F(EndToEnd, CtfAppletModuleRunsByClassId)
     RunModule(module);
 
     ASSERT_EQ(module.desktopLogFiles.size(), 1);
-    EXPECT_TRUE(
-        QFileInfo(module.desktopLogFiles[0]).fileName().contains(QRegularExpression(u"^suite"_s + kStamp + u"log$"_s)));
-    ExpectHeaderBefore(Lines(module.desktopLogFiles[0]), u"Test: t1 with words"_s, module);
     TestResults results;
     ASSERT_TRUE(module.ParseLog(results));
     EXPECT_EQ(results.manifestName, u"Suite"_s);
@@ -228,11 +210,9 @@ TEST_F(EndToEnd, OatModuleRunsInTheFrameworkAndIsPostProcessed)
     EXPECT_EQ(env.value(u"OatRawLogPath"_s), logs + u"/oatRawLogs"_s);
     ASSERT_EQ(module.desktopLogFiles.size(), 1);
     const QString raw = module.desktopLogFiles.first();
-    EXPECT_TRUE(QFileInfo(raw).fileName().contains(QRegularExpression(u"^timer_u"_s + kStamp + u"oat$"_s)));
     module.RemoveTest(device.get());
     module.PostProcess(env);
 
-    ExpectHeaderBefore(Lines(raw), u"ModuleVer: 1.0"_s, module);
     EXPECT_TRUE(Lines(raw).contains(u"Args: -dk -rs OatSuite1,t1,t3"_s));
     ASSERT_EQ(module.desktopLogFiles.size(), 1);
     EXPECT_EQ(QFileInfo(module.desktopLogFiles[0]).absolutePath(), logs);
@@ -289,9 +269,7 @@ TEST_F(EndToEnd, UtModuleReadsItsConfigurationAndWritesBothLogs)
     const QString text = module.desktopLogFiles.filter(QRegularExpression(u"\\.txt$"_s)).value(0);
     const QString xml = module.desktopLogFiles.filter(QRegularExpression(u"\\.xml$"_s)).value(0);
     ASSERT_FALSE(text.isEmpty() || xml.isEmpty());
-    const QStringList lines = Lines(text);
-    EXPECT_EQ(lines.at(0), u"Unit test run"_s);
-    ExpectHeaderBefore(lines, u"SuiteName: UTTimer 14:05:09 03-Dec-2026"_s, module);
+    EXPECT_EQ(Lines(text).at(0), u"Unit test run"_s);
 
     QDomDocument document;
     ASSERT_TRUE(document.setContent(testutil::ReadFile(xml)));
