@@ -5,15 +5,13 @@
 
 #include "moduletest.h"
 
-#include "log/log.h"
 #include "modules/ctfapplettestmodule.h"
 #include "modules/ctftestmodule.h"
 #include "modules/oatframework.h"
 #include "modules/oattestmodule.h"
 #include "modules/secondarymodule.h"
 #include "modules/uttestmodule.h"
-#include "support/handsetfixture.h"
-#include "support/testutil.h"
+#include "support/kitrun.h"
 
 #include <QDir>
 #include <QDomDocument>
@@ -42,12 +40,10 @@ class EndToEnd : public ::testing::Test
 protected:
     void SetUp() override
     {
-        fixture.AddHandset(u"phone"_s, u"Test phone"_s, u"win32"_s);
+        run.AddHandset(u"phone"_s);
         device = fixture.Connect(u"phone"_s);
         ASSERT_TRUE(device);
-        logs = fixture.WorkFolder() + u"/logs"_s;
         QDir().mkpath(logs);
-        log.SetLogPath(fixture.WorkFolder() + u"/log.txt"_s);
         env = {{u"LogPath"_s, logs},
                {u"TestRunID"_s, u"{5f0c2f1e-0000-4000-8000-000000000001}"_s},
                {u"DataCachePath"_s, fixture.WorkFolder()}};
@@ -58,7 +54,7 @@ protected:
     // Runs the module through the controller's order of calls.
     void RunModule(_TestModule &module)
     {
-        module.SetLogger(&log);
+        module.SetLogger(run.log());
         ASSERT_TRUE(module.Run(device.get(), env));
         ASSERT_TRUE(module.IsLogComplete(device.get()));
         ASSERT_TRUE(module.CopyLog(device.get(), env));
@@ -66,10 +62,10 @@ protected:
         module.PostProcess(env);
     }
 
-    testutil::HandsetFixture fixture;
+    testutil::KitRun run;
+    testutil::HandsetFixture &fixture = run.Handsets();
     testutil::HandsetFixture::Device device;
-    QString logs;
-    Log log;
+    const QString logs = run.Path(u"logs"_s);
     QMap<QString, QString> env;
 };
 
@@ -202,7 +198,7 @@ TEST_F(EndToEnd, OatModuleRunsInTheFrameworkAndIsPostProcessed)
     env.insert(u"DSOCacheFilePath"_s, u"/cache/dso"_s);
     env.insert(u"Platform"_s, u"/sdk/pvs/platform"_s);
 
-    module.SetLogger(&log);
+    module.SetLogger(run.log());
     ASSERT_TRUE(module.Run(device.get(), env));
     EXPECT_TRUE(OnHandset(u"fs:/mif/oattimer.mif"_s));
     ASSERT_TRUE(module.IsLogComplete(device.get()));
@@ -217,7 +213,7 @@ TEST_F(EndToEnd, OatModuleRunsInTheFrameworkAndIsPostProcessed)
     ASSERT_EQ(module.desktopLogFiles.size(), 1);
     EXPECT_EQ(QFileInfo(module.desktopLogFiles[0]).absolutePath(), logs);
     EXPECT_TRUE(QFileInfo(module.desktopLogFiles[0]).fileName().startsWith(u"pp-timer_u"_s));
-    EXPECT_TRUE(testutil::ReadFile(fixture.WorkFolder() + u"/log.txt"_s).contains("processed timer_u"));
+    EXPECT_TRUE(run.LogText().contains(u"processed timer_u"_s));
 
     TestResults results;
     ASSERT_TRUE(module.ParseLog(results));
