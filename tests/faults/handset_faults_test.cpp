@@ -167,21 +167,12 @@ TEST_F(HandsetFaultTest, HandsetLostAtAnyStepEndsTheRunAndKeepsRecordedVerdicts)
     EXPECT_EQ(steps, (std::set<QString>{u"install"_s, u"start"_s, u"log wait"_s, u"copy"_s, u"remove"_s, u"unload"_s}));
 }
 
-class NeverEndingLogTest : public HandsetFaultTest
+TEST_F(HandsetFaultTest, NeverEndingLogIsTakenAfterTheBoundedWaitWithWhatItHolds)
 {
-protected:
-    void SetUp() override
-    {
-        HandsetFaultTest::SetUp();
-        kitbuilder::Module endless = CtfModule(u"Endless"_s, 0x01230003, {u"first"_s, u"second"_s});
-        endless.package.behaviour = CtfBehaviour(u"Endless"_s, u"first"_s, u"second"_s, false);
-        AddModule(endless);
-        ASSERT_TRUE(m_run.Kit().Ok());
-    }
-};
-
-TEST_F(NeverEndingLogTest, RunMovesOnAfterTheBoundedWaitWithWhatTheLogHolds)
-{
+    kitbuilder::Module endless = CtfModule(u"Endless"_s, 0x01230003, {u"first"_s, u"second"_s});
+    endless.package.behaviour = CtfBehaviour(u"Endless"_s, u"first"_s, u"second"_s, false);
+    AddModule(endless);
+    ASSERT_TRUE(m_run.KitOk());
     Clock::Timer timer;
     ASSERT_TRUE(RunModules({u"Endless"_s, u"Audio"_s}));
     RecordProperty("wall_ms", int(timer.Elapsed()));
@@ -193,28 +184,19 @@ TEST_F(NeverEndingLogTest, RunMovesOnAfterTheBoundedWaitWithWhatTheLogHolds)
     EXPECT_EQ(view.verdicts.value(u"Audio/play"_s), u"pass"_s);
 }
 
-class HugeLogTest : public HandsetFaultTest
+TEST_F(HandsetFaultTest, HugeLogIsCopiedParsedAndRecorded)
 {
-protected:
-    void SetUp() override
-    {
-        HandsetFaultTest::SetUp();
-        kitbuilder::Module chatty = CtfModule(u"Chatty"_s, 0x01230004, {u"early"_s, u"late"_s});
-        // About 24 MB: a verdict, half a million lines of chatter, one line
-        // of 4 MB without a break, then the last verdict and the end marker.
-        chatty.package.behaviour = "mkdir -p usermods/CTF\n"
-                                   "{ printf 'Suite: Chatty\\nTest: early\\nResult: Pass\\n'\n"
-                                   "  yes 'chatter from a test that tells everything it does' | head -n 400000\n"
-                                   "  head -c 4000000 /dev/zero | tr '\\0' 'x'\n"
-                                   "  printf '\\nTest: late\\nResult: Fail\\n[/VERBOSE]\\n'\n"
-                                   "} > usermods/CTF/CTF.log\n";
-        AddModule(chatty);
-        ASSERT_TRUE(m_run.Kit().Ok());
-    }
-};
-
-TEST_F(HugeLogTest, HugeLogIsCopiedParsedAndRecorded)
-{
+    kitbuilder::Module chatty = CtfModule(u"Chatty"_s, 0x01230004, {u"early"_s, u"late"_s});
+    // About 24 MB: a verdict, half a million lines of chatter, one line of 4
+    // MB without a break, then the last verdict and the end marker.
+    chatty.package.behaviour = "mkdir -p usermods/CTF\n"
+                               "{ printf 'Suite: Chatty\\nTest: early\\nResult: Pass\\n'\n"
+                               "  yes 'chatter from a test that tells everything it does' | head -n 400000\n"
+                               "  head -c 4000000 /dev/zero | tr '\\0' 'x'\n"
+                               "  printf '\\nTest: late\\nResult: Fail\\n[/VERBOSE]\\n'\n"
+                               "} > usermods/CTF/CTF.log\n";
+    AddModule(chatty);
+    ASSERT_TRUE(m_run.KitOk());
     ASSERT_TRUE(RunModules({u"Chatty"_s})) << m_run.LogText().toStdString();
     const ResultsView view = ReadResults(ResultsPath());
     EXPECT_EQ(view.verdicts.value(u"Chatty/early"_s), u"pass"_s);
@@ -245,7 +227,7 @@ TEST_P(CorruptMifTest, ModuleFailsToStartAndTheRunGoesOn)
             member.second = mif;
     }
     m_run.Kit().AddPackage(folder + u"/package"_s, u"Broken_Win32_Debug"_s, members);
-    ASSERT_TRUE(m_run.Kit().Ok());
+    ASSERT_TRUE(m_run.KitOk());
 
     ASSERT_TRUE(RunModules({u"Broken"_s, u"Audio"_s}));
     const QString log = m_run.LogText();
