@@ -51,48 +51,42 @@ TEST_F(HarnessCompileTest, UpperCaseKsxIsConvertedThenCompiledAndTheCarRemoved)
                   .arg(source, output));
 }
 
-TEST_F(HarnessCompileTest, OtherSourcesAreCompiledDirectly)
+TEST_F(HarnessCompileTest, OnlyKsxIsConvertedAndAFailedStepKeepsTheSourceAndNoIntermediate)
 {
     m_toolset.InstallCompiler();
-    for (const QString &name : {u"data.kar"_s, u"data.ksx.txt"_s, u"ksx"_s}) {
-        SCOPED_TRACE(name.toStdString());
-        const QString source = WorkPath(name);
-        WriteFile(source, "x");
-        const int before = m_toolset.Calls().size();
-        EXPECT_TRUE(m_harness.CompileResource(source, WorkPath(u"out.kar"_s)));
-        const QList<QStringList> calls = m_toolset.Calls();
-        ASSERT_EQ(calls.size(), before + 1);
+    const struct
+    {
+        const char *source;
+        const char *failing; // the toolset flag, or null
+        bool compiled;
+        const char *compileInput; // "car" for the converted intermediate
+    } rows[] = {
+        {"data.kar", nullptr, true, "data.kar"},
+        {"data.ksx.txt", nullptr, true, "data.ksx.txt"},
+        {"ksx", nullptr, true, "ksx"},
+        {"strings.ksx", "convert_fails", true, "strings.ksx"},
+        {"strings.ksx", "compile_fails", false, "car"},
+    };
+    for (const auto &row : rows) {
+        SCOPED_TRACE(row.source + std::string(" ") + (row.failing ? row.failing : ""));
+        const QString source = WorkPath(QString::fromLatin1(row.source));
+        const QString car = WorkPath(u"strings.car"_s);
+        WriteFile(source, "src");
+        if (row.failing)
+            m_toolset.SetFlag(row.failing, true);
+        const qsizetype before = m_toolset.Calls().size();
+        EXPECT_EQ(m_harness.CompileResource(source, WorkPath(u"out.kar"_s)), row.compiled);
+        if (row.failing)
+            m_toolset.SetFlag(row.failing, false);
+
+        const QList<QStringList> calls = m_toolset.Calls().mid(before);
+        ASSERT_EQ(calls.size(), source.endsWith(u".ksx"_s) ? 2 : 1);
         EXPECT_EQ(calls.last().value(0), u"-compile"_s);
-        EXPECT_EQ(calls.last().value(2), source);
+        EXPECT_EQ(calls.last().value(2), qstrcmp(row.compileInput, "car") ? source : car);
+        EXPECT_TRUE(QFileInfo::exists(source));
+        EXPECT_FALSE(QFileInfo::exists(car));
     }
-}
-
-TEST_F(HarnessCompileTest, ConversionWithoutSuccessCompilesTheGivenSource)
-{
-    m_toolset.InstallCompiler();
-    m_toolset.SetFlag("convert_fails", true);
-    const QString source = WorkPath(u"strings.ksx"_s);
-    WriteFile(source, "src");
-
-    EXPECT_TRUE(m_harness.CompileResource(source, WorkPath(u"out.kar"_s)));
-    const QList<QStringList> calls = m_toolset.Calls();
-    ASSERT_EQ(calls.size(), 2);
-    EXPECT_EQ(calls[1].value(0), u"-compile"_s);
-    EXPECT_EQ(calls[1].value(2), source);
-    EXPECT_TRUE(QFileInfo::exists(source));
     EXPECT_FALSE(m_log.Text().contains(u"conversion error"_s));
-}
-
-TEST_F(HarnessCompileTest, CompileWithoutSuccessTextFailsAndStillRemovesTheIntermediate)
-{
-    m_toolset.InstallCompiler();
-    m_toolset.SetFlag("compile_fails", true);
-    const QString source = WorkPath(u"strings.ksx"_s);
-    WriteFile(source, "src");
-
-    EXPECT_FALSE(m_harness.CompileResource(source, WorkPath(u"out.kar"_s)));
-    EXPECT_FALSE(QFileInfo::exists(WorkPath(u"strings.car"_s)));
-    EXPECT_TRUE(QFileInfo::exists(source));
 }
 
 // The name would run commands if it ever reached a shell.
