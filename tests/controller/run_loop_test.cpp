@@ -288,27 +288,17 @@ TEST_F(RunLoopTest, LogIsPolledEverySecondOnHandsetsAndCopiedAfterTenMinutesAtMo
     EXPECT_TRUE(m_events.contains(u"copy Stuck"_s));
 }
 
-TEST(RunLoopSimulator, SimulatorHandsetsArePolledEveryQuarterSecond)
+TEST_F(RunLoopTest, SimulatorHandsetsArePolledEveryQuarterSecond)
 {
-    QTemporaryDir dir;
-    testutil::HandsetFixture handsets;
-    handsets.AddHandset(u"sim"_s, QString(), u"win32"_s);
-    QStringList events;
-    Harness harness;
-    harness.SetTarget(u"sim"_s);
-    harness.SetLogOutputPath(dir.filePath(u"logs"_s));
-    QSharedPointer<Manifest> kit = MakeCatalogue(dir.filePath(u"kit"_s), false, {});
-    kit->frameworks.insert(u"ctf"_s, QSharedPointer<_Framework>(new RecordingFramework(u"ctf"_s, &events)));
-    HarnessControllerAccess::SetCatalogues(harness, kit, {});
-    QSharedPointer<RecordingModule> module(new RecordingModule(u"M"_s, u"ctf"_s, &events));
+    m_handsets.AddHandset(u"sim"_s, QString(), u"win32"_s);
+    m_harness.SetTarget(u"sim"_s);
+    QSharedPointer<RecordingModule> module = Queue(u"M"_s, u"ctf"_s);
     module->pollsNeeded = 2;
-    harness.AddTest(module);
 
-    EXPECT_TRUE(harness.Run());
+    EXPECT_TRUE(m_harness.Run());
     ASSERT_EQ(module->pollTimes.size(), 2);
     EXPECT_GE(module->pollTimes[1] - module->pollTimes[0], 250);
     EXPECT_LT(module->pollTimes[1] - module->pollTimes[0], 500);
-    harness.DisconnectTarget();
 }
 
 TEST_F(RunLoopTest, LostHandsetEndsTheRunWithoutUnloading)
