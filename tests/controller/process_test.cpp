@@ -56,6 +56,7 @@ protected:
         Log(u"a-run/menu-2026-12-05.txt"_s, UtLog("Menu", {{"m2", "PASS"}}));
         Log(u"oatRawLogs/trap-ctf-1.log"_s, CtfLog("Audio", {{"trap", "Pass"}}));
         Log(u"ProcessedResults/trap-ctf-2.log"_s, CtfLog("Audio", {{"trap", "Pass"}}));
+        Prepare(m_harness, m_log);
     }
 
     void Log(const QString &relative, const QByteArray &content)
@@ -74,17 +75,17 @@ protected:
     QTemporaryDir m_dir;
     QSharedPointer<Manifest> m_kit;
     QSharedPointer<Manifest> m_platform;
+    // Set up for the saved tree.
+    CapturedLog m_log;
+    Harness m_harness;
 };
 
 TEST_F(ProcessTest, WholeTreeFeedsOneResultsFileWithIndentedMessages)
 {
-    CapturedLog log;
-    Harness harness;
-    Prepare(harness, log);
-    ASSERT_TRUE(harness.Process(0));
+    ASSERT_TRUE(m_harness.Process(0));
 
     const QString results = LogFolder() + u"/ProcessedResults/ProcessedResults.xml"_s;
-    auto &env = HarnessControllerAccess::Environment(harness);
+    auto &env = HarnessControllerAccess::Environment(m_harness);
     EXPECT_EQ(env.value(u"ProcessedResultsPath"_s), results);
     EXPECT_EQ(env.value(u"LogPath"_s), LogFolder());
     const ResultsView view = ReadResults(results);
@@ -116,7 +117,7 @@ TEST_F(ProcessTest, WholeTreeFeedsOneResultsFileWithIndentedMessages)
                                             "      Process Complete"
                                             "   Process Complete")
                                  .arg(a, b);
-    EXPECT_EQ(log.Text(), expected);
+    EXPECT_EQ(m_log.Text(), expected);
     // Nothing else was written into the tree.
     EXPECT_EQ(QDir(LogFolder() + u"/ProcessedResults"_s).entryList(QDir::Files),
               (QStringList{u"ProcessedResults.xml"_s, u"trap-ctf-2.log"_s}));
@@ -124,10 +125,7 @@ TEST_F(ProcessTest, WholeTreeFeedsOneResultsFileWithIndentedMessages)
 
 TEST_F(ProcessTest, GivesTheSameFileAsRecordingTheLogsOneByOne)
 {
-    CapturedLog batchLog;
-    Harness batch;
-    Prepare(batch, batchLog);
-    ASSERT_TRUE(batch.Process(0));
+    ASSERT_TRUE(m_harness.Process(0));
     const QByteArray processed = ReadFile(LogFolder() + u"/ProcessedResults/ProcessedResults.xml"_s);
 
     CapturedLog singleLog;
@@ -151,10 +149,7 @@ TEST_F(ProcessTest, GivesTheSameFileAsRecordingTheLogsOneByOne)
 TEST_F(ProcessTest, DamagedResultsFileIsKeptAsideOnce)
 {
     Log(u"ProcessedResults/ProcessedResults.xml"_s, "<testmodules kvkHash=\"#1\"><mod");
-    CapturedLog log;
-    Harness harness;
-    Prepare(harness, log);
-    ASSERT_TRUE(harness.Process(0));
+    ASSERT_TRUE(m_harness.Process(0));
     const QDir folder(LogFolder() + u"/ProcessedResults"_s);
     EXPECT_EQ(folder.entryList({u"*.unreadable-*"_s}, QDir::Files).size(), 1);
     EXPECT_EQ(ReadResults(folder.filePath(u"ProcessedResults.xml"_s)).verdicts.value(u"Audio/a"_s), u"pass"_s);
@@ -185,11 +180,8 @@ TEST_F(ProcessTest, WithoutALogFolderNothingIsCreated)
 TEST_F(ProcessTest, LinkBackUpTheTreeIsNotFollowed)
 {
     ASSERT_TRUE(QFile::link(LogFolder(), LogFolder() + u"/b-run/loop"_s));
-    CapturedLog log;
-    Harness harness;
-    Prepare(harness, log);
-    EXPECT_TRUE(harness.Process(0));
-    EXPECT_FALSE(log.Text().contains(u"loop"_s));
+    EXPECT_TRUE(m_harness.Process(0));
+    EXPECT_FALSE(m_log.Text().contains(u"loop"_s));
 }
 
 } // namespace
