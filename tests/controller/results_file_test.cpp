@@ -255,40 +255,41 @@ TEST_F(ResultsFileTest, UnwritableResultsFileIsReported)
 
 // ---- The document on its own ----
 
-TEST(ProcessedResultsDocument, SameDocumentGivesTheSameBytes)
+// A results file "r.xml" of module "M" (hash "#1") without catalogues.
+class ProcessedResultsDocument : public ::testing::Test
 {
-    QTemporaryDir dir;
-    const QString path = dir.filePath(u"r.xml"_s);
-    auto write = [&](const QString &file) {
+protected:
+    // Records one verdict into file and saves it.
+    static bool RecordOne(const QString &file, const QString &testCase, const QString &family = QString())
+    {
         ProcessedResults results;
         results.Open(file, nullptr, nullptr, nullptr);
-        results.Record(u"#1"_s, u"M"_s, u"f"_s, u"s"_s, u"t"_s, u"pass"_s);
-        EXPECT_TRUE(results.Save());
-    };
-    write(path);
-    write(path + u".2"_s);
+        results.Record(u"#1"_s, u"M"_s, family, family, testCase, u"pass"_s);
+        return results.Save();
+    }
+
+    QTemporaryDir dir;
+    const QString path = dir.filePath(u"r.xml"_s);
+};
+
+TEST_F(ProcessedResultsDocument, SameDocumentGivesTheSameBytes)
+{
+    EXPECT_TRUE(RecordOne(path, u"t"_s, u"f"_s));
+    EXPECT_TRUE(RecordOne(path + u".2"_s, u"t"_s, u"f"_s));
     EXPECT_EQ(ReadFile(path), ReadFile(path + u".2"_s));
     EXPECT_FALSE(ReadFile(path).startsWith("<?xml"));
 }
 
-TEST(ProcessedResultsDocument, WithoutAKitCatalogueVerdictsAccumulate)
+TEST_F(ProcessedResultsDocument, WithoutAKitCatalogueVerdictsAccumulate)
 {
-    QTemporaryDir dir;
-    const QString path = dir.filePath(u"r.xml"_s);
-    for (const char *testCase : {"one", "two"}) {
-        ProcessedResults results;
-        results.Open(path, nullptr, nullptr, nullptr);
-        results.Record(u"#1"_s, u"M"_s, QString(), QString(), QString::fromLatin1(testCase), u"pass"_s);
-        ASSERT_TRUE(results.Save());
-    }
+    ASSERT_TRUE(RecordOne(path, u"one"_s));
+    ASSERT_TRUE(RecordOne(path, u"two"_s));
     EXPECT_EQ(ReadResults(path).caseOrder.value(u"M"_s), (QStringList{u"one"_s, u"two"_s}));
 }
 
-TEST(ProcessedResultsDocument, WhatTheFileHoldsBesideVerdictsIsKept)
+TEST_F(ProcessedResultsDocument, WhatTheFileHoldsBesideVerdictsIsKept)
 {
     // Notes a user added by hand, in any form XML has, survive the rewrite.
-    QTemporaryDir dir;
-    const QString path = dir.filePath(u"r.xml"_s);
     WriteFile(path,
               "<testmodules kvkHash=\"\" platformHash=\"\">\n"
               " <!-- checked by hand -->\n"
@@ -297,10 +298,7 @@ TEST(ProcessedResultsDocument, WhatTheFileHoldsBesideVerdictsIsKept)
               "  <testcase name=\"t\" result=\"fail\"><![CDATA[<see bug 12>]]></testcase>\n"
               " </module>\n"
               "</testmodules>\n");
-    ProcessedResults results;
-    results.Open(path, nullptr, nullptr, nullptr);
-    results.Record(u"#1"_s, u"M"_s, QString(), QString(), u"t"_s, u"pass"_s);
-    ASSERT_TRUE(results.Save());
+    ASSERT_TRUE(RecordOne(path, u"t"_s));
     EXPECT_EQ(ReadFile(path),
               QByteArray("<testmodules kvkHash=\"\" platformHash=\"\">\n"
                          " <!-- checked by hand -->\n"
@@ -311,12 +309,10 @@ TEST(ProcessedResultsDocument, WhatTheFileHoldsBesideVerdictsIsKept)
                          "</testmodules>\n"));
 }
 
-TEST(ProcessedResultsDocument, FileNestedBeyondAnyResultsFileIsKeptAside)
+TEST_F(ProcessedResultsDocument, FileNestedBeyondAnyResultsFileIsKeptAside)
 {
     // Written back with its indentation, a file nested a hundred thousand
     // levels deep would need tens of gigabytes.
-    QTemporaryDir dir;
-    const QString path = dir.filePath(u"r.xml"_s);
     QByteArray deep = "<testmodules kvkHash=\"\" platformHash=\"\">";
     for (int i = 0; i < 100000; ++i)
         deep += "<m>";
@@ -324,24 +320,19 @@ TEST(ProcessedResultsDocument, FileNestedBeyondAnyResultsFileIsKeptAside)
         deep += "</m>";
     deep += "</testmodules>";
     WriteFile(path, deep);
-    ProcessedResults results;
-    results.Open(path, nullptr, nullptr, nullptr);
-    results.Record(u"#1"_s, u"M"_s, QString(), QString(), u"t"_s, u"pass"_s);
-    ASSERT_TRUE(results.Save());
+    ASSERT_TRUE(RecordOne(path, u"t"_s));
     const QStringList aside = QDir(dir.path()).entryList({u"r.xml.unreadable-*"_s}, QDir::Files);
     ASSERT_EQ(aside.size(), 1);
     EXPECT_EQ(ReadFile(dir.filePath(aside.first())), deep);
     EXPECT_EQ(ReadResults(path).verdicts.value(u"M/t"_s), u"pass"_s);
 }
 
-TEST(ProcessedResultsDocument, LongRunsOfRenamesAndNewCasesMatchTheRules)
+TEST_F(ProcessedResultsDocument, LongRunsOfRenamesAndNewCasesMatchTheRules)
 {
     // Verdicts at random against the rules applied to a plain list: the
     // first case in the module named as reported, or as reported without a
     // ".1" or "_1" ending, takes the verdict (renamed and moved last when
     // the names differ); no match appends a case.
-    QTemporaryDir dir;
-    const QString path = dir.filePath(u"r.xml"_s);
     QRandomGenerator random(7);
     const QStringList verdicts{u"pass"_s, u"fail"_s, u"unsupported"_s, u"unexecuted"_s};
     QList<QPair<QString, QString>> model;
