@@ -172,21 +172,13 @@ TEST_F(FeatureListTest, ParseErrorNamesLineAndColumn)
 class CatalogueSetupTest : public ::testing::Test
 {
 protected:
-    CatalogueSetupTest()
-        : m_env("KESTIX_DATA_ROOT", m_dir.filePath(u"data"_s))
-        , m_kit(m_dir.filePath(u"kit"_s))
-        , m_platform(m_dir.filePath(u"platform/pvs/platform"_s))
-    {
-    }
-
     void SetUp() override
     {
-        ASSERT_TRUE(m_dir.isValid());
         m_harness.SetLogger(m_log.log());
-        m_kit.AddSourceModule(u"tests/audio"_s, Module(u"Audio"_s));
-        m_kit.AddFrameworkPackage(u"testframeworks"_s, u"ctf"_s, u"Win32"_s, u"Debug"_s);
+        m_run.Kit().AddSourceModule(u"tests/audio"_s, Module(u"Audio"_s));
+        m_run.Kit().AddFrameworkPackage(u"testframeworks"_s, u"ctf"_s, u"Win32"_s, u"Debug"_s);
         m_platform.AddSourceModule(u"tests/shell"_s, Module(u"Shell"_s));
-        ASSERT_TRUE(m_kit.Ok() && m_platform.Ok());
+        ASSERT_TRUE(m_run.KitOk() && m_platform.Ok());
     }
 
     static kitbuilder::Module Module(const QString &name)
@@ -198,14 +190,12 @@ protected:
         return module;
     }
 
-    QString KitPath() const { return m_dir.filePath(u"kit"_s); }
-    QString PlatformSetting() const { return m_dir.filePath(u"platform"_s); }
-    QString PlatformPath() const { return m_dir.filePath(u"platform/pvs/platform"_s); }
+    QString KitPath() const { return m_run.Path(u"kit"_s); }
+    QString PlatformSetting() const { return m_run.Path(u"platform"_s); }
+    QString PlatformPath() const { return m_run.Path(u"platform/pvs/platform"_s); }
 
-    QTemporaryDir m_dir;
-    EnvGuard m_env;
-    kitbuilder::KitBuilder m_kit;
-    kitbuilder::KitBuilder m_platform;
+    testutil::KitRun m_run;
+    kitbuilder::KitBuilder m_platform{PlatformPath()};
     CapturedLog m_log;
     Harness m_harness;
 };
@@ -246,7 +236,7 @@ TEST_F(CatalogueSetupTest, StaleKitCacheIsRegeneratedAndTheDefaultDevicePackTake
 
 TEST_F(CatalogueSetupTest, DevicePackGivenBeforehandIsKept)
 {
-    const QString pack = m_dir.filePath(u"mine.dso"_s);
+    const QString pack = m_run.Path(u"mine.dso"_s);
     WriteFile(pack, "<dso/>");
     m_harness.SetDPK(pack);
     m_harness.SetTestkit(KitPath());
@@ -275,10 +265,10 @@ TEST_F(CatalogueSetupTest, GenerateManifestWritesEachCatalogueToItsCache)
 
 TEST_F(CatalogueSetupTest, GenerateManifestToARelativePathCreatesItsFolder)
 {
-    testutil::CurrentDirectory cwd(m_dir.path());
+    testutil::CurrentDirectory cwd(m_run.Path(u"."_s));
     m_harness.SetTestkit(KitPath());
     EXPECT_TRUE(m_harness.GenerateManifest(u"out/sub/kit.xml"_s));
-    const QString written = m_dir.filePath(u"out/sub/kit.xml"_s);
+    const QString written = m_run.Path(u"out/sub/kit.xml"_s);
     EXPECT_TRUE(m_log.Text().contains(u"Manifest "_s + KitPath() + u" written to "_s + written));
     QDomDocument document;
     ASSERT_TRUE(document.setContent(ReadFile(written)));
@@ -287,14 +277,14 @@ TEST_F(CatalogueSetupTest, GenerateManifestToARelativePathCreatesItsFolder)
 
 TEST_F(CatalogueSetupTest, GenerateManifestFallsBackToTheHomeFolder)
 {
-    const QString home = m_dir.filePath(u"home"_s);
+    const QString home = m_run.Path(u"home"_s);
     QDir().mkpath(home);
     EnvGuard homeGuard("HOME", home);
     // A regular file stands where the output folder should be.
-    WriteFile(m_dir.filePath(u"blocked"_s), "x");
+    WriteFile(m_run.Path(u"blocked"_s), "x");
     m_harness.SetTestkit(KitPath());
     m_harness.SetPlatform(PlatformSetting());
-    EXPECT_TRUE(m_harness.GenerateManifest(m_dir.filePath(u"blocked/kits.xml"_s)));
+    EXPECT_TRUE(m_harness.GenerateManifest(m_run.Path(u"blocked/kits.xml"_s)));
 
     const QString fallback = QDir::cleanPath(home + u"/kits.xml"_s);
     EXPECT_TRUE(m_log.Text().contains(u"Manifest "_s + PlatformPath() + u" written to "_s + fallback));
@@ -307,10 +297,10 @@ TEST_F(CatalogueSetupTest, GenerateManifestFallsBackToTheHomeFolder)
 
 TEST_F(CatalogueSetupTest, GenerateManifestWithoutAnyWritableFileFails)
 {
-    WriteFile(m_dir.filePath(u"blocked"_s), "x");
-    EnvGuard homeGuard("HOME", m_dir.filePath(u"blocked/home"_s));
+    WriteFile(m_run.Path(u"blocked"_s), "x");
+    EnvGuard homeGuard("HOME", m_run.Path(u"blocked/home"_s));
     m_harness.SetTestkit(KitPath());
-    EXPECT_FALSE(m_harness.GenerateManifest(m_dir.filePath(u"blocked/kits.xml"_s)));
+    EXPECT_FALSE(m_harness.GenerateManifest(m_run.Path(u"blocked/kits.xml"_s)));
     EXPECT_TRUE(m_log.Text().contains(u"Manifest can't be opened for writing."_s));
 }
 
