@@ -1,6 +1,5 @@
 #include "harnesstest.h"
 
-#include "support/handsetfixture.h"
 
 #include "environment/testdirectories.h"
 
@@ -9,7 +8,6 @@ using namespace Qt::StringLiterals;
 namespace {
 
 using harnesstest::CapturedLog;
-using testutil::EnvGuard;
 using testutil::ReadFile;
 using testutil::WriteFile;
 
@@ -17,10 +15,6 @@ using testutil::WriteFile;
 class HarnessTargetTest : public ::testing::Test
 {
 protected:
-    HarnessTargetTest()
-        : m_env("KESTIX_DATA_ROOT", m_handsets.WorkFolder() + u"/data"_s)
-    {
-    }
     void SetUp() override { m_harness.SetLogger(m_log.log()); }
     void TearDown() override { m_harness.DisconnectTarget(); }
 
@@ -40,8 +34,8 @@ protected:
     }
     const QMap<QString, QString> &Env() const { return HarnessTestAccess::Environment(m_harness); }
 
-    testutil::HandsetFixture m_handsets;
-    EnvGuard m_env;
+    testutil::KitRun m_run;
+    testutil::HandsetFixture &m_handsets = m_run.Handsets();
     CapturedLog m_log;
     Harness m_harness;
 };
