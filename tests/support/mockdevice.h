@@ -4,18 +4,13 @@
 
 #include <gmock/gmock.h>
 
-using namespace Qt::StringLiterals;
-
 // A handset whose every operation is a mock, for tests of call sequences and
 // of answers that the emulated handset cannot give (a module that runs for
 // ever, a failing copy).
 class MockDevice : public IKestoDevice
 {
 public:
-    MockDevice()
-        : IKestoDevice(ConnectTarget(u"mock"_s, u"mock handset"_s))
-    {
-    }
+    MockDevice() : IKestoDevice(ConnectTarget(QStringLiteral("mock"), QStringLiteral("mock handset"))) {}
 
     MOCK_METHOD(unsigned int, GetPlatformVersion, (QString &), (override));
     MOCK_METHOD(unsigned int, StartProgram, (const QString &, const QString &), (override));
