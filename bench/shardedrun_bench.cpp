@@ -9,8 +9,7 @@
 #include "controller/shardedrun.h"
 #include "log/log.h"
 
-#include "support/handsetfixture.h"
-#include "support/shardkit.h"
+#include "support/kitrun.h"
 
 #include <QDir>
 
@@ -27,19 +26,13 @@ constexpr int kHandsets = 4;
 struct Setting
 {
     Setting()
-        : kit(benchutil::WorkFolder() + QStringLiteral("/shard"), kCtfModules, kAppletModules,
-              QStringLiteral("0.2"))
     {
-        handsets = shardkit::ShardKit::AddHandsets(fixture, kHandsets);
-        log.SetLogPath(benchutil::WorkFolder() + QStringLiteral("/shard/log.txt"));
+        testutil::AddShardModules(run.Kit(), kCtfModules, kAppletModules, QStringLiteral("0.2"));
+        handsets = run.AddHandsets(kHandsets);
     }
 
-    QString Logs() const { return benchutil::WorkFolder() + QStringLiteral("/shard/logs"); }
-
-    testutil::HandsetFixture fixture;
-    shardkit::ShardKit kit;
+    testutil::KitRun run;
     QStringList handsets;
-    Log log;
 };
 
 Setting &Shared()
@@ -59,13 +52,13 @@ QList<QSharedPointer<_TestModule>> Select(Harness &harness)
 void BM_HarnessRun(benchmark::State &state)
 {
     Setting &setting = Shared();
-    if (!setting.kit.Ok()) {
+    if (!setting.run.Kit().Ok()) {
         state.SkipWithError("the kit could not be built");
         return;
     }
     for (auto _ : state) {
         Harness harness;
-        setting.kit.Configure(harness, setting.handsets.first(), setting.Logs(), &setting.log);
+        setting.run.Configure(harness, setting.handsets.first(), setting.run.log());
         for (const QSharedPointer<_TestModule> &module : Select(harness))
             harness.AddTest(module);
         if (!harness.Run())
@@ -79,16 +72,16 @@ BENCHMARK(BM_HarnessRun)->Iterations(1)->UseRealTime()->Unit(benchmark::kMillise
 void BM_ShardedRun(benchmark::State &state)
 {
     Setting &setting = Shared();
-    if (!setting.kit.Ok()) {
+    if (!setting.run.Kit().Ok()) {
         state.SkipWithError("the kit could not be built");
         return;
     }
     for (auto _ : state) {
         std::vector<std::unique_ptr<Harness>> harnesses;
-        ShardedRun run(&setting.log);
+        ShardedRun run(setting.run.log());
         for (int i = 0; i < state.range(0); ++i) {
             harnesses.push_back(std::make_unique<Harness>());
-            setting.kit.Configure(*harnesses.back(), setting.handsets.at(i), setting.Logs(), &setting.log);
+            setting.run.Configure(*harnesses.back(), setting.handsets.at(i), setting.run.log());
             run.AddHandset(harnesses.back().get());
         }
         if (!run.Run(Select(*harnesses.front())))

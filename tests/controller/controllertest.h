@@ -8,19 +8,20 @@
 
 #include "catalogue/manifest.h"
 #include "catalogue/testmodule.h"
-#include "controller/harness.h"
 #include "catalogue/testresults.h"
+#include "controller/harness.h"
 
 #include <QDomDocument>
 #include <QSharedPointer>
+
+using namespace Qt::StringLiterals;
 
 // The Harness befriends this class too.
 class HarnessControllerAccess
 {
 public:
     static QMap<QString, QString> &Environment(Harness &harness) { return harness.m_environment; }
-    static void SetCatalogues(Harness &harness, QSharedPointer<Manifest> kit,
-                              QSharedPointer<Manifest> platform)
+    static void SetCatalogues(Harness &harness, QSharedPointer<Manifest> kit, QSharedPointer<Manifest> platform)
     {
         harness.m_kitManifest = kit;
         harness.m_platformManifest = platform;
@@ -46,7 +47,7 @@ namespace controllertest {
 class ScriptedModule : public _TestModule
 {
 public:
-    explicit ScriptedModule(const QString &name, const QString &type = QStringLiteral("ctf"))
+    explicit ScriptedModule(const QString &name, const QString &type = u"ctf"_s)
         : m_type(type)
     {
         moduleName = name;
@@ -65,14 +66,13 @@ public:
         return true;
     }
     bool ParseLog(const QString &, TestResults &) override { return false; }
-    void PostProcess(QMap<QString, QString> &) override {}
+    void PostProcess(QMap<QString, QString> &) override { }
     QString ModuleName() override { return moduleName; }
-    QString ModuleXMLName() override { return QStringLiteral("scripted.xml"); }
+    QString ModuleXMLName() override { return u"scripted.xml"_s; }
     bool ProcessModuleMIF(const QString &) override { return false; }
 
     // Makes the log report these verdicts for the module named name.
-    void Report(const QString &name, const QList<TestCaseResult> &verdicts,
-                const QString &hash = QString())
+    void Report(const QString &name, const QList<TestCaseResult> &verdicts, const QString &hash = QString())
     {
         parsed.manifestName = name;
         parsed.idHash = hash;
@@ -90,16 +90,15 @@ private:
 
 // A catalogue module with test cases.
 inline QSharedPointer<ScriptedModule> CatalogueModule(const QString &name, const QString &hash,
-                                                      const QStringList &cases,
-                                                      const QString &family = QString(),
-                                                      const QString &type = QStringLiteral("ctf"))
+                                                      const QStringList &cases, const QString &family = QString(),
+                                                      const QString &type = u"ctf"_s)
 {
     QSharedPointer<ScriptedModule> module(new ScriptedModule(name, type));
     module->idHash = hash;
     module->family = family;
-    module->subFamily = family.isEmpty() ? QString() : family + QStringLiteral("-sub");
+    module->subFamily = family.isEmpty() ? QString() : family + u"-sub"_s;
     for (const QString &testCase : cases)
-        module->testCases.append(TestCase(testCase, QStringLiteral("auto")));
+        module->testCases.append(TestCase(testCase, u"auto"_s));
     return module;
 }
 
@@ -110,45 +109,14 @@ inline QSharedPointer<Manifest> MakeCatalogue(const QString &path, bool isPlatfo
 {
     QSharedPointer<Manifest> catalogue(new Manifest(path, isPlatform));
     for (const QSharedPointer<ScriptedModule> &module : modules) {
-        if (module->TestType() == QLatin1String("secondary"))
+        if (module->TestType() == u"secondary"_s)
             module->selectable = false;
         catalogue->testModules.insert(module->moduleName.toLower(), module);
     }
     return catalogue;
 }
 
-// The verdicts of a results file: "module/testcase" -> result, plus the
-// order of test case names per module.
-struct ResultsView
-{
-    bool ok = false;
-    QDomElement root;
-    QMap<QString, QString> verdicts;
-    QMap<QString, QStringList> caseOrder;
-    QMap<QString, QDomElement> modules;
-};
-
-inline ResultsView ReadResults(const QString &path)
-{
-    ResultsView view;
-    QDomDocument document;
-    if (!document.setContent(testutil::ReadFile(path)))
-        return view;
-    view.ok = true;
-    view.root = document.documentElement();
-    for (QDomElement module = view.root.firstChildElement(QStringLiteral("module"));
-         !module.isNull(); module = module.nextSiblingElement(QStringLiteral("module"))) {
-        const QString name = module.attribute(QStringLiteral("name"));
-        view.modules.insert(name, module);
-        for (QDomElement testCase = module.firstChildElement(QStringLiteral("testcase"));
-             !testCase.isNull(); testCase = testCase.nextSiblingElement(QStringLiteral("testcase"))) {
-            const QString caseName = testCase.attribute(QStringLiteral("name"));
-            view.verdicts.insert(name + QLatin1Char('/') + caseName,
-                                 testCase.attribute(QStringLiteral("result")));
-            view.caseOrder[name].append(caseName);
-        }
-    }
-    return view;
-}
+using testutil::ReadResults;
+using testutil::ResultsView;
 
 } // namespace controllertest

@@ -1,13 +1,14 @@
 #include "harnesstest.h"
 
-
 #include <QElapsedTimer>
+
+using namespace Qt::StringLiterals;
 
 namespace {
 
 using harnesstest::CapturedLog;
-using testutil::CurrentDirectory;
 using harnesstest::Toolset;
+using testutil::CurrentDirectory;
 using testutil::ReadFile;
 using testutil::WriteFile;
 
@@ -30,70 +31,62 @@ protected:
 TEST_F(HarnessCompileTest, UpperCaseKsxIsConvertedThenCompiledAndTheCarRemoved)
 {
     m_toolset.InstallCompiler();
-    const QString source = WorkPath(QStringLiteral("strings.KSX"));
-    const QString car = WorkPath(QStringLiteral("strings.car"));
-    const QString output = WorkPath(QStringLiteral("strings.kar"));
+    const QString source = WorkPath(u"strings.KSX"_s);
+    const QString car = WorkPath(u"strings.car"_s);
+    const QString output = WorkPath(u"strings.kar"_s);
     WriteFile(source, "<resources/>\n");
 
     EXPECT_TRUE(m_harness.CompileResource(source, output));
 
     const QList<QStringList> calls = m_toolset.Calls();
     ASSERT_EQ(calls.size(), 2);
-    EXPECT_EQ(calls[0], (QStringList{QStringLiteral("-convert"), QStringLiteral("-infile"), source,
-                                     QStringLiteral("-outfile"), car}));
-    EXPECT_EQ(calls[1], (QStringList{QStringLiteral("-compile"), QStringLiteral("-infile"), car,
-                                     QStringLiteral("-outfile"), output}));
+    EXPECT_EQ(calls[0], (QStringList{u"-convert"_s, u"-infile"_s, source, u"-outfile"_s, car}));
+    EXPECT_EQ(calls[1], (QStringList{u"-compile"_s, u"-infile"_s, car, u"-outfile"_s, output}));
     EXPECT_FALSE(QFileInfo::exists(car));
     EXPECT_EQ(ReadFile(output), QByteArray("compiled:\n<resources/>\n"));
     // Only the success lines reach the log, each on a line of its own.
-    EXPECT_EQ(m_log.Text(), QStringLiteral("Successfully converted file %1\n"
-                                           "Successfully compiled %2\n")
-                                .arg(source, output));
+    EXPECT_EQ(m_log.Text(),
+              QStringLiteral("Successfully converted file %1\n"
+                             "Successfully compiled %2\n")
+                  .arg(source, output));
 }
 
-TEST_F(HarnessCompileTest, OtherSourcesAreCompiledDirectly)
+TEST_F(HarnessCompileTest, OnlyKsxIsConvertedAndAFailedStepKeepsTheSourceAndNoIntermediate)
 {
     m_toolset.InstallCompiler();
-    for (const QString &name : {QStringLiteral("data.kar"), QStringLiteral("data.ksx.txt"),
-                                QStringLiteral("ksx")}) {
-        SCOPED_TRACE(name.toStdString());
-        const QString source = WorkPath(name);
-        WriteFile(source, "x");
-        const int before = m_toolset.Calls().size();
-        EXPECT_TRUE(m_harness.CompileResource(source, WorkPath(QStringLiteral("out.kar"))));
-        const QList<QStringList> calls = m_toolset.Calls();
-        ASSERT_EQ(calls.size(), before + 1);
-        EXPECT_EQ(calls.last().value(0), QStringLiteral("-compile"));
-        EXPECT_EQ(calls.last().value(2), source);
+    const struct
+    {
+        const char *source;
+        const char *failing; // the toolset flag, or null
+        bool compiled;
+        const char *compileInput; // "car" for the converted intermediate
+    } rows[] = {
+        {"data.kar", nullptr, true, "data.kar"},
+        {"data.ksx.txt", nullptr, true, "data.ksx.txt"},
+        {"ksx", nullptr, true, "ksx"},
+        {"strings.ksx", "convert_fails", true, "strings.ksx"},
+        {"strings.ksx", "compile_fails", false, "car"},
+    };
+    for (const auto &row : rows) {
+        SCOPED_TRACE(row.source + std::string(" ") + (row.failing ? row.failing : ""));
+        const QString source = WorkPath(QString::fromLatin1(row.source));
+        const QString car = WorkPath(u"strings.car"_s);
+        WriteFile(source, "src");
+        if (row.failing)
+            m_toolset.SetFlag(row.failing, true);
+        const qsizetype before = m_toolset.Calls().size();
+        EXPECT_EQ(m_harness.CompileResource(source, WorkPath(u"out.kar"_s)), row.compiled);
+        if (row.failing)
+            m_toolset.SetFlag(row.failing, false);
+
+        const QList<QStringList> calls = m_toolset.Calls().mid(before);
+        ASSERT_EQ(calls.size(), source.endsWith(u".ksx"_s) ? 2 : 1);
+        EXPECT_EQ(calls.last().value(0), u"-compile"_s);
+        EXPECT_EQ(calls.last().value(2), qstrcmp(row.compileInput, "car") ? source : car);
+        EXPECT_TRUE(QFileInfo::exists(source));
+        EXPECT_FALSE(QFileInfo::exists(car));
     }
-}
-
-TEST_F(HarnessCompileTest, ConversionWithoutSuccessCompilesTheGivenSource)
-{
-    m_toolset.InstallCompiler();
-    m_toolset.SetFlag("convert_fails", true);
-    const QString source = WorkPath(QStringLiteral("strings.ksx"));
-    WriteFile(source, "src");
-
-    EXPECT_TRUE(m_harness.CompileResource(source, WorkPath(QStringLiteral("out.kar"))));
-    const QList<QStringList> calls = m_toolset.Calls();
-    ASSERT_EQ(calls.size(), 2);
-    EXPECT_EQ(calls[1].value(0), QStringLiteral("-compile"));
-    EXPECT_EQ(calls[1].value(2), source);
-    EXPECT_TRUE(QFileInfo::exists(source));
-    EXPECT_FALSE(m_log.Text().contains(QStringLiteral("conversion error")));
-}
-
-TEST_F(HarnessCompileTest, CompileWithoutSuccessTextFailsAndStillRemovesTheIntermediate)
-{
-    m_toolset.InstallCompiler();
-    m_toolset.SetFlag("compile_fails", true);
-    const QString source = WorkPath(QStringLiteral("strings.ksx"));
-    WriteFile(source, "src");
-
-    EXPECT_FALSE(m_harness.CompileResource(source, WorkPath(QStringLiteral("out.kar"))));
-    EXPECT_FALSE(QFileInfo::exists(WorkPath(QStringLiteral("strings.car"))));
-    EXPECT_TRUE(QFileInfo::exists(source));
+    EXPECT_FALSE(m_log.Text().contains(u"conversion error"_s));
 }
 
 // The name would run commands if it ever reached a shell.
@@ -102,11 +95,10 @@ TEST_F(HarnessCompileTest, FileNamesWithShellCharactersArePassedUnchanged)
     m_toolset.InstallCompiler();
     m_toolset.InstallAltCompiler();
     CurrentDirectory cwd(m_work.path());
-    const QString name =
-        QStringLiteral("my data \"q\" 'x' $HOME $(touch injected) `touch injected2`; x.ksx");
+    const QString name = u"my data \"q\" 'x' $HOME $(touch injected) `touch injected2`; x.ksx"_s;
     const QString source = WorkPath(name);
     WriteFile(source, "payload");
-    const QString output = WorkPath(QStringLiteral("out $PATH \"1\".kar"));
+    const QString output = WorkPath(u"out $PATH \"1\".kar"_s);
 
     EXPECT_TRUE(m_harness.CompileResource(source, output));
     EXPECT_EQ(ReadFile(output), QByteArray("compiled:\npayload"));
@@ -115,13 +107,12 @@ TEST_F(HarnessCompileTest, FileNamesWithShellCharactersArePassedUnchanged)
     EXPECT_EQ(calls[0].value(2), source);
     EXPECT_EQ(calls[1].value(4), output);
 
-    const QString altOutput = WorkPath(QStringLiteral("dpk $(touch injected3).kar"));
+    const QString altOutput = WorkPath(u"dpk $(touch injected3).kar"_s);
     EXPECT_TRUE(m_harness.AltCompileResource(source, altOutput));
     EXPECT_EQ(ReadFile(altOutput), QByteArray("payload"));
-    EXPECT_EQ(m_toolset.Calls().value(2), (QStringList{QStringLiteral("-nh"), QStringLiteral("-o"),
-                                                       altOutput, source}));
-    EXPECT_TRUE(m_log.Text().startsWith(QStringLiteral("Successfully converted file ")));
-    EXPECT_FALSE(m_log.Text().contains(QStringLiteral("Compiliation")));
+    EXPECT_EQ(m_toolset.Calls().value(2), (QStringList{u"-nh"_s, u"-o"_s, altOutput, source}));
+    EXPECT_TRUE(m_log.Text().startsWith(u"Successfully converted file "_s));
+    EXPECT_FALSE(m_log.Text().contains(u"Compiliation"_s));
 
     for (const char *file : {"injected", "injected2", "injected3"})
         EXPECT_FALSE(QFileInfo::exists(WorkPath(QString::fromLatin1(file)))) << file;
@@ -131,8 +122,8 @@ TEST_F(HarnessCompileTest, AltCompileWithAnEmptyOutputFailsWithTheCommandAndTheT
 {
     m_toolset.InstallAltCompiler();
     m_toolset.SetFlag("alt_empty", true);
-    const QString source = WorkPath(QStringLiteral("device.dso"));
-    const QString output = WorkPath(QStringLiteral("device.kar"));
+    const QString source = WorkPath(u"device.dso"_s);
+    const QString output = WorkPath(u"device.kar"_s);
     WriteFile(source, "<device/>");
 
     EXPECT_FALSE(m_harness.AltCompileResource(source, output));
@@ -145,8 +136,8 @@ TEST_F(HarnessCompileTest, AltCompileWithAnEmptyOutputFailsWithTheCommandAndTheT
 
 TEST_F(HarnessCompileTest, MissingOrUnstartableCompilersFailAtOnce)
 {
-    const QString source = WorkPath(QStringLiteral("strings.ksx"));
-    const QString output = WorkPath(QStringLiteral("out.kar"));
+    const QString source = WorkPath(u"strings.ksx"_s);
+    const QString output = WorkPath(u"out.kar"_s);
     WriteFile(source, "src");
     // A stale output from an earlier run must not pass for a compiled one.
     WriteFile(output, "stale");
@@ -156,8 +147,8 @@ TEST_F(HarnessCompileTest, MissingOrUnstartableCompilersFailAtOnce)
     EXPECT_FALSE(m_harness.CompileResource(source, output));
     EXPECT_FALSE(m_harness.AltCompileResource(source, output));
     EXPECT_EQ(m_log.Text(),
-              QStringLiteral("Device Pack Compiliation failed.\n\tCommand:\"%1\"-nh -o %2 %3\n\n")
-                  .arg(m_toolset.AltCompilerPath(), output, source));
+              u"Device Pack Compiliation failed.\n\tCommand:\"%1\"-nh -o %2 %3\n\n"_s.arg(m_toolset.AltCompilerPath(),
+                                                                                          output, source));
 
     // Present but not executable.
     WriteFile(m_toolset.CompilerPath(), "#!/bin/sh\necho Successfully compiled\n");

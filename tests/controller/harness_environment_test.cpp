@@ -6,6 +6,8 @@
 #include <QDateTime>
 #include <QUuid>
 
+using namespace Qt::StringLiterals;
+
 namespace {
 
 using harnesstest::CapturedLog;
@@ -27,7 +29,7 @@ const Env &EnvOf(const Harness &harness)
 class HarnessEnvironmentTest : public ::testing::Test
 {
 protected:
-    HarnessEnvironmentTest() : m_env("KESTIX_DATA_ROOT", m_root.filePath(QStringLiteral("data"))) {}
+    HarnessEnvironmentTest() : m_env("KESTIX_DATA_ROOT", m_root.filePath(u"data"_s)) {}
 
     void SetUp() override
     {
@@ -56,9 +58,9 @@ protected:
 TEST_F(HarnessEnvironmentTest, NewHarnessHoldsExactlyItsThreeEntries)
 {
     EXPECT_EQ(EnvOf(m_harness),
-              (Env{{QStringLiteral("DataCachePath"), TestDirectories::GetTestDataPath()},
-                   {QStringLiteral("KeyDevicePackSpecified"), QStringLiteral("false")},
-                   {QStringLiteral("TestDataSpecified"), QStringLiteral("false")}}));
+              (Env{{u"DataCachePath"_s, TestDirectories::GetTestDataPath()},
+                   {u"KeyDevicePackSpecified"_s, u"false"_s},
+                   {u"TestDataSpecified"_s, u"false"_s}}));
     EXPECT_TRUE(m_harness.GetTestkit().isEmpty());
     EXPECT_TRUE(m_harness.GetPlatform().isEmpty());
 }
@@ -66,19 +68,19 @@ TEST_F(HarnessEnvironmentTest, NewHarnessHoldsExactlyItsThreeEntries)
 TEST_F(HarnessEnvironmentTest, TestDataIsCompiledOnceUntilTheSourceIsTouched)
 {
     m_toolset.InstallCompiler();
-    const QString source = OldFile(QStringLiteral("data.kar"), "v1");
+    const QString source = OldFile(u"data.kar"_s, "v1");
 
     m_harness.SetTestData(source);
-    const QString cache = EnvOf(m_harness).value(QStringLiteral("TestDataCachePath"));
+    const QString cache = EnvOf(m_harness).value(u"TestDataCachePath"_s);
     EXPECT_EQ(cache, TestDirectories::GetTestDataCacheFilePath(StringHashName(source)));
     EXPECT_EQ(ReadFile(cache), QByteArray("compiled:\nv1"));
-    EXPECT_EQ(EnvOf(m_harness).value(QStringLiteral("TestDataSpecified")), QStringLiteral("true"));
+    EXPECT_EQ(EnvOf(m_harness).value(u"TestDataSpecified"_s), u"true"_s);
 
     m_harness.SetTestData(source);
     Harness other;
     other.SetTestData(source);
     EXPECT_EQ(m_toolset.Calls().size(), 1);
-    EXPECT_EQ(EnvOf(other).value(QStringLiteral("TestDataCachePath")), cache);
+    EXPECT_EQ(EnvOf(other).value(u"TestDataCachePath"_s), cache);
 
     WriteFile(source, "v2");
     SetModified(source, QFileInfo(cache).lastModified().addSecs(10));
@@ -91,12 +93,12 @@ TEST_F(HarnessEnvironmentTest, RelativeAndAbsolutePathsShareOneCache)
 {
     m_toolset.InstallCompiler();
     m_toolset.InstallAltCompiler();
-    const QString data = OldFile(QStringLiteral("sub/data.kar"), "data");
-    const QString pack = OldFile(QStringLiteral("sub/pack.dso"), "<device/>");
+    const QString data = OldFile(u"sub/data.kar"_s, "data");
+    const QString pack = OldFile(u"sub/pack.dso"_s, "<device/>");
     {
-        CurrentDirectory cwd(RootPath(QStringLiteral("sub")));
-        m_harness.SetTestData(QStringLiteral("../sub/./data.kar"));
-        m_harness.SetDPK(QStringLiteral("pack.dso"));
+        CurrentDirectory cwd(RootPath(u"sub"_s));
+        m_harness.SetTestData(u"../sub/./data.kar"_s);
+        m_harness.SetDPK(u"pack.dso"_s);
     }
     Harness other;
     other.SetTestData(data);
@@ -105,7 +107,7 @@ TEST_F(HarnessEnvironmentTest, RelativeAndAbsolutePathsShareOneCache)
     for (const char *key : {"TestDataCachePath", "DevicePack", "DevicePackCachePath"})
         EXPECT_EQ(EnvOf(m_harness).value(QLatin1String(key)), EnvOf(other).value(QLatin1String(key)))
             << key;
-    EXPECT_EQ(EnvOf(other).value(QStringLiteral("DevicePack")), pack);
+    EXPECT_EQ(EnvOf(other).value(u"DevicePack"_s), pack);
     // Each compiler ran once.
     EXPECT_EQ(m_toolset.Calls().size(), 2);
 }
@@ -113,14 +115,14 @@ TEST_F(HarnessEnvironmentTest, RelativeAndAbsolutePathsShareOneCache)
 TEST_F(HarnessEnvironmentTest, InvalidSourcesAreReportedAndChangeNothing)
 {
     const Env before = EnvOf(m_harness);
-    m_harness.SetTestData(RootPath(QStringLiteral("missing.kar")));
+    m_harness.SetTestData(RootPath(u"missing.kar"_s));
     m_harness.SetTestData(m_root.path());
     m_harness.SetDPK(QString());
     EXPECT_EQ(EnvOf(m_harness), before);
     EXPECT_EQ(m_log.Text(), QStringLiteral("Test data %1 is not valid.\n"
                                            "Test data %2 is not valid.\n"
                                            "DPK  is not valid.\n")
-                                .arg(RootPath(QStringLiteral("missing.kar")), m_root.path()));
+                                .arg(RootPath(u"missing.kar"_s), m_root.path()));
 }
 
 TEST_F(HarnessEnvironmentTest, FailedTestDataCompileDropsTheCacheEntryAndTriesAgainNextTime)
@@ -128,40 +130,40 @@ TEST_F(HarnessEnvironmentTest, FailedTestDataCompileDropsTheCacheEntryAndTriesAg
     m_toolset.InstallCompiler();
     m_toolset.SetFlag("compile_fails", true);
     // "%2" in a file name must not be taken for a placeholder.
-    const QString source = OldFile(QStringLiteral("data %2.kar"), "v1");
+    const QString source = OldFile(u"data %2.kar"_s, "v1");
     const QString cache = TestDirectories::GetTestDataCacheFilePath(StringHashName(source));
     // The failing compiler still writes its output file.
     Toolset::WriteScript(m_toolset.CompilerPath(), "#!/bin/sh\necho broken > \"$5\"\n");
 
     m_harness.SetTestData(source);
-    EXPECT_FALSE(EnvOf(m_harness).contains(QStringLiteral("TestDataCachePath")));
-    EXPECT_EQ(EnvOf(m_harness).value(QStringLiteral("TestDataSpecified")), QStringLiteral("true"));
+    EXPECT_FALSE(EnvOf(m_harness).contains(u"TestDataCachePath"_s));
+    EXPECT_EQ(EnvOf(m_harness).value(u"TestDataSpecified"_s), u"true"_s);
     EXPECT_EQ(m_log.Text(),
-              QStringLiteral("Resource Compile Error: %1 can not be compiled into %2.\n")
+              u"Resource Compile Error: %1 can not be compiled into %2.\n"_s
                   .arg(source, cache));
     EXPECT_FALSE(QFileInfo::exists(cache));
 
     m_toolset.InstallCompiler();
     m_toolset.SetFlag("compile_fails", false);
     m_harness.SetTestData(source);
-    EXPECT_EQ(EnvOf(m_harness).value(QStringLiteral("TestDataCachePath")), cache);
+    EXPECT_EQ(EnvOf(m_harness).value(u"TestDataCachePath"_s), cache);
     EXPECT_EQ(ReadFile(cache), QByteArray("compiled:\nv1"));
 }
 
 TEST_F(HarnessEnvironmentTest, DevicePackIsCompiledAndFlattened)
 {
     m_toolset.InstallAltCompiler();
-    const QString source = OldFile(QStringLiteral("device.dso"), "<device><a/></device>\n");
+    const QString source = OldFile(u"device.dso"_s, "<device><a/></device>\n");
     const QString key = StringHashName(source);
 
     m_harness.SetDPK(source);
     const Env &env = EnvOf(m_harness);
-    EXPECT_EQ(env.value(QStringLiteral("DevicePack")), source);
-    EXPECT_EQ(env.value(QStringLiteral("DevicePackCachePath")),
+    EXPECT_EQ(env.value(u"DevicePack"_s), source);
+    EXPECT_EQ(env.value(u"DevicePackCachePath"_s),
               TestDirectories::GetTestDataCacheFilePath(key));
     const QString dso = TestDirectories::GetDSOCacheFilePath(key);
-    EXPECT_EQ(env.value(QStringLiteral("DSOCacheFilePath")), dso);
-    EXPECT_EQ(env.value(QStringLiteral("KeyDevicePackSpecified")), QStringLiteral("true"));
+    EXPECT_EQ(env.value(u"DSOCacheFilePath"_s), dso);
+    EXPECT_EQ(env.value(u"KeyDevicePackSpecified"_s), u"true"_s);
     EXPECT_TRUE(ReadFile(dso).contains("<a/>"));
 
     // Both caches are fresh now: nothing is compiled or flattened again.
@@ -177,17 +179,17 @@ TEST_F(HarnessEnvironmentTest, DevicePackThatFailsKeepsItsOtherEntries)
     m_toolset.InstallAltCompiler();
     m_toolset.SetFlag("alt_empty", true);
     // Not XML: it cannot be flattened either, so the pack itself stands in.
-    const QString source = OldFile(QStringLiteral("device.dso"), "not xml <<<");
+    const QString source = OldFile(u"device.dso"_s, "not xml <<<");
     const QString cache = TestDirectories::GetTestDataCacheFilePath(StringHashName(source));
 
     m_harness.SetDPK(source);
     const Env &env = EnvOf(m_harness);
-    EXPECT_FALSE(env.contains(QStringLiteral("DevicePackCachePath")));
-    EXPECT_EQ(env.value(QStringLiteral("DevicePack")), source);
-    EXPECT_EQ(env.value(QStringLiteral("DSOCacheFilePath")), source);
-    EXPECT_EQ(env.value(QStringLiteral("KeyDevicePackSpecified")), QStringLiteral("true"));
+    EXPECT_FALSE(env.contains(u"DevicePackCachePath"_s));
+    EXPECT_EQ(env.value(u"DevicePack"_s), source);
+    EXPECT_EQ(env.value(u"DSOCacheFilePath"_s), source);
+    EXPECT_EQ(env.value(u"KeyDevicePackSpecified"_s), u"true"_s);
     EXPECT_TRUE(m_log.Text().endsWith(
-        QStringLiteral("Resource Compile Error: %1 can not be compiled into %2.\n").arg(source, cache)));
+        u"Resource Compile Error: %1 can not be compiled into %2.\n"_s.arg(source, cache)));
     // The empty file the compiler left is not taken for a fresh cache.
     EXPECT_FALSE(QFileInfo::exists(cache));
     m_harness.SetDPK(source);
@@ -205,15 +207,15 @@ protected:
         for (const char *dir : {"platforms/Alpha Pro", "platforms/Beta Pro", "platforms/Gamma",
                                 "kits/KitOne", "kits/KitTwo", "kits/Other"})
             ASSERT_TRUE(QDir().mkpath(RootPath(QLatin1String(dir))));
-        m_vars.Set("KESTIX_PLATFORMS_ALL", RootPath(QStringLiteral("platforms")));
-        m_vars.Set("KESTIX_PLATFORM", RootPath(QStringLiteral("platforms/Beta Pro/")));
-        m_vars.Set("KESTIX_TESTSETS_ALL", RootPath(QStringLiteral("kits")));
-        m_vars.Set("KESTIX_TESTSET", RootPath(QStringLiteral("kits/KitTwo")));
+        m_vars.Set("KESTIX_PLATFORMS_ALL", RootPath(u"platforms"_s));
+        m_vars.Set("KESTIX_PLATFORM", RootPath(u"platforms/Beta Pro/"_s));
+        m_vars.Set("KESTIX_TESTSETS_ALL", RootPath(u"kits"_s));
+        m_vars.Set("KESTIX_TESTSET", RootPath(u"kits/KitTwo"_s));
     }
-    QString Kit(const char *name) const { return RootPath(QStringLiteral("kits/") + QLatin1String(name)); }
+    QString Kit(const char *name) const { return RootPath(u"kits/"_s + QLatin1String(name)); }
     QString PlatformDir(const char *name) const
     {
-        return RootPath(QStringLiteral("platforms/") + QLatin1String(name) + QStringLiteral("/pvs/platform"));
+        return RootPath(u"platforms/"_s + QLatin1String(name) + u"/pvs/platform"_s);
     }
     bool RunSetup() { return HarnessTestAccess::SetupEnvironment(m_harness); }
 
@@ -226,13 +228,13 @@ TEST_F(HarnessSetupTest, WithNothingChosenTheDefaultKitAndPlatformAreUsed)
     EXPECT_EQ(m_harness.GetTestkit(), Kit("KitTwo"));
     EXPECT_EQ(m_harness.GetPlatform(), PlatformDir("Beta Pro"));
     EXPECT_FALSE(HarnessTestAccess::KitNotSelected(m_harness));
-    EXPECT_EQ(EnvOf(m_harness).value(QStringLiteral("PerlCache")), TestDirectories::GetOatPerlScripts());
-    EXPECT_EQ(m_log.Text(), QStringLiteral("KVK: %1Platform: %2").arg(Kit("KitTwo"), PlatformDir("Beta Pro")));
+    EXPECT_EQ(EnvOf(m_harness).value(u"PerlCache"_s), TestDirectories::GetOatPerlScripts());
+    EXPECT_EQ(m_log.Text(), u"KVK: %1Platform: %2"_s.arg(Kit("KitTwo"), PlatformDir("Beta Pro")));
 }
 
 TEST_F(HarnessSetupTest, OnlyAPlatformLoadsTheDefaultKitAsNotSelected)
 {
-    m_harness.SetPlatform(QStringLiteral("ALPHA"));
+    m_harness.SetPlatform(u"ALPHA"_s);
     ASSERT_TRUE(RunSetup());
     EXPECT_EQ(m_harness.GetTestkit(), Kit("KitTwo"));
     EXPECT_EQ(m_harness.GetPlatform(), PlatformDir("Alpha Pro"));
@@ -240,14 +242,14 @@ TEST_F(HarnessSetupTest, OnlyAPlatformLoadsTheDefaultKitAsNotSelected)
 
     // Setting up again after an unrelated change neither selects the kit nor
     // nests the platform folder a second time.
-    m_harness.SetFamily(QStringLiteral("family"), QString());
+    m_harness.SetFamily(u"family"_s, QString());
     ASSERT_FALSE(HarnessTestAccess::EnvironmentReady(m_harness));
     ASSERT_TRUE(RunSetup());
     EXPECT_TRUE(HarnessTestAccess::KitNotSelected(m_harness));
     EXPECT_EQ(m_harness.GetPlatform(), PlatformDir("Alpha Pro"));
 
     // A kit chosen by the host is selected.
-    m_harness.SetTestkit(QStringLiteral("other"));
+    m_harness.SetTestkit(u"other"_s);
     ASSERT_TRUE(RunSetup());
     EXPECT_EQ(m_harness.GetTestkit(), Kit("Other"));
     EXPECT_FALSE(HarnessTestAccess::KitNotSelected(m_harness));
@@ -255,9 +257,9 @@ TEST_F(HarnessSetupTest, OnlyAPlatformLoadsTheDefaultKitAsNotSelected)
 
 TEST_F(HarnessSetupTest, KitAndPlatformNamesMatchTheFirstListedEntry)
 {
-    m_harness.SetTestkit(QStringLiteral("Kit"));
+    m_harness.SetTestkit(u"Kit"_s);
     // "Gamma" is not a professional platform, so it cannot be chosen.
-    m_harness.SetPlatform(QStringLiteral("a"));
+    m_harness.SetPlatform(u"a"_s);
     ASSERT_TRUE(RunSetup());
     EXPECT_EQ(m_harness.GetTestkit(), Kit("KitOne"));
     EXPECT_EQ(m_harness.GetPlatform(), PlatformDir("Alpha Pro"));
@@ -266,45 +268,45 @@ TEST_F(HarnessSetupTest, KitAndPlatformNamesMatchTheFirstListedEntry)
 TEST_F(HarnessSetupTest, PathsThatMatchNoNameAreMadeAbsolute)
 {
     CurrentDirectory cwd(m_root.path());
-    m_harness.SetTestkit(QStringLiteral("elsewhere/kit"));
-    m_harness.SetPlatform(QStringLiteral("sdk/../sdk/p"));
+    m_harness.SetTestkit(u"elsewhere/kit"_s);
+    m_harness.SetPlatform(u"sdk/../sdk/p"_s);
     ASSERT_TRUE(RunSetup());
-    EXPECT_EQ(m_harness.GetTestkit(), RootPath(QStringLiteral("elsewhere/kit")));
-    EXPECT_EQ(m_harness.GetPlatform(), RootPath(QStringLiteral("sdk/p/pvs/platform")));
+    EXPECT_EQ(m_harness.GetTestkit(), RootPath(u"elsewhere/kit"_s));
+    EXPECT_EQ(m_harness.GetPlatform(), RootPath(u"sdk/p/pvs/platform"_s));
 }
 
 TEST_F(HarnessSetupTest, TheRunIdentifierLastsUntilTheKitChanges)
 {
     ASSERT_TRUE(RunSetup());
-    const QString runId = EnvOf(m_harness).value(QStringLiteral("TestRunID"));
+    const QString runId = EnvOf(m_harness).value(u"TestRunID"_s);
     EXPECT_FALSE(QUuid::fromString(runId).isNull());
-    EXPECT_TRUE(runId.startsWith(QLatin1Char('{')) && runId.endsWith(QLatin1Char('}')));
+    EXPECT_TRUE(runId.startsWith(u'{') && runId.endsWith(u'}'));
 
     ASSERT_TRUE(RunSetup());
-    EXPECT_EQ(EnvOf(m_harness).value(QStringLiteral("TestRunID")), runId);
+    EXPECT_EQ(EnvOf(m_harness).value(u"TestRunID"_s), runId);
 
-    m_harness.SetTestkit(QStringLiteral("KitOne"));
+    m_harness.SetTestkit(u"KitOne"_s);
     ASSERT_TRUE(RunSetup());
-    EXPECT_NE(EnvOf(m_harness).value(QStringLiteral("TestRunID")), runId);
+    EXPECT_NE(EnvOf(m_harness).value(u"TestRunID"_s), runId);
 }
 
 TEST_F(HarnessSetupTest, WithoutAnyKitSetupFails)
 {
-    m_vars.Set("KESTIX_TESTSETS_ALL", RootPath(QStringLiteral("nokits")));
-    m_harness.SetPlatform(QStringLiteral("beta"));
+    m_vars.Set("KESTIX_TESTSETS_ALL", RootPath(u"nokits"_s));
+    m_harness.SetPlatform(u"beta"_s);
     EXPECT_FALSE(RunSetup());
-    EXPECT_EQ(m_log.Text(), QStringLiteral("KVK not found.  A Kesto Validation Kit is required"));
+    EXPECT_EQ(m_log.Text(), u"KVK not found.  A Kesto Validation Kit is required"_s);
     EXPECT_FALSE(HarnessTestAccess::EnvironmentReady(m_harness));
 }
 
 TEST_F(HarnessSetupTest, UnresolvedDefaultsAreReportedButDoNotFail)
 {
-    m_vars.Set("KESTIX_TESTSET", RootPath(QStringLiteral("kits/NotInstalled")));
+    m_vars.Set("KESTIX_TESTSET", RootPath(u"kits/NotInstalled"_s));
     m_vars.Unset("KESTIX_PLATFORM");
     ASSERT_TRUE(RunSetup());
-    EXPECT_EQ(m_harness.GetTestkit(), QStringLiteral("*"));
-    EXPECT_EQ(m_harness.GetPlatform(), QStringLiteral("*"));
-    EXPECT_EQ(m_log.Text(), QStringLiteral("Default KVK not foundDefault platform not found"));
+    EXPECT_EQ(m_harness.GetTestkit(), u"*"_s);
+    EXPECT_EQ(m_harness.GetPlatform(), u"*"_s);
+    EXPECT_EQ(m_log.Text(), u"Default KVK not foundDefault platform not found"_s);
 }
 
 } // namespace

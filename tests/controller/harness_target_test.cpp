@@ -1,14 +1,13 @@
 #include "harnesstest.h"
 
-#include "support/handsetfixture.h"
 
 #include "environment/testdirectories.h"
 
+using namespace Qt::StringLiterals;
 
 namespace {
 
 using harnesstest::CapturedLog;
-using testutil::EnvGuard;
 using testutil::ReadFile;
 using testutil::WriteFile;
 
@@ -16,21 +15,17 @@ using testutil::WriteFile;
 class HarnessTargetTest : public ::testing::Test
 {
 protected:
-    HarnessTargetTest() : m_env("KESTIX_DATA_ROOT", m_handsets.WorkFolder() + QStringLiteral("/data")) {}
     void SetUp() override { m_harness.SetLogger(m_log.log()); }
     void TearDown() override { m_harness.DisconnectTarget(); }
 
     QString HandsetFolder(const QString &name) const { return m_handsets.HandsetFolder(name); }
-    QString WorkPath(const QString &name) const
+    QString WorkPath(const QString &name) const { return m_handsets.WorkFolder() + u'/' + name; }
+    void AddHandset(const QString &name, const QString &description, const QString &version = QString(),
+                    bool offline = false)
     {
-        return m_handsets.WorkFolder() + QLatin1Char('/') + name;
-    }
-    void AddHandset(const QString &name, const QString &description,
-                    const QString &version = QString(), bool offline = false)
-    {
-        m_handsets.AddHandset(name, description, QStringLiteral("arm"), version);
+        m_handsets.AddHandset(name, description, u"arm"_s, version);
         if (offline)
-            WriteFile(HandsetFolder(name) + QStringLiteral("/offline"), QByteArray());
+            WriteFile(HandsetFolder(name) + u"/offline"_s, QByteArray());
     }
     QString Connected() const
     {
@@ -39,8 +34,8 @@ protected:
     }
     const QMap<QString, QString> &Env() const { return HarnessTestAccess::Environment(m_harness); }
 
-    testutil::HandsetFixture m_handsets;
-    EnvGuard m_env;
+    testutil::KitRun m_run;
+    testutil::HandsetFixture &m_handsets = m_run.Handsets();
     CapturedLog m_log;
     Harness m_harness;
 };
@@ -51,156 +46,146 @@ struct MatchCase
     const char *expected;
 };
 
-class HarnessTargetMatchTest : public HarnessTargetTest,
-                               public ::testing::WithParamInterface<MatchCase>
+class HarnessTargetMatchTest : public HarnessTargetTest, public ::testing::WithParamInterface<MatchCase>
 {
 };
 
 TEST_P(HarnessTargetMatchTest, ConnectsToTheFirstTargetWhoseNameOrDescriptionContainsTheRequest)
 {
-    AddHandset(QStringLiteral("Alpha-1234"), QStringLiteral("Kesto Phone Red"));
-    AddHandset(QStringLiteral("Beta-5678"), QStringLiteral("Kesto Phone Blue"));
-    AddHandset(QStringLiteral("Gamma-9012"), QStringLiteral("Tablet"));
+    AddHandset(u"Alpha-1234"_s, u"Kesto Phone Red"_s);
+    AddHandset(u"Beta-5678"_s, u"Kesto Phone Blue"_s);
+    AddHandset(u"Gamma-9012"_s, u"Tablet"_s);
 
     ASSERT_TRUE(m_harness.ConnectToTarget(QString::fromLatin1(GetParam().request)));
     EXPECT_EQ(Connected(), QLatin1String(GetParam().expected));
-    EXPECT_EQ(m_log.Text(), QStringLiteral("Connected to target: %1").arg(Connected()));
+    EXPECT_EQ(m_log.Text(), u"Connected to target: %1"_s.arg(Connected()));
 }
 
 INSTANTIATE_TEST_SUITE_P(Requests, HarnessTargetMatchTest,
-                         ::testing::Values(MatchCase{"5678", "Beta-5678"},
-                                           MatchCase{"bEtA", "Beta-5678"},
-                                           MatchCase{"BLUE", "Beta-5678"},
-                                           MatchCase{"phone", "Alpha-1234"},
-                                           MatchCase{"tab", "Gamma-9012"},
-                                           MatchCase{"", "Alpha-1234"}));
+                         ::testing::Values(MatchCase{"5678", "Beta-5678"}, MatchCase{"bEtA", "Beta-5678"},
+                                           MatchCase{"BLUE", "Beta-5678"}, MatchCase{"phone", "Alpha-1234"},
+                                           MatchCase{"tab", "Gamma-9012"}, MatchCase{"", "Alpha-1234"}));
 
 TEST_F(HarnessTargetTest, AnEmptyRequestUsesTheStoredTarget)
 {
-    AddHandset(QStringLiteral("Alpha-1234"), QStringLiteral("one"));
-    AddHandset(QStringLiteral("Beta-5678"), QStringLiteral("two"));
-    m_harness.SetTarget(QStringLiteral("TWO"));
+    AddHandset(u"Alpha-1234"_s, u"one"_s);
+    AddHandset(u"Beta-5678"_s, u"two"_s);
+    m_harness.SetTarget(u"TWO"_s);
     ASSERT_TRUE(m_harness.ConnectToTarget(QString()));
-    EXPECT_EQ(Connected(), QStringLiteral("Beta-5678"));
+    EXPECT_EQ(Connected(), u"Beta-5678"_s);
 }
 
 TEST_F(HarnessTargetTest, AMatchThatDoesNotConnectGivesWayToTheNextMatch)
 {
-    AddHandset(QStringLiteral("Alpha-1234"), QStringLiteral("Kesto Phone"), QString(), true);
-    AddHandset(QStringLiteral("Beta-5678"), QStringLiteral("Kesto Phone"));
+    AddHandset(u"Alpha-1234"_s, u"Kesto Phone"_s, QString(), true);
+    AddHandset(u"Beta-5678"_s, u"Kesto Phone"_s);
 
-    ASSERT_TRUE(m_harness.ConnectToTarget(QStringLiteral("kesto")));
-    EXPECT_EQ(Connected(), QStringLiteral("Beta-5678"));
+    ASSERT_TRUE(m_harness.ConnectToTarget(u"kesto"_s));
+    EXPECT_EQ(Connected(), u"Beta-5678"_s);
     const QString log = m_log.Text();
-    EXPECT_TRUE(log.contains(QStringLiteral("Gateway could not connect to device Alpha-1234.")));
-    EXPECT_TRUE(log.endsWith(QStringLiteral("Connected to target: Beta-5678")));
+    EXPECT_TRUE(log.contains(u"Gateway could not connect to device Alpha-1234."_s));
+    EXPECT_TRUE(log.endsWith(u"Connected to target: Beta-5678"_s));
 
     // While connected every request is satisfied by the open connection.
-    EXPECT_TRUE(m_harness.ConnectToTarget(QStringLiteral("no such handset")));
-    EXPECT_EQ(Connected(), QStringLiteral("Beta-5678"));
+    EXPECT_TRUE(m_harness.ConnectToTarget(u"no such handset"_s));
+    EXPECT_EQ(Connected(), u"Beta-5678"_s);
 }
 
 TEST_F(HarnessTargetTest, NoMatchingHandsetNamesTheStoredTarget)
 {
-    m_harness.SetTarget(QStringLiteral("Delta"));
+    m_harness.SetTarget(u"Delta"_s);
     EXPECT_FALSE(m_harness.IsTargetAvailable());
-    EXPECT_FALSE(m_harness.ConnectToTarget(QStringLiteral("other")));
+    EXPECT_FALSE(m_harness.ConnectToTarget(u"other"_s));
     EXPECT_TRUE(m_harness.GetDefaultLogFilePath().isEmpty());
-    EXPECT_FALSE(m_harness.CopyFileFromDevice(QStringLiteral("fs:/a.txt"),
-                                              WorkPath(QStringLiteral("a.txt"))));
-    EXPECT_EQ(m_log.Text(), QStringLiteral("Target Delta not found.").repeated(3));
+    EXPECT_FALSE(m_harness.CopyFileFromDevice(u"fs:/a.txt"_s, WorkPath(u"a.txt"_s)));
+    EXPECT_EQ(m_log.Text(), u"Target Delta not found."_s.repeated(3));
 
-    AddHandset(QStringLiteral("Alpha-1234"), QStringLiteral("Phone"), QString(), true);
+    AddHandset(u"Alpha-1234"_s, u"Phone"_s, QString(), true);
     EXPECT_TRUE(m_harness.IsTargetAvailable());
-    EXPECT_FALSE(m_harness.ConnectToTarget(QStringLiteral("alpha")));
-    EXPECT_TRUE(m_log.Text().endsWith(QStringLiteral("Target Delta not found.")));
+    EXPECT_FALSE(m_harness.ConnectToTarget(u"alpha"_s));
+    EXPECT_TRUE(m_log.Text().endsWith(u"Target Delta not found."_s));
     EXPECT_EQ(HarnessTestAccess::Device(m_harness), nullptr);
 }
 
 TEST_F(HarnessTargetTest, ConnectingFillsTheHandsetEntriesOfTheEnvironment)
 {
-    AddHandset(QStringLiteral("My Phone:1"), QStringLiteral("Phone"), QStringLiteral("Kesto 4.2"));
-    AddHandset(QStringLiteral("Other"), QStringLiteral("Other"));
+    AddHandset(u"My Phone:1"_s, u"Phone"_s, u"Kesto 4.2"_s);
+    AddHandset(u"Other"_s, u"Other"_s);
 
-    EXPECT_EQ(m_harness.GetDefaultLogFilePath(), TestDirectories::GetLogDirectory(QStringLiteral("My Phone:1")));
-    EXPECT_EQ(Env().value(QStringLiteral("LogPath")),
-              TestDirectories::GetLogDirectory(QStringLiteral("My Phone:1")));
-    EXPECT_EQ(Env().value(QStringLiteral("ProcessedResultsPath")),
-              TestDirectories::GetProcessResultsPath(QStringLiteral("My Phone:1")));
-    EXPECT_EQ(Env().value(QStringLiteral("KestoVersion")), QStringLiteral("Kesto 4.2"));
+    EXPECT_EQ(m_harness.GetDefaultLogFilePath(), TestDirectories::GetLogDirectory(u"My Phone:1"_s));
+    EXPECT_EQ(Env().value(u"LogPath"_s), TestDirectories::GetLogDirectory(u"My Phone:1"_s));
+    EXPECT_EQ(Env().value(u"ProcessedResultsPath"_s), TestDirectories::GetProcessResultsPath(u"My Phone:1"_s));
+    EXPECT_EQ(Env().value(u"KestoVersion"_s), u"Kesto 4.2"_s);
 
     // The defaults are set once; another handset later keeps them.
-    m_harness.SetTarget(QStringLiteral("other"));
+    m_harness.SetTarget(u"other"_s);
     EXPECT_TRUE(m_harness.ConnectToTarget(QString()));
-    EXPECT_EQ(Connected(), QStringLiteral("Other"));
-    EXPECT_EQ(Env().value(QStringLiteral("LogPath")),
-              TestDirectories::GetLogDirectory(QStringLiteral("My Phone:1")));
-    EXPECT_EQ(Env().value(QStringLiteral("KestoVersion")), QStringLiteral("Kesto 4.2"));
+    EXPECT_EQ(Connected(), u"Other"_s);
+    EXPECT_EQ(Env().value(u"LogPath"_s), TestDirectories::GetLogDirectory(u"My Phone:1"_s));
+    EXPECT_EQ(Env().value(u"KestoVersion"_s), u"Kesto 4.2"_s);
 }
 
 TEST_F(HarnessTargetTest, LogOutputPathSetBeforeConnectingIsKept)
 {
-    AddHandset(QStringLiteral("Alpha"), QStringLiteral("Phone"));
-    const QString logs = WorkPath(QStringLiteral("my logs"));
+    AddHandset(u"Alpha"_s, u"Phone"_s);
+    const QString logs = WorkPath(u"my logs"_s);
     m_harness.SetLogOutputPath(logs);
     ASSERT_TRUE(m_harness.ConnectToTarget(QString()));
-    EXPECT_EQ(Env().value(QStringLiteral("LogPath")), logs);
-    EXPECT_TRUE(Env().contains(QStringLiteral("ProcessedResultsPath")));
+    EXPECT_EQ(Env().value(u"LogPath"_s), logs);
+    EXPECT_TRUE(Env().contains(u"ProcessedResultsPath"_s));
     // A handset without a version text adds none.
-    EXPECT_FALSE(Env().contains(QStringLiteral("KestoVersion")));
+    EXPECT_FALSE(Env().contains(u"KestoVersion"_s));
 }
 
 TEST_F(HarnessTargetTest, SetTargetKeepsTheConnectionForTheSameNameAndDropsItForANewOne)
 {
-    AddHandset(QStringLiteral("Alpha"), QStringLiteral("Phone"));
-    AddHandset(QStringLiteral("Beta"), QStringLiteral("Phone"));
-    WriteFile(HandsetFolder(QStringLiteral("Beta")) + QStringLiteral("/fs/logs/run.log"), "beta log");
+    AddHandset(u"Alpha"_s, u"Phone"_s);
+    AddHandset(u"Beta"_s, u"Phone"_s);
+    WriteFile(HandsetFolder(u"Beta"_s) + u"/fs/logs/run.log"_s, "beta log");
 
-    m_harness.SetTarget(QStringLiteral("alpha"));
+    m_harness.SetTarget(u"alpha"_s);
     ASSERT_TRUE(m_harness.ConnectToTarget(QString()));
     const IKestoDevice *first = HarnessTestAccess::Device(m_harness);
-    m_harness.SetTarget(QStringLiteral("alpha"));
+    m_harness.SetTarget(u"alpha"_s);
     m_harness.SetTarget(QString());
     EXPECT_EQ(HarnessTestAccess::Device(m_harness), first);
-    EXPECT_EQ(HarnessTestAccess::Target(m_harness), QStringLiteral("alpha"));
+    EXPECT_EQ(HarnessTestAccess::Target(m_harness), u"alpha"_s);
 
-    m_harness.SetTarget(QStringLiteral("beta"));
+    m_harness.SetTarget(u"beta"_s);
     EXPECT_EQ(HarnessTestAccess::Device(m_harness), nullptr);
     // The next operation connects to the new handset.
-    const QString host = WorkPath(QStringLiteral("copied.log"));
-    EXPECT_TRUE(m_harness.CopyFileFromDevice(QStringLiteral("fs:/logs/run.log"), host));
-    EXPECT_EQ(Connected(), QStringLiteral("Beta"));
+    const QString host = WorkPath(u"copied.log"_s);
+    EXPECT_TRUE(m_harness.CopyFileFromDevice(u"fs:/logs/run.log"_s, host));
+    EXPECT_EQ(Connected(), u"Beta"_s);
     EXPECT_EQ(ReadFile(host), QByteArray("beta log"));
-    EXPECT_FALSE(m_harness.CopyFileFromDevice(QStringLiteral("fs:/logs/missing.log"), host));
+    EXPECT_FALSE(m_harness.CopyFileFromDevice(u"fs:/logs/missing.log"_s, host));
 }
 
 TEST_F(HarnessTargetTest, DisconnectAllowsConnectingElsewhere)
 {
-    AddHandset(QStringLiteral("Alpha"), QStringLiteral("Phone"));
-    AddHandset(QStringLiteral("Beta"), QStringLiteral("Phone"));
-    ASSERT_TRUE(m_harness.ConnectToTarget(QStringLiteral("alpha")));
+    AddHandset(u"Alpha"_s, u"Phone"_s);
+    AddHandset(u"Beta"_s, u"Phone"_s);
+    ASSERT_TRUE(m_harness.ConnectToTarget(u"alpha"_s));
     m_harness.DisconnectTarget();
     EXPECT_EQ(HarnessTestAccess::Device(m_harness), nullptr);
     m_harness.DisconnectTarget();
-    ASSERT_TRUE(m_harness.ConnectToTarget(QStringLiteral("beta")));
-    EXPECT_EQ(Connected(), QStringLiteral("Beta"));
+    ASSERT_TRUE(m_harness.ConnectToTarget(u"beta"_s));
+    EXPECT_EQ(Connected(), u"Beta"_s);
 
-    QList<ConnectTarget> targets{ConnectTarget(QStringLiteral("stale"), QString())};
+    QList<ConnectTarget> targets{ConnectTarget(u"stale"_s, QString())};
     EXPECT_EQ(Harness::ListTargets(targets), 2u);
     EXPECT_EQ(targets.size(), 2);
-    EXPECT_EQ(targets.first().name, QStringLiteral("Alpha"));
+    EXPECT_EQ(targets.first().name, u"Alpha"_s);
 }
 
 TEST(HarnessConfiguration, CopyDelayTakesUnsigned32BitDecimalsOnly)
 {
-    const QList<QPair<QString, quint32>> cases{
-        {QStringLiteral("1500"), 1500u},     {QStringLiteral("abc"), 0u},
-        {QStringLiteral("0x10"), 0u},        {QStringLiteral("-1"), 0u},
-        {QString(), 0u},                     {QStringLiteral("4294967295"), 4294967295u},
-        {QStringLiteral("4294967296"), 0u},  {QStringLiteral("12abc"), 0u}};
+    const QList<QPair<QString, quint32>> cases{{u"1500"_s, 1500u},    {u"abc"_s, 0u},  {u"0x10"_s, 0u},
+                                               {u"-1"_s, 0u},         {QString(), 0u}, {u"4294967295"_s, 4294967295u},
+                                               {u"4294967296"_s, 0u}, {u"12abc"_s, 0u}};
     Harness harness;
     for (const auto &[text, expected] : cases) {
-        harness.SetCopyDelay(QStringLiteral("7"));
+        harness.SetCopyDelay(u"7"_s);
         harness.SetCopyDelay(text);
         EXPECT_EQ(HarnessTestAccess::CopyDelay(harness), expected) << text.toStdString();
     }
@@ -209,12 +194,12 @@ TEST(HarnessConfiguration, CopyDelayTakesUnsigned32BitDecimalsOnly)
 TEST(HarnessConfiguration, EmptyOrUnchangedKitAndPlatformChangeNothing)
 {
     Harness harness;
-    harness.SetTestkit(QStringLiteral("kit"));
-    harness.SetPlatform(QStringLiteral("platform"));
+    harness.SetTestkit(u"kit"_s);
+    harness.SetPlatform(u"platform"_s);
     harness.SetTestkit(QString());
     harness.SetPlatform(QString());
-    EXPECT_EQ(harness.GetTestkit(), QStringLiteral("kit"));
-    EXPECT_EQ(harness.GetPlatform(), QStringLiteral("platform"));
+    EXPECT_EQ(harness.GetTestkit(), u"kit"_s);
+    EXPECT_EQ(harness.GetPlatform(), u"platform"_s);
 }
 
 } // namespace

@@ -7,7 +7,7 @@
 #include "controller/harness.h"
 #include "log/log.h"
 
-#include "support/testutil.h"
+#include "support/kitrun.h"
 
 #include <QDir>
 #include <QFile>
@@ -16,16 +16,15 @@
 
 #include <gtest/gtest.h>
 
+using namespace Qt::StringLiterals;
+
 // The Harness befriends this class so that tests can reach its private
 // operations and fields.
 class HarnessTestAccess
 {
 public:
     static bool SetupEnvironment(Harness &harness) { return harness.SetupEnvironment(); }
-    static const QMap<QString, QString> &Environment(const Harness &harness)
-    {
-        return harness.m_environment;
-    }
+    static const QMap<QString, QString> &Environment(const Harness &harness) { return harness.m_environment; }
     static quint32 CopyDelay(const Harness &harness) { return harness.m_copyDelay; }
     static bool KitNotSelected(const Harness &harness) { return harness.m_kitNotSelected; }
     static bool EnvironmentReady(const Harness &harness) { return harness.m_environmentReady; }
@@ -35,21 +34,7 @@ public:
 
 namespace harnesstest {
 
-// A log file of its own in a temporary folder.
-class CapturedLog
-{
-public:
-    CapturedLog() { m_log.SetLogPath(m_dir.filePath(QStringLiteral("log.txt"))); }
-    Log *log() { return &m_log; }
-    QString Text() const
-    {
-        return QString::fromLatin1(testutil::ReadFile(m_dir.filePath(QStringLiteral("log.txt"))));
-    }
-
-private:
-    QTemporaryDir m_dir;
-    Log m_log;
-};
+using testutil::CapturedLog;
 
 // A temporary toolset named by KESTIX_TOOLSET, whose resource compilers are
 // shell scripts. Every call of a stand-in appends its arguments, one per
@@ -57,14 +42,14 @@ private:
 class Toolset
 {
 public:
-    Toolset() : m_env("KESTIX_TOOLSET", m_dir.path()) {}
+    Toolset()
+        : m_env("KESTIX_TOOLSET", m_dir.path())
+    {
+    }
 
     QString Path() const { return m_dir.path(); }
-    QString CompilerPath() const { return m_dir.filePath(QStringLiteral("bin/kestormc.exe")); }
-    QString AltCompilerPath() const
-    {
-        return m_dir.filePath(QStringLiteral("bin/deprecated/ResourceEditor/kestorc.exe"));
-    }
+    QString CompilerPath() const { return m_dir.filePath(u"bin/kestormc.exe"_s); }
+    QString AltCompilerPath() const { return m_dir.filePath(u"bin/deprecated/ResourceEditor/kestorc.exe"_s); }
 
     // kestormc: "-convert" copies the input to the output and reports it
     // unless the toolset holds "convert_fails"; "-compile" writes "compiled:"
@@ -88,10 +73,9 @@ public:
     {
         QList<QStringList> calls;
         QStringList current;
-        const QString text =
-            QString::fromLocal8Bit(testutil::ReadFile(m_dir.filePath(QStringLiteral("calls.txt"))));
-        for (const QString &line : text.split(QLatin1Char('\n'))) {
-            if (line == QLatin1String("--")) {
+        const QString text = QString::fromLocal8Bit(testutil::ReadFile(m_dir.filePath(u"calls.txt"_s)));
+        for (const QString &line : text.split(u'\n')) {
+            if (line == u"--"_s) {
                 calls.append(current);
                 current.clear();
             } else if (!line.isEmpty()) {
@@ -104,8 +88,7 @@ public:
     static void WriteScript(const QString &path, const char *script)
     {
         testutil::WriteFile(path, QByteArray(script));
-        QFile::setPermissions(path, QFileDevice::ReadOwner | QFileDevice::WriteOwner
-                                        | QFileDevice::ExeOwner);
+        QFile::setPermissions(path, QFileDevice::ReadOwner | QFileDevice::WriteOwner | QFileDevice::ExeOwner);
     }
 
 private:

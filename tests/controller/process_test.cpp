@@ -4,6 +4,8 @@
 
 #include <QDir>
 
+using namespace Qt::StringLiterals;
+
 namespace {
 
 using controllertest::CatalogueModule;
@@ -24,8 +26,9 @@ QByteArray CtfLog(const char *suite, const QList<QPair<const char *, const char 
 
 QByteArray UtLog(const char *suite, const QList<QPair<const char *, const char *>> &rows)
 {
-    QByteArray log = "SuiteName: UT" + QByteArray(suite) + " 10:00:00 03-Dec-2026\n"
-                     "Case Result Time Note\n----\n";
+    QByteArray log = "SuiteName: UT" + QByteArray(suite)
+        + " 10:00:00 03-Dec-2026\n"
+          "Case Result Time Note\n----\n";
     for (const auto &row : rows)
         log += QByteArray(row.first) + " " + row.second + " 1 ok\n";
     return log + "----\nElapsed Time: 3\n";
@@ -37,34 +40,30 @@ protected:
     void SetUp() override
     {
         ASSERT_TRUE(m_dir.isValid());
-        m_kit = MakeCatalogue(
-            m_dir.filePath(QStringLiteral("kit")), false,
-            {CatalogueModule(QStringLiteral("Audio"), QStringLiteral("#101"),
-                             {QStringLiteral("a"), QStringLiteral("b"), QStringLiteral("c")}),
-             CatalogueModule(QStringLiteral("Menu"), QStringLiteral("#102"),
-                             {QStringLiteral("m1"), QStringLiteral("m2")}, QString(),
-                             QStringLiteral("uitf"))});
-        m_platform = MakeCatalogue(m_dir.filePath(QStringLiteral("platform")), true, {});
+        m_kit = MakeCatalogue(m_dir.filePath(u"kit"_s), false,
+                              {CatalogueModule(u"Audio"_s, u"#101"_s, {u"a"_s, u"b"_s, u"c"_s}),
+                               CatalogueModule(u"Menu"_s, u"#102"_s, {u"m1"_s, u"m2"_s}, QString(), u"uitf"_s)});
+        m_platform = MakeCatalogue(m_dir.filePath(u"platform"_s), true, {});
 
         // The saved tree; the folders of raw OAT logs and of results hold
         // logs that must not be read.
-        Log(QStringLiteral("audio-ctf-2026-12-03.log"),
-            CtfLog("Audio", {{"a", "Fail"}, {"b", "Fail"}}));
-        Log(QStringLiteral("menu-2026-12-03.txt"), UtLog("Menu", {{"m1", "PASS"}, {"m2", "FAIL"}}));
-        Log(QStringLiteral("readme.dat"), "Suite: Audio\n");
-        Log(QStringLiteral("b-run/audio-ctf-2026-12-04.log"),
+        Log(u"audio-ctf-2026-12-03.log"_s, CtfLog("Audio", {{"a", "Fail"}, {"b", "Fail"}}));
+        Log(u"menu-2026-12-03.txt"_s, UtLog("Menu", {{"m1", "PASS"}, {"m2", "FAIL"}}));
+        Log(u"readme.dat"_s, "Suite: Audio\n");
+        Log(u"b-run/audio-ctf-2026-12-04.log"_s,
             CtfLog("Audio", {{"a", "Pass"}, {"b", "Unsupported"}, {"c.1", "Fail"}}));
-        Log(QStringLiteral("b-run/deeper/ghost-ctf-1.log"), CtfLog("Ghost", {{"g", "Pass"}}));
-        Log(QStringLiteral("a-run/menu-2026-12-05.txt"), UtLog("Menu", {{"m2", "PASS"}}));
-        Log(QStringLiteral("oatRawLogs/trap-ctf-1.log"), CtfLog("Audio", {{"trap", "Pass"}}));
-        Log(QStringLiteral("ProcessedResults/trap-ctf-2.log"), CtfLog("Audio", {{"trap", "Pass"}}));
+        Log(u"b-run/deeper/ghost-ctf-1.log"_s, CtfLog("Ghost", {{"g", "Pass"}}));
+        Log(u"a-run/menu-2026-12-05.txt"_s, UtLog("Menu", {{"m2", "PASS"}}));
+        Log(u"oatRawLogs/trap-ctf-1.log"_s, CtfLog("Audio", {{"trap", "Pass"}}));
+        Log(u"ProcessedResults/trap-ctf-2.log"_s, CtfLog("Audio", {{"trap", "Pass"}}));
+        Prepare(m_harness, m_log);
     }
 
     void Log(const QString &relative, const QByteArray &content)
     {
-        WriteFile(m_dir.filePath(QStringLiteral("logs/") + relative), content);
+        WriteFile(m_dir.filePath(u"logs/"_s + relative), content);
     }
-    QString LogFolder() const { return m_dir.filePath(QStringLiteral("logs")); }
+    QString LogFolder() const { return m_dir.filePath(u"logs"_s); }
 
     void Prepare(Harness &harness, CapturedLog &log)
     {
@@ -76,73 +75,67 @@ protected:
     QTemporaryDir m_dir;
     QSharedPointer<Manifest> m_kit;
     QSharedPointer<Manifest> m_platform;
+    // Set up for the saved tree.
+    CapturedLog m_log;
+    Harness m_harness;
 };
 
 TEST_F(ProcessTest, WholeTreeFeedsOneResultsFileWithIndentedMessages)
 {
-    CapturedLog log;
-    Harness harness;
-    Prepare(harness, log);
-    ASSERT_TRUE(harness.Process(0));
+    ASSERT_TRUE(m_harness.Process(0));
 
-    const QString results = LogFolder() + QStringLiteral("/ProcessedResults/ProcessedResults.xml");
-    auto &env = HarnessControllerAccess::Environment(harness);
-    EXPECT_EQ(env.value(QStringLiteral("ProcessedResultsPath")), results);
-    EXPECT_EQ(env.value(QStringLiteral("LogPath")), LogFolder());
+    const QString results = LogFolder() + u"/ProcessedResults/ProcessedResults.xml"_s;
+    auto &env = HarnessControllerAccess::Environment(m_harness);
+    EXPECT_EQ(env.value(u"ProcessedResultsPath"_s), results);
+    EXPECT_EQ(env.value(u"LogPath"_s), LogFolder());
     const ResultsView view = ReadResults(results);
     ASSERT_TRUE(view.ok);
     EXPECT_EQ(view.verdicts,
-              (QMap<QString, QString>{{QStringLiteral("Audio/a"), QStringLiteral("pass")},
-                                      {QStringLiteral("Audio/b"), QStringLiteral("unsupported")},
-                                      {QStringLiteral("Audio/c.1"), QStringLiteral("fail")},
-                                      {QStringLiteral("Menu/m1"), QStringLiteral("pass")},
-                                      {QStringLiteral("Menu/m2"), QStringLiteral("pass")}}));
+              (QMap<QString, QString>{{u"Audio/a"_s, u"pass"_s},
+                                      {u"Audio/b"_s, u"unsupported"_s},
+                                      {u"Audio/c.1"_s, u"fail"_s},
+                                      {u"Menu/m1"_s, u"pass"_s},
+                                      {u"Menu/m2"_s, u"pass"_s}}));
 
-    const QString a = LogFolder() + QStringLiteral("/a-run");
-    const QString b = LogFolder() + QStringLiteral("/b-run");
-    const QString expected =
-        QStringLiteral("   Parsing Logs"
-                       "   Processing Log audio-ctf-2026-12-03.log"
-                       "   Processing Log menu-2026-12-03.txt"
-                       "   Processing Sub Directory %1"
-                       "      Parsing Logs"
-                       "      Processing Log menu-2026-12-05.txt"
-                       "      Process Complete"
-                       "   Processing Sub Directory %2"
-                       "      Parsing Logs"
-                       "      Processing Log audio-ctf-2026-12-04.log"
-                       "      Processing Sub Directory %2/deeper"
-                       "         Parsing Logs"
-                       "         Processing Log ghost-ctf-1.log"
-                       "   Warning: Module Name:Ghost not found in the manifests.\n"
-                       "         Process Complete"
-                       "      Process Complete"
-                       "   Process Complete")
-            .arg(a, b);
-    EXPECT_EQ(log.Text(), expected);
+    const QString a = LogFolder() + u"/a-run"_s;
+    const QString b = LogFolder() + u"/b-run"_s;
+    const QString expected = QStringLiteral("   Parsing Logs"
+                                            "   Processing Log audio-ctf-2026-12-03.log"
+                                            "   Processing Log menu-2026-12-03.txt"
+                                            "   Processing Sub Directory %1"
+                                            "      Parsing Logs"
+                                            "      Processing Log menu-2026-12-05.txt"
+                                            "      Process Complete"
+                                            "   Processing Sub Directory %2"
+                                            "      Parsing Logs"
+                                            "      Processing Log audio-ctf-2026-12-04.log"
+                                            "      Processing Sub Directory %2/deeper"
+                                            "         Parsing Logs"
+                                            "         Processing Log ghost-ctf-1.log"
+                                            "   Warning: Module Name:Ghost not found in the manifests.\n"
+                                            "         Process Complete"
+                                            "      Process Complete"
+                                            "   Process Complete")
+                                 .arg(a, b);
+    EXPECT_EQ(m_log.Text(), expected);
     // Nothing else was written into the tree.
-    EXPECT_EQ(QDir(LogFolder() + QStringLiteral("/ProcessedResults")).entryList(QDir::Files),
-              (QStringList{QStringLiteral("ProcessedResults.xml"), QStringLiteral("trap-ctf-2.log")}));
+    EXPECT_EQ(QDir(LogFolder() + u"/ProcessedResults"_s).entryList(QDir::Files),
+              (QStringList{u"ProcessedResults.xml"_s, u"trap-ctf-2.log"_s}));
 }
 
 TEST_F(ProcessTest, GivesTheSameFileAsRecordingTheLogsOneByOne)
 {
-    CapturedLog batchLog;
-    Harness batch;
-    Prepare(batch, batchLog);
-    ASSERT_TRUE(batch.Process(0));
-    const QByteArray processed =
-        ReadFile(LogFolder() + QStringLiteral("/ProcessedResults/ProcessedResults.xml"));
+    ASSERT_TRUE(m_harness.Process(0));
+    const QByteArray processed = ReadFile(LogFolder() + u"/ProcessedResults/ProcessedResults.xml"_s);
 
     CapturedLog singleLog;
     Harness single;
     Prepare(single, singleLog);
-    const QString separate = m_dir.filePath(QStringLiteral("separate.xml"));
-    HarnessControllerAccess::Environment(single).insert(QStringLiteral("ProcessedResultsPath"), separate);
-    for (const char *relative :
-         {"audio-ctf-2026-12-03.log", "menu-2026-12-03.txt", "a-run/menu-2026-12-05.txt",
-          "b-run/audio-ctf-2026-12-04.log", "b-run/deeper/ghost-ctf-1.log"}) {
-        const QString path = LogFolder() + QLatin1Char('/') + QString::fromLatin1(relative);
+    const QString separate = m_dir.filePath(u"separate.xml"_s);
+    HarnessControllerAccess::Environment(single).insert(u"ProcessedResultsPath"_s, separate);
+    for (const char *relative : {"audio-ctf-2026-12-03.log", "menu-2026-12-03.txt", "a-run/menu-2026-12-05.txt",
+                                 "b-run/audio-ctf-2026-12-04.log", "b-run/deeper/ghost-ctf-1.log"}) {
+        const QString path = LogFolder() + u'/' + QString::fromLatin1(relative);
         QSharedPointer<_TestModule> module = Manifest::CreateTestModuleFromLog(path);
         ASSERT_TRUE(module);
         module->AddDesktopLogFile(path);
@@ -155,16 +148,11 @@ TEST_F(ProcessTest, GivesTheSameFileAsRecordingTheLogsOneByOne)
 
 TEST_F(ProcessTest, DamagedResultsFileIsKeptAsideOnce)
 {
-    Log(QStringLiteral("ProcessedResults/ProcessedResults.xml"), "<testmodules kvkHash=\"#1\"><mod");
-    CapturedLog log;
-    Harness harness;
-    Prepare(harness, log);
-    ASSERT_TRUE(harness.Process(0));
-    const QDir folder(LogFolder() + QStringLiteral("/ProcessedResults"));
-    EXPECT_EQ(folder.entryList({QStringLiteral("*.unreadable-*")}, QDir::Files).size(), 1);
-    EXPECT_EQ(ReadResults(folder.filePath(QStringLiteral("ProcessedResults.xml")))
-                  .verdicts.value(QStringLiteral("Audio/a")),
-              QStringLiteral("pass"));
+    Log(u"ProcessedResults/ProcessedResults.xml"_s, "<testmodules kvkHash=\"#1\"><mod");
+    ASSERT_TRUE(m_harness.Process(0));
+    const QDir folder(LogFolder() + u"/ProcessedResults"_s);
+    EXPECT_EQ(folder.entryList({u"*.unreadable-*"_s}, QDir::Files).size(), 1);
+    EXPECT_EQ(ReadResults(folder.filePath(u"ProcessedResults.xml"_s)).verdicts.value(u"Audio/a"_s), u"pass"_s);
 }
 
 TEST_F(ProcessTest, SetupFailureRecordsNothing)
@@ -175,8 +163,8 @@ TEST_F(ProcessTest, SetupFailureRecordsNothing)
     harness.SetLogOutputPath(LogFolder());
     // No kit anywhere: set-up cannot succeed.
     EXPECT_FALSE(harness.Process(0));
-    EXPECT_TRUE(log.Text().endsWith(QStringLiteral("Harness::Process Setup failed.")));
-    EXPECT_FALSE(QFileInfo::exists(LogFolder() + QStringLiteral("/ProcessedResults/ProcessedResults.xml")));
+    EXPECT_TRUE(log.Text().endsWith(u"Harness::Process Setup failed."_s));
+    EXPECT_FALSE(QFileInfo::exists(LogFolder() + u"/ProcessedResults/ProcessedResults.xml"_s));
 }
 
 TEST_F(ProcessTest, WithoutALogFolderNothingIsCreated)
@@ -186,18 +174,14 @@ TEST_F(ProcessTest, WithoutALogFolderNothingIsCreated)
     harness.SetLogger(log.log());
     HarnessControllerAccess::SetCatalogues(harness, m_kit, m_platform);
     EXPECT_FALSE(harness.Process(0));
-    EXPECT_FALSE(HarnessControllerAccess::Environment(harness).contains(
-        QStringLiteral("ProcessedResultsPath")));
+    EXPECT_FALSE(HarnessControllerAccess::Environment(harness).contains(u"ProcessedResultsPath"_s));
 }
 
 TEST_F(ProcessTest, LinkBackUpTheTreeIsNotFollowed)
 {
-    ASSERT_TRUE(QFile::link(LogFolder(), LogFolder() + QStringLiteral("/b-run/loop")));
-    CapturedLog log;
-    Harness harness;
-    Prepare(harness, log);
-    EXPECT_TRUE(harness.Process(0));
-    EXPECT_FALSE(log.Text().contains(QStringLiteral("loop")));
+    ASSERT_TRUE(QFile::link(LogFolder(), LogFolder() + u"/b-run/loop"_s));
+    EXPECT_TRUE(m_harness.Process(0));
+    EXPECT_FALSE(m_log.Text().contains(u"loop"_s));
 }
 
 } // namespace

@@ -13,6 +13,8 @@
 #include <QRegularExpression>
 #include <QSet>
 
+using namespace Qt::StringLiterals;
+
 namespace {
 
 using controllertest::MakeCatalogue;
@@ -24,15 +26,16 @@ class RecordingModule : public ScriptedModule
 {
 public:
     RecordingModule(const QString &name, const QString &type, QStringList *events)
-        : ScriptedModule(name, type), m_events(events)
+        : ScriptedModule(name, type)
+        , m_events(events)
     {
-        source = QStringLiteral("KVK");
-        Report(name, {{name + QStringLiteral("_1"), QStringLiteral("pass")}});
+        source = u"KVK"_s;
+        Report(name, {{name + u"_1"_s, u"pass"_s}});
     }
 
     bool Run(IKestoDevice *, const QMap<QString, QString> &) override
     {
-        m_events->append(QStringLiteral("run ") + moduleName);
+        m_events->append(u"run "_s + moduleName);
         seenTestCases = selectedTestCases;
         seenRunOption = runOption;
         return runs;
@@ -47,18 +50,15 @@ public:
     bool CopyLog(IKestoDevice *, QMap<QString, QString> &) override
     {
         copyTime = Clock::Now();
-        m_events->append(QStringLiteral("copy ") + moduleName);
+        m_events->append(u"copy "_s + moduleName);
         return copies;
     }
     bool RemoveTest(IKestoDevice *) override
     {
-        m_events->append(QStringLiteral("remove ") + moduleName);
+        m_events->append(u"remove "_s + moduleName);
         return true;
     }
-    void PostProcess(QMap<QString, QString> &) override
-    {
-        m_events->append(QStringLiteral("postprocess ") + moduleName);
-    }
+    void PostProcess(QMap<QString, QString> &) override { m_events->append(u"postprocess "_s + moduleName); }
 
     bool runs = true;
     bool copies = true;
@@ -76,25 +76,23 @@ private:
 class RecordingFramework : public _Framework
 {
 public:
-    RecordingFramework(const QString &frameworkName, QStringList *events) : m_events(events)
+    RecordingFramework(const QString &frameworkName, QStringList *events)
+        : m_events(events)
     {
         name = frameworkName;
     }
     bool IsLoaded(IKestoDevice *) override { return onHandset; }
     bool Load(IKestoDevice *, QMap<QString, QString> &) override
     {
-        m_events->append(QStringLiteral("load ") + name);
+        m_events->append(u"load "_s + name);
         return loads;
     }
     bool PostLoad(IKestoDevice *, QMap<QString, QString> &) override
     {
-        m_events->append(QStringLiteral("postload ") + name);
+        m_events->append(u"postload "_s + name);
         return true;
     }
-    void Unload(IKestoDevice *, QMap<QString, QString> &) override
-    {
-        m_events->append(QStringLiteral("unload ") + name);
-    }
+    void Unload(IKestoDevice *, QMap<QString, QString> &) override { m_events->append(u"unload "_s + name); }
 
     bool onHandset = false;
     bool loads = true;
@@ -109,14 +107,13 @@ protected:
     void SetUp() override
     {
         ASSERT_TRUE(m_dir.isValid());
-        m_handsets.AddHandset(QStringLiteral("phone"), QStringLiteral("Emulated phone"),
-                              QStringLiteral("arm"));
+        m_handsets.AddHandset(u"phone"_s, u"Emulated phone"_s, u"arm"_s);
         m_harness.SetLogger(m_log.log());
-        m_harness.SetTarget(QStringLiteral("phone"));
-        m_harness.SetLogOutputPath(m_dir.filePath(QStringLiteral("logs")));
-        m_ctf.reset(new RecordingFramework(QStringLiteral("ctf"), &m_events));
-        m_oat.reset(new RecordingFramework(QStringLiteral("oat"), &m_events));
-        m_kit = MakeCatalogue(m_dir.filePath(QStringLiteral("kit")), false, {});
+        m_harness.SetTarget(u"phone"_s);
+        m_harness.SetLogOutputPath(m_dir.filePath(u"logs"_s));
+        m_ctf.reset(new RecordingFramework(u"ctf"_s, &m_events));
+        m_oat.reset(new RecordingFramework(u"oat"_s, &m_events));
+        m_kit = MakeCatalogue(m_dir.filePath(u"kit"_s), false, {});
         m_kit->frameworks.insert(m_ctf->name, m_ctf);
         m_kit->frameworks.insert(m_oat->name, m_oat);
         HarnessControllerAccess::SetCatalogues(m_harness, m_kit, {});
@@ -129,9 +126,8 @@ protected:
     {
         module.pollsNeeded = 5;
         module.onPoll = [this](IKestoDevice *device) {
-            testutil::WriteFile(m_handsets.HandsetFolder(QStringLiteral("phone")) + QStringLiteral("/offline"),
-                                QByteArray());
-            device->FileExists(QStringLiteral("fs:/anything"));
+            testutil::WriteFile(m_handsets.HandsetFolder(u"phone"_s) + u"/offline"_s, QByteArray());
+            device->FileExists(u"fs:/anything"_s);
         };
     }
 
@@ -139,17 +135,13 @@ protected:
     QSharedPointer<RecordingModule> Queue(const QString &name, const QString &type)
     {
         QSharedPointer<RecordingModule> module(new RecordingModule(name, type, &m_events));
-        module->idHash = QStringLiteral("#") + name;
+        module->idHash = u"#"_s + name;
         m_kit->testModules.insert(name.toLower(), module);
         m_harness.AddTest(module);
         return module;
     }
 
-    QString ResultsPath()
-    {
-        return HarnessControllerAccess::Environment(m_harness).value(
-            QStringLiteral("ProcessedResultsPath"));
-    }
+    QString ResultsPath() { return HarnessControllerAccess::Environment(m_harness).value(u"ProcessedResultsPath"_s); }
 
     QTemporaryDir m_dir;
     testutil::HandsetFixture m_handsets;
@@ -164,54 +156,54 @@ protected:
 TEST_F(RunLoopTest, EmptyQueueRunsNothing)
 {
     EXPECT_FALSE(m_harness.Run());
-    EXPECT_EQ(m_log.Text(), QStringLiteral("No modules to run."));
+    EXPECT_EQ(m_log.Text(), u"No modules to run."_s);
 }
 
 TEST_F(RunLoopTest, ModulesRunByTypeThenNameWithEachFrameworkLoadedOnce)
 {
-    Queue(QStringLiteral("Zeta"), QStringLiteral("oat"));
-    Queue(QStringLiteral("Beta"), QStringLiteral("ctf"));
-    Queue(QStringLiteral("Alpha"), QStringLiteral("oat"));
+    Queue(u"Zeta"_s, u"oat"_s);
+    Queue(u"Beta"_s, u"ctf"_s);
+    Queue(u"Alpha"_s, u"oat"_s);
 
     EXPECT_TRUE(m_harness.Run());
     EXPECT_EQ(m_events,
-              (QStringList{"load ctf", "run Beta", "copy Beta", "remove Beta", "postprocess Beta",
-                           "unload ctf", "load oat", "run Alpha", "copy Alpha", "remove Alpha",
-                           "postprocess Alpha", "run Zeta", "copy Zeta", "remove Zeta",
-                           "postprocess Zeta", "unload oat"}));
+              (QStringList{"load ctf", "run Beta", "copy Beta", "remove Beta", "postprocess Beta", "unload ctf",
+                           "load oat", "run Alpha", "copy Alpha", "remove Alpha", "postprocess Alpha", "run Zeta",
+                           "copy Zeta", "remove Zeta", "postprocess Zeta", "unload oat"}));
     const QString log = m_log.Text();
     EXPECT_TRUE(log.contains(QStringLiteral("Loading Framework ctf\nRunning KVK test Beta ID:Beta\n"
                                             "   Test Beta Run\n   Removing test Beta\n")));
-    EXPECT_TRUE(log.contains(QStringLiteral("Unloading Framework ctf\nLoading Framework oat\n")));
-    EXPECT_TRUE(log.endsWith(QStringLiteral("Unloading Framework oat\n")));
+    EXPECT_TRUE(log.contains(u"Unloading Framework ctf\nLoading Framework oat\n"_s));
+    EXPECT_TRUE(log.endsWith(u"Unloading Framework oat\n"_s));
     const controllertest::ResultsView view = controllertest::ReadResults(ResultsPath());
-    EXPECT_EQ(view.verdicts.value(QStringLiteral("Zeta/Zeta_1")), QStringLiteral("pass"));
-    EXPECT_EQ(view.verdicts.value(QStringLiteral("Beta/Beta_1")), QStringLiteral("pass"));
+    EXPECT_EQ(view.verdicts.value(u"Zeta/Zeta_1"_s), u"pass"_s);
+    EXPECT_EQ(view.verdicts.value(u"Beta/Beta_1"_s), u"pass"_s);
 }
 
 TEST_F(RunLoopTest, FrameworkFoundLoadedIsPostLoadedAndLeftOnTheHandset)
 {
     m_oat->onHandset = true;
-    Queue(QStringLiteral("A"), QStringLiteral("oat"));
-    Queue(QStringLiteral("B"), QStringLiteral("ctf"));
+    Queue(u"A"_s, u"oat"_s);
+    Queue(u"B"_s, u"ctf"_s);
 
     EXPECT_TRUE(m_harness.Run());
-    EXPECT_EQ(m_events, (QStringList{"load ctf", "run B", "copy B", "remove B", "postprocess B",
-                                     "unload ctf", "postload oat", "run A", "copy A", "remove A",
-                                     "postprocess A"}));
-    EXPECT_TRUE(m_log.Text().contains(QStringLiteral("Harness::Run Framework oat already loaded")));
+    EXPECT_EQ(m_events,
+              (QStringList{"load ctf", "run B", "copy B", "remove B", "postprocess B", "unload ctf", "postload oat",
+                           "run A", "copy A", "remove A", "postprocess A"}));
+    EXPECT_TRUE(m_log.Text().contains(u"Harness::Run Framework oat already loaded"_s));
 }
 
 TEST_F(RunLoopTest, UnknownFrameworkAndFailedStartSkipTheModuleAndTheRunGoesOn)
 {
-    Queue(QStringLiteral("Menu"), QStringLiteral("uitf"));
-    QSharedPointer<RecordingModule> broken = Queue(QStringLiteral("Broken"), QStringLiteral("ctf"));
+    Queue(u"Menu"_s, u"uitf"_s);
+    QSharedPointer<RecordingModule> broken = Queue(u"Broken"_s, u"ctf"_s);
     broken->runs = false;
-    Queue(QStringLiteral("Fine"), QStringLiteral("ctf"));
-    QSharedPointer<RecordingModule> silent = Queue(QStringLiteral("Silent"), QStringLiteral("ctf"));
+    Queue(u"Fine"_s, u"ctf"_s);
+    QSharedPointer<RecordingModule> silent = Queue(u"Silent"_s, u"ctf"_s);
     silent->copies = false;
     // What the run tells its observer about each module it took.
-    struct Records : RunObserver {
+    struct Records : RunObserver
+    {
         QMap<QString, ModuleRecord> byName;
         void ModuleEnded(const ModuleRecord &record) override { byName.insert(record.name, record); }
     } records;
@@ -219,72 +211,73 @@ TEST_F(RunLoopTest, UnknownFrameworkAndFailedStartSkipTheModuleAndTheRunGoesOn)
 
     EXPECT_TRUE(m_harness.Run());
     m_harness.SetRunObserver(nullptr);
-    const QMap<QString, QString> reasons{{QStringLiteral("Menu"), QStringLiteral("no framework for test type uitf")},
-                                         {QStringLiteral("Broken"), QStringLiteral("install or start failed")},
-                                         {QStringLiteral("Fine"), QString()},
-                                         {QStringLiteral("Silent"), QStringLiteral("no log was found")}};
+    const QMap<QString, QString> reasons{{u"Menu"_s, u"no framework for test type uitf"_s},
+                                         {u"Broken"_s, u"install or start failed"_s},
+                                         {u"Fine"_s, QString()},
+                                         {u"Silent"_s, u"no log was found"_s}};
     ASSERT_EQ(records.byName.keys(), reasons.keys());
     for (auto it = reasons.cbegin(); it != reasons.cend(); ++it) {
         const ModuleRecord &record = records.byName.value(it.key());
         EXPECT_EQ(record.Reason(), it.value()) << it.key().toStdString();
-        EXPECT_EQ(record.handset, QStringLiteral("phone"));
+        EXPECT_EQ(record.handset, u"phone"_s);
         EXPECT_EQ(record.start.timeSpec(), Qt::UTC);
     }
-    const ModuleRecord &fine = records.byName.value(QStringLiteral("Fine"));
+    const ModuleRecord &fine = records.byName.value(u"Fine"_s);
     ASSERT_EQ(fine.results.caseResults.size(), 1);
-    EXPECT_EQ(fine.results.caseResults.at(0).testCase, QStringLiteral("Fine_1"));
-    EXPECT_EQ(m_events, (QStringList{"load ctf", "run Broken", "run Fine", "copy Fine", "remove Fine",
-                                     "postprocess Fine", "run Silent", "copy Silent", "unload ctf"}));
+    EXPECT_EQ(fine.results.caseResults.at(0).testCase, u"Fine_1"_s);
+    EXPECT_EQ(m_events,
+              (QStringList{"load ctf", "run Broken", "run Fine", "copy Fine", "remove Fine", "postprocess Fine",
+                           "run Silent", "copy Silent", "unload ctf"}));
     const QString log = m_log.Text();
-    EXPECT_TRUE(log.contains(QStringLiteral("Test Broken Failed\n")));
-    EXPECT_TRUE(log.contains(QStringLiteral("   No logs found for Silent\n")));
-    EXPECT_TRUE(log.contains(QStringLiteral("Framework uitf not found.\n")));
-    EXPECT_FALSE(log.contains(QStringLiteral("Removing test Silent")));
+    EXPECT_TRUE(log.contains(u"Test Broken Failed\n"_s));
+    EXPECT_TRUE(log.contains(u"   No logs found for Silent\n"_s));
+    EXPECT_TRUE(log.contains(u"Framework uitf not found.\n"_s));
+    EXPECT_FALSE(log.contains(u"Removing test Silent"_s));
 }
 
 TEST_F(RunLoopTest, OnlyUnknownFrameworksStillCountAsTakenInHand)
 {
-    Queue(QStringLiteral("Menu"), QStringLiteral("uitf"));
-    Queue(QStringLiteral("Other"), QStringLiteral("uitf"));
+    Queue(u"Menu"_s, u"uitf"_s);
+    Queue(u"Other"_s, u"uitf"_s);
     EXPECT_TRUE(m_harness.Run());
     EXPECT_TRUE(m_events.isEmpty());
-    EXPECT_EQ(m_log.Text().count(QStringLiteral("Framework uitf not found.\n")), 2);
+    EXPECT_EQ(m_log.Text().count(u"Framework uitf not found.\n"_s), 2);
 }
 
 TEST_F(RunLoopTest, NoDeleteKeepsModulesAndCopyDelayPausesBeforeEachCopy)
 {
     m_harness.SetNoDelete(true);
-    m_harness.SetCopyDelay(QStringLiteral("1500"));
-    QSharedPointer<RecordingModule> a = Queue(QStringLiteral("A"), QStringLiteral("ctf"));
-    QSharedPointer<RecordingModule> b = Queue(QStringLiteral("B"), QStringLiteral("ctf"));
+    m_harness.SetCopyDelay(u"1500"_s);
+    QSharedPointer<RecordingModule> a = Queue(u"A"_s, u"ctf"_s);
+    QSharedPointer<RecordingModule> b = Queue(u"B"_s, u"ctf"_s);
 
     EXPECT_TRUE(m_harness.Run());
-    EXPECT_FALSE(m_events.join(QLatin1Char(',')).contains(QStringLiteral("remove")));
-    EXPECT_EQ(m_log.Text().count(QStringLiteral("   Sleeping 1500 Milliseconds\n")), 2);
+    EXPECT_FALSE(m_events.join(u',').contains(u"remove"_s));
+    EXPECT_EQ(m_log.Text().count(u"   Sleeping 1500 Milliseconds\n"_s), 2);
     for (const auto &module : {a, b})
         EXPECT_GE(module->copyTime - module->pollTimes.last(), 1500);
 }
 
 TEST_F(RunLoopTest, TestCasesGoToTheFirstModuleOnlyAndTheRunOptionToAll)
 {
-    m_harness.SetTestCases({QStringLiteral("t1"), QStringLiteral("t2")});
-    m_harness.SetRunOption(QStringLiteral("-fast"));
-    QSharedPointer<RecordingModule> second = Queue(QStringLiteral("B"), QStringLiteral("ctf"));
-    QSharedPointer<RecordingModule> first = Queue(QStringLiteral("A"), QStringLiteral("ctf"));
+    m_harness.SetTestCases({u"t1"_s, u"t2"_s});
+    m_harness.SetRunOption(u"-fast"_s);
+    QSharedPointer<RecordingModule> second = Queue(u"B"_s, u"ctf"_s);
+    QSharedPointer<RecordingModule> first = Queue(u"A"_s, u"ctf"_s);
 
     EXPECT_TRUE(m_harness.Run());
-    EXPECT_EQ(first->seenTestCases, (QStringList{QStringLiteral("t1"), QStringLiteral("t2")}));
+    EXPECT_EQ(first->seenTestCases, (QStringList{u"t1"_s, u"t2"_s}));
     EXPECT_TRUE(second->seenTestCases.isEmpty());
-    EXPECT_EQ(first->seenRunOption, QStringLiteral("-fast"));
-    EXPECT_EQ(second->seenRunOption, QStringLiteral("-fast"));
+    EXPECT_EQ(first->seenRunOption, u"-fast"_s);
+    EXPECT_EQ(second->seenRunOption, u"-fast"_s);
     EXPECT_TRUE(HarnessControllerAccess::TestCases(m_harness).isEmpty());
 }
 
 TEST_F(RunLoopTest, LogIsPolledEverySecondOnHandsetsAndCopiedAfterTenMinutesAtMost)
 {
-    QSharedPointer<RecordingModule> slow = Queue(QStringLiteral("Slow"), QStringLiteral("ctf"));
+    QSharedPointer<RecordingModule> slow = Queue(u"Slow"_s, u"ctf"_s);
     slow->pollsNeeded = 3;
-    QSharedPointer<RecordingModule> never = Queue(QStringLiteral("Stuck"), QStringLiteral("ctf"));
+    QSharedPointer<RecordingModule> never = Queue(u"Stuck"_s, u"ctf"_s);
     never->pollsNeeded = 1000000;
 
     EXPECT_TRUE(m_harness.Run());
@@ -294,7 +287,7 @@ TEST_F(RunLoopTest, LogIsPolledEverySecondOnHandsetsAndCopiedAfterTenMinutesAtMo
     // Ten minutes of one-second polls, then the log is copied as it is.
     EXPECT_GE(never->pollTimes.size(), 590);
     EXPECT_LE(never->pollTimes.size(), 602);
-    EXPECT_TRUE(m_events.contains(QStringLiteral("copy Stuck")));
+    EXPECT_TRUE(m_events.contains(u"copy Stuck"_s));
 }
 
 TEST_F(RunLoopTest, AModulePastTheTimeLimitIsRemovedUncopiedAndTheObserverSeesItsWait)
@@ -340,72 +333,60 @@ TEST_F(RunLoopTest, AModulePastTheTimeLimitIsRemovedUncopiedAndTheObserverSeesIt
     EXPECT_EQ(watcher.ended.value(QStringLiteral("Zeta")).outcome, ModuleSource::Recorded);
 }
 
-TEST(RunLoopSimulator, SimulatorHandsetsArePolledEveryQuarterSecond)
+TEST_F(RunLoopTest, SimulatorHandsetsArePolledEveryQuarterSecond)
 {
-    QTemporaryDir dir;
-    testutil::HandsetFixture handsets;
-    handsets.AddHandset(QStringLiteral("sim"), QString(), QStringLiteral("win32"));
-    QStringList events;
-    Harness harness;
-    harness.SetTarget(QStringLiteral("sim"));
-    harness.SetLogOutputPath(dir.filePath(QStringLiteral("logs")));
-    QSharedPointer<Manifest> kit = MakeCatalogue(dir.filePath(QStringLiteral("kit")), false, {});
-    kit->frameworks.insert(QStringLiteral("ctf"), QSharedPointer<_Framework>(new RecordingFramework(
-                                                      QStringLiteral("ctf"), &events)));
-    HarnessControllerAccess::SetCatalogues(harness, kit, {});
-    QSharedPointer<RecordingModule> module(new RecordingModule(QStringLiteral("M"), QStringLiteral("ctf"), &events));
+    m_handsets.AddHandset(u"sim"_s, QString(), u"win32"_s);
+    m_harness.SetTarget(u"sim"_s);
+    QSharedPointer<RecordingModule> module = Queue(u"M"_s, u"ctf"_s);
     module->pollsNeeded = 2;
-    harness.AddTest(module);
 
-    EXPECT_TRUE(harness.Run());
+    EXPECT_TRUE(m_harness.Run());
     ASSERT_EQ(module->pollTimes.size(), 2);
     EXPECT_GE(module->pollTimes[1] - module->pollTimes[0], 250);
     EXPECT_LT(module->pollTimes[1] - module->pollTimes[0], 500);
-    harness.DisconnectTarget();
 }
 
 TEST_F(RunLoopTest, LostHandsetEndsTheRunWithoutUnloading)
 {
-    QSharedPointer<RecordingModule> first = Queue(QStringLiteral("A"), QStringLiteral("ctf"));
+    QSharedPointer<RecordingModule> first = Queue(u"A"_s, u"ctf"_s);
     LoseHandsetWhilePolling(*first);
-    Queue(QStringLiteral("B"), QStringLiteral("ctf"));
+    Queue(u"B"_s, u"ctf"_s);
 
     EXPECT_FALSE(m_harness.Run());
     EXPECT_EQ(m_events, (QStringList{"load ctf", "run A"}));
-    EXPECT_TRUE(m_log.Text().endsWith(QStringLiteral("Device Connection has died.")));
+    EXPECT_TRUE(m_log.Text().endsWith(u"Device Connection has died."_s));
 }
 
 TEST_F(RunLoopTest, RunFailsWithoutAHandset)
 {
-    Queue(QStringLiteral("A"), QStringLiteral("ctf"));
-    m_harness.SetTarget(QStringLiteral("nothing-like-this"));
+    Queue(u"A"_s, u"ctf"_s);
+    m_harness.SetTarget(u"nothing-like-this"_s);
     EXPECT_FALSE(m_harness.Run());
     EXPECT_TRUE(m_events.isEmpty());
-    EXPECT_TRUE(m_log.Text().contains(QStringLiteral("Target nothing-like-this not found.")));
+    EXPECT_TRUE(m_log.Text().contains(u"Target nothing-like-this not found."_s));
 }
 
 TEST_F(RunLoopTest, FrameworkLookupIgnoresCaseButLoadByNameDoesNot)
 {
-    QSharedPointer<RecordingFramework> upper(new RecordingFramework(QStringLiteral("CTFX"), &m_events));
+    QSharedPointer<RecordingFramework> upper(new RecordingFramework(u"CTFX"_s, &m_events));
     m_kit->frameworks.insert(upper->name, upper);
-    EXPECT_EQ(m_harness.GetFramework(QStringLiteral("ctfx")), upper);
-    EXPECT_FALSE(m_harness.GetFramework(QStringLiteral("ctf-")));
-    EXPECT_FALSE(m_harness.Load(QStringLiteral("ctfx")));
+    EXPECT_EQ(m_harness.GetFramework(u"ctfx"_s), upper);
+    EXPECT_FALSE(m_harness.GetFramework(u"ctf-"_s));
+    EXPECT_FALSE(m_harness.Load(u"ctfx"_s));
     EXPECT_TRUE(m_events.isEmpty());
-    EXPECT_TRUE(m_harness.Load(QStringLiteral("CTFX")));
-    EXPECT_EQ(m_events, QStringList{QStringLiteral("load CTFX")});
+    EXPECT_TRUE(m_harness.Load(u"CTFX"_s));
+    EXPECT_EQ(m_events, QStringList{u"load CTFX"_s});
 
     QList<QSharedPointer<_Framework>> frameworks{upper};
     EXPECT_EQ(m_harness.ListFrameworks(frameworks), 3u);
-    EXPECT_EQ(frameworks.first()->name, QStringLiteral("CTFX"));
+    EXPECT_EQ(frameworks.first()->name, u"CTFX"_s);
 }
 
 TEST_F(RunLoopTest, FailedLoadNamesTheHandsetKind)
 {
     m_ctf->loads = false;
     EXPECT_FALSE(m_harness.Load(m_ctf));
-    EXPECT_TRUE(m_log.Text().contains(
-        QStringLiteral("Load Error: Kestix framework package for arm not found.\n")));
+    EXPECT_TRUE(m_log.Text().contains(u"Load Error: Kestix framework package for arm not found.\n"_s));
     EXPECT_FALSE(m_harness.Load(QSharedPointer<_Framework>()));
 }
 
@@ -418,18 +399,17 @@ TEST_F(RunLoopTest, UnloadAllTakesEveryKitFramework)
 
 TEST_F(RunLoopTest, SecondaryModulesComeFromBothCataloguesBeforeTheModuleStarts)
 {
-    QSharedPointer<Manifest> platform = MakeCatalogue(m_dir.filePath(QStringLiteral("platform")), true, {});
+    QSharedPointer<Manifest> platform = MakeCatalogue(m_dir.filePath(u"platform"_s), true, {});
     HarnessControllerAccess::SetCatalogues(m_harness, m_kit, platform);
-    QSharedPointer<RecordingModule> module(new RecordingModule(QStringLiteral("Main"), QStringLiteral("ctf"), &m_events));
-    module->secondaryModules = {QStringLiteral("Both"), QStringLiteral("Nowhere")};
+    QSharedPointer<RecordingModule> module(new RecordingModule(u"Main"_s, u"ctf"_s, &m_events));
+    module->secondaryModules = {u"Both"_s, u"Nowhere"_s};
     for (Manifest *catalogue : {m_kit.data(), platform.data()}) {
-        QSharedPointer<RecordingModule> both(
-            new RecordingModule(QStringLiteral("Both"), QStringLiteral("secondary"), &m_events));
-        catalogue->testModules.insert(QStringLiteral("both"), both);
+        QSharedPointer<RecordingModule> both(new RecordingModule(u"Both"_s, u"secondary"_s, &m_events));
+        catalogue->testModules.insert(u"both"_s, both);
     }
 
     EXPECT_TRUE(m_harness.Run(module));
-    EXPECT_EQ(m_events, QStringList{QStringLiteral("run Main")});
+    EXPECT_EQ(m_events, QStringList{u"run Main"_s});
     EXPECT_TRUE(m_log.Text().contains(QStringLiteral(
         "Loading Secondary Modules\n   Loading Secondary Module from KVK: Both\n"
         "   Loading Secondary Module from PVS: Both\n   Warning: Secondary Module Nowhere not found.\n")));
@@ -438,10 +418,10 @@ TEST_F(RunLoopTest, SecondaryModulesComeFromBothCataloguesBeforeTheModuleStarts)
 
 TEST_F(RunLoopTest, RunByNameTakesTheKitModule)
 {
-    Queue(QStringLiteral("Named"), QStringLiteral("ctf"));
-    EXPECT_TRUE(m_harness.Run(QStringLiteral("NAMED")));
-    EXPECT_FALSE(m_harness.Run(QStringLiteral("unknown")));
-    EXPECT_EQ(m_events, QStringList{QStringLiteral("run Named")});
+    Queue(u"Named"_s, u"ctf"_s);
+    EXPECT_TRUE(m_harness.Run(u"NAMED"_s));
+    EXPECT_FALSE(m_harness.Run(u"unknown"_s));
+    EXPECT_EQ(m_events, QStringList{u"run Named"_s});
 }
 
 } // namespace
@@ -451,12 +431,15 @@ namespace {
 class ListingModule : public controllertest::ScriptedModule
 {
 public:
-    ListingModule() : ScriptedModule(QStringLiteral("Lister")) {}
+    ListingModule()
+        : ScriptedModule(u"Lister"_s)
+    {
+    }
     bool GetLogFilePaths(IKestoDevice *device, QStringList &paths) override
     {
         if (!device)
             return false;
-        paths << QStringLiteral("fs:/a.log") << QStringLiteral("fs:/b.log");
+        paths << u"fs:/a.log"_s << u"fs:/b.log"_s;
         return true;
     }
 };
@@ -464,16 +447,16 @@ public:
 TEST_F(RunLoopTest, LogFilePathsComeFromTheModuleOnceConnected)
 {
     QSharedPointer<_TestModule> module(new ListingModule);
-    QStringList paths{QStringLiteral("stale")};
+    QStringList paths{u"stale"_s};
     EXPECT_EQ(m_harness.GetLogFilePaths(module, paths), 2u);
-    EXPECT_EQ(paths, (QStringList{QStringLiteral("fs:/a.log"), QStringLiteral("fs:/b.log")}));
+    EXPECT_EQ(paths, (QStringList{u"fs:/a.log"_s, u"fs:/b.log"_s}));
 
-    m_harness.SetTarget(QStringLiteral("absent"));
+    m_harness.SetTarget(u"absent"_s);
     EXPECT_EQ(m_harness.GetLogFilePaths(module, paths), 0u);
     EXPECT_TRUE(paths.isEmpty());
     EXPECT_FALSE(m_harness.Unload(m_ctf));
     EXPECT_FALSE(m_harness.Load(m_ctf));
-    EXPECT_TRUE(m_log.Text().contains(QStringLiteral("Load Error: A device is not available.\n")));
+    EXPECT_TRUE(m_log.Text().contains(u"Load Error: A device is not available.\n"_s));
 }
 
 // Hands out modules in the order given and records how each ended.
@@ -481,7 +464,8 @@ class RecordingSource : public ModuleSource
 {
 public:
     RecordingSource(const QList<QSharedPointer<_TestModule>> &modules, bool keep)
-        : m_modules(modules), m_keep(keep)
+        : m_modules(modules)
+        , m_keep(keep)
     {
     }
     QSharedPointer<_TestModule> Next() override
@@ -490,7 +474,7 @@ public:
     }
     void Finished(const QSharedPointer<_TestModule> &module, Outcome outcome) override
     {
-        outcomes.append(module->moduleName + QLatin1Char(' ') + QString::number(int(outcome)));
+        outcomes.append(module->moduleName + u' ' + QString::number(int(outcome)));
     }
     bool KeepFrameworks() const override { return m_keep; }
 
@@ -503,36 +487,32 @@ private:
 
 TEST_F(RunLoopTest, SourceRunKeepsFrameworksUntilTheEndWhenAsked)
 {
-    const QList<QSharedPointer<_TestModule>> modules{Queue(QStringLiteral("A"), QStringLiteral("ctf")),
-                                                     Queue(QStringLiteral("B"), QStringLiteral("oat")),
-                                                     Queue(QStringLiteral("C"), QStringLiteral("ctf")),
-                                                     Queue(QStringLiteral("D"), QStringLiteral("uitf"))};
+    const QList<QSharedPointer<_TestModule>> modules{Queue(u"A"_s, u"ctf"_s), Queue(u"B"_s, u"oat"_s),
+                                                     Queue(u"C"_s, u"ctf"_s), Queue(u"D"_s, u"uitf"_s)};
     RecordingSource keeping(modules, true);
     EXPECT_TRUE(m_harness.Run(keeping));
-    EXPECT_EQ(m_events.filter(QRegularExpression(QStringLiteral("^(load|unload|run) "))),
+    EXPECT_EQ(m_events.filter(QRegularExpression(u"^(load|unload|run) "_s)),
               (QStringList{"load ctf", "run A", "load oat", "run B", "run C", "unload ctf", "unload oat"}));
     EXPECT_EQ(keeping.outcomes,
-              (QStringList{QStringLiteral("A %1").arg(ModuleSource::Recorded),
-                           QStringLiteral("B %1").arg(ModuleSource::Recorded),
-                           QStringLiteral("C %1").arg(ModuleSource::Recorded),
-                           QStringLiteral("D %1").arg(ModuleSource::NoFramework)}));
+              (QStringList{u"A %1"_s.arg(ModuleSource::Recorded), u"B %1"_s.arg(ModuleSource::Recorded),
+                           u"C %1"_s.arg(ModuleSource::Recorded), u"D %1"_s.arg(ModuleSource::NoFramework)}));
 
     // Without keeping, a framework goes as soon as another test type comes.
     m_events.clear();
     RecordingSource switching(modules.mid(0, 3), false);
     EXPECT_TRUE(m_harness.Run(switching));
-    EXPECT_EQ(m_events.filter(QRegularExpression(QStringLiteral("^(load|unload|run) "))),
-              (QStringList{"load ctf", "run A", "unload ctf", "load oat", "run B", "unload oat", "load ctf",
-                           "run C", "unload ctf"}));
+    EXPECT_EQ(m_events.filter(QRegularExpression(u"^(load|unload|run) "_s)),
+              (QStringList{"load ctf", "run A", "unload ctf", "load oat", "run B", "unload oat", "load ctf", "run C",
+                           "unload ctf"}));
 }
 
 TEST_F(RunLoopTest, SourceIsToldWhichModuleTheLostHandsetInterrupted)
 {
-    QSharedPointer<RecordingModule> first = Queue(QStringLiteral("A"), QStringLiteral("ctf"));
+    QSharedPointer<RecordingModule> first = Queue(u"A"_s, u"ctf"_s);
     LoseHandsetWhilePolling(*first);
-    RecordingSource source({first, Queue(QStringLiteral("B"), QStringLiteral("ctf"))}, true);
+    RecordingSource source({first, Queue(u"B"_s, u"ctf"_s)}, true);
     EXPECT_FALSE(m_harness.Run(source));
-    EXPECT_EQ(source.outcomes, QStringList{QStringLiteral("A %1").arg(ModuleSource::Interrupted)});
+    EXPECT_EQ(source.outcomes, QStringList{u"A %1"_s.arg(ModuleSource::Interrupted)});
 }
 
 } // namespace

@@ -5,6 +5,8 @@
 #include <QDir>
 #include <QRegularExpression>
 
+using namespace Qt::StringLiterals;
+
 namespace {
 
 using controllertest::CatalogueModule;
@@ -34,20 +36,18 @@ protected:
     {
         ASSERT_TRUE(m_dir.isValid());
         m_harness.SetLogger(m_log.log());
-        m_kit = MakeCatalogue(m_dir.filePath(QStringLiteral("kit")), false,
-                              {CatalogueModule(QStringLiteral("Foo"), QStringLiteral("#1"), {}),
-                               CatalogueModule(QStringLiteral("Bar"), QStringLiteral("#2"), {}),
-                               CatalogueModule(QStringLiteral("Lib"), QStringLiteral("#3"), {},
-                                               QString(), QStringLiteral("secondary"))});
-        m_platform = MakeCatalogue(m_dir.filePath(QStringLiteral("platform")), true,
-                                   {CatalogueModule(QStringLiteral("Shell"), QStringLiteral("#4"), {}),
-                                    CatalogueModule(QStringLiteral("FooPlus"), QStringLiteral("#5"), {})});
+        m_kit = MakeCatalogue(m_dir.filePath(u"kit"_s), false,
+                              {CatalogueModule(u"Foo"_s, u"#1"_s, {}), CatalogueModule(u"Bar"_s, u"#2"_s, {}),
+                               CatalogueModule(u"Lib"_s, u"#3"_s, {}, QString(), u"secondary"_s)});
+        m_platform
+            = MakeCatalogue(m_dir.filePath(u"platform"_s), true,
+                            {CatalogueModule(u"Shell"_s, u"#4"_s, {}), CatalogueModule(u"FooPlus"_s, u"#5"_s, {})});
         HarnessControllerAccess::SetCatalogues(m_harness, m_kit, m_platform);
     }
 
     QString Features(const QByteArray &xml)
     {
-        const QString path = m_dir.filePath(QStringLiteral("features.xml"));
+        const QString path = m_dir.filePath(u"features.xml"_s);
         WriteFile(path, xml);
         return path;
     }
@@ -59,59 +59,41 @@ protected:
     QSharedPointer<Manifest> m_platform;
 };
 
-TEST_F(FeatureListTest, FeatureWithoutTestModuleAttributeSelectsNothing)
+TEST_F(FeatureListTest, FeaturesSelectTheirModulesAndUnknownNamesAreWarnedOneByOne)
 {
-    Modules modules{QSharedPointer<_TestModule>(new ScriptedModule(QStringLiteral("stale")))};
-    const QString path = Features("<features><feature testModule=\"Bar\"/>"
-                                  "<feature name=\"no module\"/></features>");
-    EXPECT_EQ(m_harness.GetTestModules(modules, path), 1u);
-    EXPECT_EQ(Names(modules), QStringList{QStringLiteral("Bar")});
-    EXPECT_FALSE(m_log.Text().contains(QStringLiteral("Warning")));
-}
-
-TEST_F(FeatureListTest, NamesMatchInAnyLetterCaseAtAnyDepth)
-{
-    const QString path = Features("<root><group><sub><feature testModule=\"foo\"/></sub></group>"
-                                  "<Feature testModule=\"SHELL\"/></root>");
-    Modules modules;
-    EXPECT_EQ(m_harness.GetTestModules(modules, path), 2u);
-    EXPECT_EQ(Names(modules), (QStringList{QStringLiteral("Foo"), QStringLiteral("Shell")}));
-    EXPECT_FALSE(m_log.Text().contains(QStringLiteral("Warning")));
-}
-
-TEST_F(FeatureListTest, DeeplyNestedFeatureIsFoundAndRootFeatureCounts)
-{
-    constexpr int kDepth = 3000;
-    QByteArray xml = "<feature testModule=\"Bar\">";
-    for (int i = 0; i < kDepth; ++i)
-        xml += "<g>";
-    xml += "<feature testModule=\"Shell\"/>";
-    for (int i = 0; i < kDepth; ++i)
-        xml += "</g>";
-    xml += "<feature testModule=\"Foo\"/></feature>";
-    Modules modules;
-    EXPECT_EQ(m_harness.GetTestModules(modules, Features(xml)), 3u);
-    EXPECT_EQ(Names(modules),
-              (QStringList{QStringLiteral("Bar"), QStringLiteral("Foo"), QStringLiteral("Shell")}));
-}
-
-TEST_F(FeatureListTest, UnknownNamesAreWarnedOneByOne)
-{
-    const QString path = Features("<f><feature testModule=\"Ghost\"/><feature testModule=\"Bar\"/>"
-                                  "<feature testModule=\"Lib\"/><feature testModule=\"Fo*\"/></f>");
-    Modules modules;
-    EXPECT_EQ(m_harness.GetTestModules(modules, path), 3u);
-    EXPECT_EQ(Names(modules),
-              (QStringList{QStringLiteral("Bar"), QStringLiteral("Foo"), QStringLiteral("FooPlus")}));
-    const QString log = m_log.Text();
-    EXPECT_TRUE(log.contains(
-        QStringLiteral("   Warning: Testmodule \"Ghost\" not found in test manifests.")));
-    // A secondary module is never selected, and a pattern is not a module name.
-    EXPECT_TRUE(
-        log.contains(QStringLiteral("   Warning: Testmodule \"Lib\" not found in test manifests.")));
-    EXPECT_TRUE(
-        log.contains(QStringLiteral("   Warning: Testmodule \"Fo*\" not found in test manifests.")));
-    EXPECT_FALSE(log.contains(QStringLiteral("\"Bar\"")));
+    // Nested 3000 levels deep, below a feature that counts itself.
+    const QByteArray deep = "<feature testModule=\"Bar\">" + QByteArray("<g>").repeated(3000)
+        + "<feature testModule=\"Shell\"/>" + QByteArray("</g>").repeated(3000)
+        + "<feature testModule=\"Foo\"/></feature>";
+    const struct
+    {
+        QByteArray xml;
+        QStringList selected;
+        QStringList warned;
+    } rows[] = {
+        {"<features><feature testModule=\"Bar\"/><feature name=\"no module\"/></features>", {u"Bar"_s}, {}},
+        // Any letter case, any depth.
+        {"<root><group><sub><feature testModule=\"foo\"/></sub></group><Feature testModule=\"SHELL\"/></root>",
+         {u"Foo"_s, u"Shell"_s},
+         {}},
+        // A secondary module is never selected, and a pattern is not a module name.
+        {"<f><feature testModule=\"Ghost\"/><feature testModule=\"Bar\"/>"
+         "<feature testModule=\"Lib\"/><feature testModule=\"Fo*\"/></f>",
+         {u"Bar"_s, u"Foo"_s, u"FooPlus"_s},
+         {u"Ghost"_s, u"Lib"_s, u"Fo*"_s}},
+        {deep, {u"Bar"_s, u"Foo"_s, u"Shell"_s}, {}},
+    };
+    for (const auto &row : rows) {
+        SCOPED_TRACE(row.xml.left(200).toStdString());
+        const qsizetype logged = m_log.Text().size();
+        Modules modules{QSharedPointer<_TestModule>(new ScriptedModule(u"stale"_s))};
+        EXPECT_EQ(m_harness.GetTestModules(modules, Features(row.xml)), uint(row.selected.size()));
+        EXPECT_EQ(Names(modules), row.selected);
+        QString expected;
+        for (const QString &name : row.warned)
+            expected += u"   Warning: Testmodule \"%1\" not found in test manifests."_s.arg(name);
+        EXPECT_EQ(m_log.Text().mid(logged), expected);
+    }
 }
 
 TEST_F(FeatureListTest, PlatformOnlySelectionDrawsOnThePlatformCatalogue)
@@ -120,31 +102,26 @@ TEST_F(FeatureListTest, PlatformOnlySelectionDrawsOnThePlatformCatalogue)
     const QString path = Features("<f><feature testModule=\"Foo\"/><feature testModule=\"FooPlus\"/></f>");
     Modules modules;
     EXPECT_EQ(m_harness.GetTestModules(modules, path), 1u);
-    EXPECT_EQ(Names(modules), QStringList{QStringLiteral("FooPlus")});
-    EXPECT_TRUE(
-        m_log.Text().contains(QStringLiteral("   Warning: Testmodule \"Foo\" not found in test manifests.")));
+    EXPECT_EQ(Names(modules), QStringList{u"FooPlus"_s});
+    EXPECT_TRUE(m_log.Text().contains(u"   Warning: Testmodule \"Foo\" not found in test manifests."_s));
 
     Modules filtered;
-    EXPECT_EQ(m_harness.GetTestModules(filtered, QStringList{QStringLiteral("*")}, QString(), QString()),
-              2u);
-    EXPECT_EQ(Names(filtered), (QStringList{QStringLiteral("FooPlus"), QStringLiteral("Shell")}));
+    EXPECT_EQ(m_harness.GetTestModules(filtered, QStringList{u"*"_s}, QString(), QString()), 2u);
+    EXPECT_EQ(Names(filtered), (QStringList{u"FooPlus"_s, u"Shell"_s}));
 }
 
 TEST_F(FeatureListTest, FilterSelectionAppendsKitThenPlatform)
 {
-    Modules modules{QSharedPointer<_TestModule>(new ScriptedModule(QStringLiteral("kept")))};
-    EXPECT_EQ(m_harness.GetTestModules(modules, QStringList{QStringLiteral("foo*")}, QString(),
-                                       QString()),
-              3u);
-    EXPECT_EQ(Names(modules),
-              (QStringList{QStringLiteral("kept"), QStringLiteral("Foo"), QStringLiteral("FooPlus")}));
+    Modules modules{QSharedPointer<_TestModule>(new ScriptedModule(u"kept"_s))};
+    EXPECT_EQ(m_harness.GetTestModules(modules, QStringList{u"foo*"_s}, QString(), QString()), 3u);
+    EXPECT_EQ(Names(modules), (QStringList{u"kept"_s, u"Foo"_s, u"FooPlus"_s}));
 }
 
 struct BadFeatureFile
 {
     const char *name;
     const char *content; // null: no file at all
-    const char *message; // %1 is the file's path
+    const char *message; // a pattern; %1 is the file's path
 };
 
 class BadFeatureFileTest : public FeatureListTest, public ::testing::WithParamInterface<BadFeatureFile>
@@ -154,74 +131,56 @@ class BadFeatureFileTest : public FeatureListTest, public ::testing::WithParamIn
 TEST_P(BadFeatureFileTest, SelectsNothingAndSaysWhy)
 {
     const BadFeatureFile &c = GetParam();
-    QString path = m_dir.filePath(QStringLiteral("missing.xml"));
+    QString path = m_dir.filePath(u"missing.xml"_s);
     if (c.content)
         path = Features(c.content);
-    Modules modules{QSharedPointer<_TestModule>(new ScriptedModule(QStringLiteral("stale")))};
+    Modules modules{QSharedPointer<_TestModule>(new ScriptedModule(u"stale"_s))};
     EXPECT_EQ(m_harness.GetTestModules(modules, path), 0u);
     EXPECT_TRUE(modules.isEmpty());
-    EXPECT_TRUE(m_log.Text().contains(QString::fromLatin1(c.message).arg(path))) << m_log.Text().toStdString();
+    const QRegularExpression message(QString::fromLatin1(c.message).arg(QRegularExpression::escape(path)));
+    EXPECT_TRUE(message.match(m_log.Text()).hasMatch()) << m_log.Text().toStdString();
 }
 
 INSTANTIATE_TEST_SUITE_P(
     Files, BadFeatureFileTest,
-    ::testing::Values(BadFeatureFile{"Missing", nullptr, "BFS File %1 not found."},
-                      BadFeatureFile{"Malformed", "<features><feature testModule=\"Foo\">",
-                                     "Error Parsing BFS File %1, Error:"},
+    ::testing::Values(BadFeatureFile{"Missing", nullptr, "BFS File %1 not found\\."},
+                      BadFeatureFile{"Truncated", "<features><feature testModule=\"Foo\">",
+                                     "Error Parsing BFS File %1, Error:.+ Line:1 Column:\\d+"},
+                      BadFeatureFile{"Mismatched", "<features>\n<feature testModule=\"Foo\">\n</x>",
+                                     "Error Parsing BFS File %1, Error:.+ Line:3 Column:\\d+"},
                       BadFeatureFile{"NoFeatures", "<features><module name=\"Foo\"/></features>",
-                                     "No testcases in BFS File %1."}),
+                                     "No testcases in BFS File %1\\."}),
     [](const ::testing::TestParamInfo<BadFeatureFile> &info) { return info.param.name; });
-
-TEST_F(FeatureListTest, ParseErrorNamesLineAndColumn)
-{
-    const QString path = Features("<features>\n  <feature testModule=\"Foo\">\n</feature2>");
-    Modules modules;
-    m_harness.GetTestModules(modules, path);
-    const QRegularExpression message(
-        QStringLiteral("Error Parsing BFS File .*features\\.xml, Error:.+ Line:3 Column:\\d+"));
-    EXPECT_TRUE(message.match(m_log.Text()).hasMatch()) << m_log.Text().toStdString();
-}
 
 // ---- Catalogues of real kits ----
 
 class CatalogueSetupTest : public ::testing::Test
 {
 protected:
-    CatalogueSetupTest()
-        : m_env("KESTIX_DATA_ROOT", m_dir.filePath(QStringLiteral("data"))),
-          m_kit(m_dir.filePath(QStringLiteral("kit"))),
-          m_platform(m_dir.filePath(QStringLiteral("platform/pvs/platform")))
-    {
-    }
-
     void SetUp() override
     {
-        ASSERT_TRUE(m_dir.isValid());
         m_harness.SetLogger(m_log.log());
-        m_kit.AddSourceModule(QStringLiteral("tests/audio"), Module(QStringLiteral("Audio")));
-        m_kit.AddFrameworkPackage(QStringLiteral("testframeworks"), QStringLiteral("ctf"),
-                                  QStringLiteral("Win32"), QStringLiteral("Debug"));
-        m_platform.AddSourceModule(QStringLiteral("tests/shell"), Module(QStringLiteral("Shell")));
-        ASSERT_TRUE(m_kit.Ok() && m_platform.Ok());
+        m_run.Kit().AddSourceModule(u"tests/audio"_s, Module(u"Audio"_s));
+        m_run.Kit().AddFrameworkPackage(u"testframeworks"_s, u"ctf"_s, u"Win32"_s, u"Debug"_s);
+        m_platform.AddSourceModule(u"tests/shell"_s, Module(u"Shell"_s));
+        ASSERT_TRUE(m_run.KitOk() && m_platform.Ok());
     }
 
     static kitbuilder::Module Module(const QString &name)
     {
         kitbuilder::Module module;
-        module.kind = QStringLiteral("ctf");
+        module.kind = u"ctf"_s;
         module.name = name;
-        module.testCases = {name + QStringLiteral("_a")};
+        module.testCases = {name + u"_a"_s};
         return module;
     }
 
-    QString KitPath() const { return m_dir.filePath(QStringLiteral("kit")); }
-    QString PlatformSetting() const { return m_dir.filePath(QStringLiteral("platform")); }
-    QString PlatformPath() const { return m_dir.filePath(QStringLiteral("platform/pvs/platform")); }
+    QString KitPath() const { return m_run.Path(u"kit"_s); }
+    QString PlatformSetting() const { return m_run.Path(u"platform"_s); }
+    QString PlatformPath() const { return m_run.Path(u"platform/pvs/platform"_s); }
 
-    QTemporaryDir m_dir;
-    EnvGuard m_env;
-    kitbuilder::KitBuilder m_kit;
-    kitbuilder::KitBuilder m_platform;
+    testutil::KitRun m_run;
+    kitbuilder::KitBuilder m_platform{PlatformPath()};
     CapturedLog m_log;
     Harness m_harness;
 };
@@ -237,18 +196,17 @@ TEST_F(CatalogueSetupTest, StaleKitCacheIsRegeneratedAndTheDefaultDevicePackTake
     m_harness.SetPlatform(PlatformSetting());
     Modules modules;
     EXPECT_EQ(m_harness.GetTestModules(modules, QStringList(), QString(), QString()), 2u);
-    EXPECT_EQ(Names(modules), (QStringList{QStringLiteral("Audio"), QStringLiteral("Shell")}));
+    EXPECT_EQ(Names(modules), (QStringList{u"Audio"_s, u"Shell"_s}));
 
     const QString log = m_log.Text();
-    const int outOfDate = log.indexOf(QStringLiteral("Manifest out of date for ") + KitPath());
-    const int generating = log.indexOf(QStringLiteral("Generating manifest for ") + KitPath());
+    const int outOfDate = log.indexOf(u"Manifest out of date for "_s + KitPath());
+    const int generating = log.indexOf(u"Generating manifest for "_s + KitPath());
     ASSERT_GE(outOfDate, 0) << log.toStdString();
     EXPECT_GT(generating, outOfDate);
-    EXPECT_TRUE(log.contains(QStringLiteral("Generating manifest for ") + PlatformPath()));
-    EXPECT_TRUE(log.contains(QStringLiteral("Using the default device pack.")));
-    EXPECT_TRUE(log.contains(
-        QStringLiteral("DPK %1/testframeworks/oat/tools/reference/deviceref.dso is not valid.\n")
-            .arg(PlatformPath())));
+    EXPECT_TRUE(log.contains(u"Generating manifest for "_s + PlatformPath()));
+    EXPECT_TRUE(log.contains(u"Using the default device pack."_s));
+    EXPECT_TRUE(
+        log.contains(u"DPK %1/testframeworks/oat/tools/reference/deviceref.dso is not valid.\n"_s.arg(PlatformPath())));
 
     // The next harness reads both caches and generates nothing.
     CapturedLog second;
@@ -257,22 +215,21 @@ TEST_F(CatalogueSetupTest, StaleKitCacheIsRegeneratedAndTheDefaultDevicePackTake
     again.SetTestkit(KitPath());
     again.SetPlatform(PlatformSetting());
     Modules more;
-    EXPECT_EQ(again.GetTestModules(more, QStringList{QStringLiteral("audio")}, QString(), QString()), 1u);
-    EXPECT_FALSE(second.Text().contains(QStringLiteral("Generating manifest")));
+    EXPECT_EQ(again.GetTestModules(more, QStringList{u"audio"_s}, QString(), QString()), 1u);
+    EXPECT_FALSE(second.Text().contains(u"Generating manifest"_s));
 }
 
 TEST_F(CatalogueSetupTest, DevicePackGivenBeforehandIsKept)
 {
-    const QString pack = m_dir.filePath(QStringLiteral("mine.dso"));
+    const QString pack = m_run.Path(u"mine.dso"_s);
     WriteFile(pack, "<dso/>");
     m_harness.SetDPK(pack);
     m_harness.SetTestkit(KitPath());
     m_harness.SetPlatform(PlatformSetting());
     Modules modules;
     m_harness.GetTestModules(modules, QStringList(), QString(), QString());
-    EXPECT_FALSE(m_log.Text().contains(QStringLiteral("Using the default device pack.")));
-    EXPECT_EQ(HarnessControllerAccess::Environment(m_harness).value(QStringLiteral("DevicePack")),
-              QDir::cleanPath(pack));
+    EXPECT_FALSE(m_log.Text().contains(u"Using the default device pack."_s));
+    EXPECT_EQ(HarnessControllerAccess::Environment(m_harness).value(u"DevicePack"_s), QDir::cleanPath(pack));
 }
 
 TEST_F(CatalogueSetupTest, GenerateManifestWritesEachCatalogueToItsCache)
@@ -283,55 +240,53 @@ TEST_F(CatalogueSetupTest, GenerateManifestWritesEachCatalogueToItsCache)
     Manifest kit(KitPath(), false);
     Manifest platform(PlatformPath(), true);
     const QString log = m_log.Text();
-    EXPECT_TRUE(log.contains(QStringLiteral("Manifest written to ") + kit.ManifestFilePath()));
-    EXPECT_TRUE(log.contains(QStringLiteral("Manifest written to ") + platform.ManifestFilePath()));
+    EXPECT_TRUE(log.contains(u"Manifest written to "_s + kit.ManifestFilePath()));
+    EXPECT_TRUE(log.contains(u"Manifest written to "_s + platform.ManifestFilePath()));
     EXPECT_TRUE(kit.ReadManifest());
-    EXPECT_TRUE(kit.FindTestModule(QStringLiteral("audio")));
+    EXPECT_TRUE(kit.FindTestModule(u"audio"_s));
     EXPECT_TRUE(HarnessControllerAccess::Kit(m_harness));
     EXPECT_TRUE(HarnessControllerAccess::Platform(m_harness));
 }
 
 TEST_F(CatalogueSetupTest, GenerateManifestToARelativePathCreatesItsFolder)
 {
-    testutil::CurrentDirectory cwd(m_dir.path());
+    testutil::CurrentDirectory cwd(m_run.Path(u"."_s));
     m_harness.SetTestkit(KitPath());
-    EXPECT_TRUE(m_harness.GenerateManifest(QStringLiteral("out/sub/kit.xml")));
-    const QString written = m_dir.filePath(QStringLiteral("out/sub/kit.xml"));
-    EXPECT_TRUE(m_log.Text().contains(QStringLiteral("Manifest ") + KitPath() +
-                                      QStringLiteral(" written to ") + written));
+    EXPECT_TRUE(m_harness.GenerateManifest(u"out/sub/kit.xml"_s));
+    const QString written = m_run.Path(u"out/sub/kit.xml"_s);
+    EXPECT_TRUE(m_log.Text().contains(u"Manifest "_s + KitPath() + u" written to "_s + written));
     QDomDocument document;
     ASSERT_TRUE(document.setContent(ReadFile(written)));
-    EXPECT_EQ(document.documentElement().tagName(), QStringLiteral("testkit"));
+    EXPECT_EQ(document.documentElement().tagName(), u"testkit"_s);
 }
 
 TEST_F(CatalogueSetupTest, GenerateManifestFallsBackToTheHomeFolder)
 {
-    const QString home = m_dir.filePath(QStringLiteral("home"));
+    const QString home = m_run.Path(u"home"_s);
     QDir().mkpath(home);
     EnvGuard homeGuard("HOME", home);
     // A regular file stands where the output folder should be.
-    WriteFile(m_dir.filePath(QStringLiteral("blocked")), "x");
+    WriteFile(m_run.Path(u"blocked"_s), "x");
     m_harness.SetTestkit(KitPath());
     m_harness.SetPlatform(PlatformSetting());
-    EXPECT_TRUE(m_harness.GenerateManifest(m_dir.filePath(QStringLiteral("blocked/kits.xml"))));
+    EXPECT_TRUE(m_harness.GenerateManifest(m_run.Path(u"blocked/kits.xml"_s)));
 
-    const QString fallback = QDir::cleanPath(home + QStringLiteral("/kits.xml"));
-    EXPECT_TRUE(m_log.Text().contains(QStringLiteral("Manifest ") + PlatformPath() +
-                                      QStringLiteral(" written to ") + fallback));
+    const QString fallback = QDir::cleanPath(home + u"/kits.xml"_s);
+    EXPECT_TRUE(m_log.Text().contains(u"Manifest "_s + PlatformPath() + u" written to "_s + fallback));
     // Both catalogues went to the one file; the platform's came last.
     Manifest platform(PlatformPath(), true);
     QDomDocument document;
     ASSERT_TRUE(document.setContent(ReadFile(fallback)));
-    EXPECT_EQ(document.documentElement().attribute(QStringLiteral("path")), platform.kitPath);
+    EXPECT_EQ(document.documentElement().attribute(u"path"_s), platform.kitPath);
 }
 
 TEST_F(CatalogueSetupTest, GenerateManifestWithoutAnyWritableFileFails)
 {
-    WriteFile(m_dir.filePath(QStringLiteral("blocked")), "x");
-    EnvGuard homeGuard("HOME", m_dir.filePath(QStringLiteral("blocked/home")));
+    WriteFile(m_run.Path(u"blocked"_s), "x");
+    EnvGuard homeGuard("HOME", m_run.Path(u"blocked/home"_s));
     m_harness.SetTestkit(KitPath());
-    EXPECT_FALSE(m_harness.GenerateManifest(m_dir.filePath(QStringLiteral("blocked/kits.xml"))));
-    EXPECT_TRUE(m_log.Text().contains(QStringLiteral("Manifest can't be opened for writing.")));
+    EXPECT_FALSE(m_harness.GenerateManifest(m_run.Path(u"blocked/kits.xml"_s)));
+    EXPECT_TRUE(m_log.Text().contains(u"Manifest can't be opened for writing."_s));
 }
 
 } // namespace

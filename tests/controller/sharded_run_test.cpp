@@ -5,20 +5,14 @@
 
 #include "controller/moduletimings.h"
 #include "controller/shardedrun.h"
-#include "environment/testdirectories.h"
-#include "support/handsetfixture.h"
-#include "support/shardkit.h"
 
 #include <QDir>
 #include <QRegularExpression>
 
-#include <memory>
+using namespace Qt::StringLiterals;
 
 namespace {
 
-using controllertest::ReadResults;
-using harnesstest::CapturedLog;
-using testutil::EnvGuard;
 using testutil::WriteFile;
 
 constexpr int kCtfModules = 20;
@@ -27,57 +21,24 @@ constexpr int kAppletModules = 4;
 class ShardedRunTest : public ::testing::Test
 {
 protected:
-    ShardedRunTest()
-        : m_env("KESTIX_DATA_ROOT", m_dir.filePath(QStringLiteral("data"))),
-          m_kit(m_dir.path(), kCtfModules, kAppletModules, QStringLiteral("0.05"))
-    {
-    }
-
-    void SetUp() override
-    {
-        ASSERT_TRUE(m_dir.isValid());
-        ASSERT_TRUE(m_kit.Ok()) << m_kit.Errors().join(QLatin1Char('\n')).toStdString();
-    }
-
-    void TearDown() override
-    {
-        for (const std::unique_ptr<Harness> &harness : m_harnesses)
-            harness->DisconnectTarget();
-    }
-
-    QString LogRoot() const { return m_dir.filePath(QStringLiteral("logs")); }
+    void SetUp() override { ASSERT_TRUE(m_run.KitOk()); }
 
     // One configured Harness per handset, added to run.
-    void AddWorkers(ShardedRun &run, const QStringList &handsets)
+    QList<Harness *> AddWorkers(ShardedRun &run, const QStringList &handsets)
     {
+        QList<Harness *> workers;
         for (const QString &handset : handsets) {
-            m_harnesses.push_back(std::make_unique<Harness>());
-            m_kit.Configure(*m_harnesses.back(), handset, LogRoot(), m_log.log());
-            run.AddHandset(m_harnesses.back().get());
+            workers.append(&m_run.NewHarness(handset));
+            run.AddHandset(workers.last());
         }
+        return workers;
     }
 
-    // Every module of the kit, selected through a Harness of its own.
-    QList<QSharedPointer<_TestModule>> Selection()
-    {
-        m_harnesses.push_back(std::make_unique<Harness>());
-        m_kit.Configure(*m_harnesses.back(), QString(), LogRoot(), nullptr);
-        QList<QSharedPointer<_TestModule>> modules;
-        m_harnesses.back()->GetTestModules(modules, {QStringLiteral("*")}, QString(), QString());
-        return modules;
-    }
-
-    // The verdicts "module/testcase" of the handset's processed-results file,
-    // of the modules that ran there.
+    // The verdicts of the handset's results file, of the modules that ran there.
     QMap<QString, QString> Verdicts(const QString &handset, const QStringList &modules)
     {
-        const controllertest::ResultsView view = ReadResults(
-            TestDirectories::GetProcessResultsPath(handset));
-        QMap<QString, QString> verdicts;
-        for (auto it = view.verdicts.cbegin(); it != view.verdicts.cend(); ++it) {
-            if (modules.contains(it.key().section(QLatin1Char('/'), 0, 0)))
-                verdicts.insert(it.key(), it.value());
-        }
+        QMap<QString, QString> verdicts = m_run.Verdicts(handset);
+        verdicts.removeIf([&](auto it) { return !modules.contains(it.key().section(u'/', 0, 0)); });
         return verdicts;
     }
 
@@ -85,42 +46,33 @@ protected:
     QMap<QString, QStringList> Completions() const
     {
         QMap<QString, QStringList> done;
-        for (const QString &line : shardkit::ShardKit::Runs(m_handsets)) {
-            const QStringList words = line.split(QLatin1Char(' '));
-            if (words.size() == 3 && words.at(0) == QLatin1String("done"))
+        for (const QString &line : m_run.Runs()) {
+            const QStringList words = line.split(u' ');
+            if (words.size() == 3 && words.at(0) == u"done"_s)
                 done[words.at(1)].append(words.at(2));
         }
         return done;
     }
 
-    QTemporaryDir m_dir;
-    EnvGuard m_env;
-    testutil::HandsetFixture m_handsets;
-    shardkit::ShardKit m_kit;
-    CapturedLog m_log;
-    std::vector<std::unique_ptr<Harness>> m_harnesses;
+    testutil::KitRun m_run;
+    const QStringList m_names = testutil::AddShardModules(m_run.Kit(), kCtfModules, kAppletModules, u"0.05"_s);
 };
 
 TEST_F(ShardedRunTest, FourHandsetsShareTheQueueAndMatchAOneHandsetRun)
 {
-    const QStringList handsets = shardkit::ShardKit::AddHandsets(m_handsets, 4);
-    shardkit::ShardKit::AddHandsets(m_handsets, 1, QStringLiteral("solo"));
-    const QList<QSharedPointer<_TestModule>> selection = Selection();
+    const QStringList handsets = m_run.AddHandsets(4);
+    m_run.AddHandsets(1, u"solo"_s);
+    const QList<QSharedPointer<_TestModule>> selection = m_run.Select();
     ASSERT_EQ(selection.size(), kCtfModules + kAppletModules);
 
     // The reference: the same selection on one handset through Run().
-    Harness solo;
-    m_kit.Configure(solo, QStringLiteral("solo1"), LogRoot(), m_log.log());
-    for (const QSharedPointer<_TestModule> &module : selection)
-        solo.AddTest(solo.FindTestModule(module->moduleName, module->Source()));
-    ASSERT_TRUE(solo.Run()) << m_log.Text().toStdString();
-    solo.DisconnectTarget();
-    const QMap<QString, QString> reference = Verdicts(QStringLiteral("solo1"), m_kit.ModuleNames());
+    ASSERT_TRUE(m_run.RunModules(m_run.NewHarness(u"solo1"_s), m_names)) << m_run.LogText().toStdString();
+    const QMap<QString, QString> reference = Verdicts(u"solo1"_s, m_names);
     ASSERT_EQ(reference.size(), 2 * selection.size());
 
-    ShardedRun run(m_log.log());
-    AddWorkers(run, handsets);
-    ASSERT_TRUE(run.Run(selection)) << m_log.Text().toStdString();
+    ShardedRun run(m_run.log());
+    const QList<Harness *> workers = AddWorkers(run, handsets);
+    ASSERT_TRUE(run.Run(selection)) << m_run.LogText().toStdString();
 
     // Every module ran once, on one handset, and its verdicts are in that
     // handset's own results file.
@@ -141,7 +93,7 @@ TEST_F(ShardedRunTest, FourHandsetsShareTheQueueAndMatchAOneHandsetRun)
     EXPECT_GT(byHandset.size(), 1);
 
     const QMap<QString, QStringList> done = Completions();
-    for (const QString &name : m_kit.ModuleNames()) {
+    for (const QString &name : m_names) {
         // Once on the solo handset, once on one of the four.
         EXPECT_EQ(done.value(name).size(), 2) << name.toStdString();
     }
@@ -152,9 +104,9 @@ TEST_F(ShardedRunTest, FourHandsetsShareTheQueueAndMatchAOneHandsetRun)
         EXPECT_EQ(handset.modulesRun, byHandset.value(handset.handset).size());
         total += handset.modulesRun;
         // Everything the run put on the handset is gone again.
-        EXPECT_TRUE(QDir(m_handsets.HostPath(handset.handset, QStringLiteral("fs:/usermods")))
+        EXPECT_TRUE(QDir(m_run.Handsets().HostPath(handset.handset, u"fs:/usermods"_s))
                         .entryList(QDir::Dirs | QDir::NoDotAndDotDot)
-                        .filter(QRegularExpression(QStringLiteral("^(ctf|ctfapplet|Ctf\\d+|App\\d+)$")))
+                        .filter(QRegularExpression(u"^(ctf|ctfapplet|Ctf\\d+|App\\d+)$"_s))
                         .isEmpty())
             << handset.handset.toStdString();
     }
@@ -168,66 +120,66 @@ TEST_F(ShardedRunTest, FourHandsetsShareTheQueueAndMatchAOneHandsetRun)
         EXPECT_EQ(timings.ExpectedMs(module.name, module.source), module.record.durationMs);
     }
     // Every worker closed the connection it opened.
-    for (const std::unique_ptr<Harness> &harness : m_harnesses)
+    for (const Harness *harness : workers)
         EXPECT_TRUE(harness->ConnectedTarget().isEmpty());
 }
 
 TEST_F(ShardedRunTest, AHandsetGoingOfflineHandsItsModuleToTheOthers)
 {
-    const QStringList handsets = shardkit::ShardKit::AddHandsets(m_handsets, 2);
+    const QStringList handsets = m_run.AddHandsets(2);
     // h2 goes offline while running its second module.
-    WriteFile(m_handsets.HandsetFolder(QStringLiteral("h2")) + QStringLiteral("/drop-at"), "2\n");
-    ShardedRun run(m_log.log());
+    WriteFile(m_run.HandsetFolder(u"h2"_s) + u"/drop-at"_s, "2\n");
+    ShardedRun run(m_run.log());
     AddWorkers(run, handsets);
-    const QList<QSharedPointer<_TestModule>> selection = Selection();
-    ASSERT_TRUE(run.Run(selection)) << m_log.Text().toStdString();
+    const QList<QSharedPointer<_TestModule>> selection = m_run.Select();
+    ASSERT_TRUE(run.Run(selection)) << m_run.LogText().toStdString();
 
     const QList<ShardedRun::HandsetResult> results = run.Handsets();
     ASSERT_EQ(results.size(), 2);
     EXPECT_FALSE(results.at(0).lost);
     EXPECT_TRUE(results.at(1).lost);
-    EXPECT_EQ(results.at(1).handset, QStringLiteral("h2"));
+    EXPECT_EQ(results.at(1).handset, u"h2"_s);
     EXPECT_EQ(results.at(1).modulesRun, 1);
     EXPECT_TRUE(results.at(1).lostAt.isValid());
     // Dropped at once, not after the ten minutes a log may take.
     EXPECT_LT(results.at(1).lostAfterMs, 600000);
-    EXPECT_TRUE(m_log.Text().contains(QStringLiteral("Handset h2 dropped out at ")));
+    EXPECT_TRUE(m_run.LogText().contains(u"Handset h2 dropped out at "_s));
 
     // The module h2 had in hand started there, ran to the end on h1, and
     // nothing ran to the end twice.
     QString interrupted;
-    for (const QString &line : shardkit::ShardKit::Runs(m_handsets)) {
-        if (line.startsWith(QLatin1String("start ")) && line.endsWith(QLatin1String(" h2")))
-            interrupted = line.section(QLatin1Char(' '), 1, 1);
+    for (const QString &line : m_run.Runs()) {
+        if (line.startsWith(u"start "_s) && line.endsWith(u" h2"_s))
+            interrupted = line.section(u' ', 1, 1);
     }
     ASSERT_FALSE(interrupted.isEmpty());
     const QMap<QString, QStringList> done = Completions();
-    for (const QString &name : m_kit.ModuleNames())
+    for (const QString &name : m_names)
         EXPECT_EQ(done.value(name).size(), 1) << name.toStdString();
-    EXPECT_EQ(done.value(interrupted), QStringList{QStringLiteral("h1")});
+    EXPECT_EQ(done.value(interrupted), QStringList{u"h1"_s});
     for (const ShardedRun::ModuleResult &module : run.Modules()) {
         EXPECT_EQ(module.outcome, ModuleSource::Recorded) << module.name.toStdString();
         EXPECT_EQ(module.attempts, module.name == interrupted ? 2 : 1) << module.name.toStdString();
     }
     // h2's results file holds only the module it completed.
-    const QMap<QString, QString> onH2 = Verdicts(QStringLiteral("h2"), m_kit.ModuleNames());
+    const QMap<QString, QString> onH2 = Verdicts(u"h2"_s, m_names);
     int executed = 0;
     for (const QString &verdict : onH2)
-        executed += verdict != QLatin1String("unexecuted");
+        executed += verdict != u"unexecuted"_s;
     EXPECT_EQ(executed, 2);
-    EXPECT_EQ(onH2.value(interrupted + QStringLiteral("/first")), QStringLiteral("unexecuted"));
+    EXPECT_EQ(onH2.value(interrupted + u"/first"_s), u"unexecuted"_s);
 }
 
 TEST_F(ShardedRunTest, WhenEveryHandsetIsGoneTheModulesLeftAreListed)
 {
-    const QStringList handsets = shardkit::ShardKit::AddHandsets(m_handsets, 3);
-    WriteFile(m_handsets.HandsetFolder(QStringLiteral("h1")) + QStringLiteral("/drop-at"), "2\n");
-    WriteFile(m_handsets.HandsetFolder(QStringLiteral("h2")) + QStringLiteral("/drop-at"), "1\n");
+    const QStringList handsets = m_run.AddHandsets(3);
+    WriteFile(m_run.HandsetFolder(u"h1"_s) + u"/drop-at"_s, "2\n");
+    WriteFile(m_run.HandsetFolder(u"h2"_s) + u"/drop-at"_s, "1\n");
     // h3 refuses the connection from the start.
-    WriteFile(m_handsets.HandsetFolder(QStringLiteral("h3")) + QStringLiteral("/offline"), "");
-    ShardedRun run(m_log.log());
+    WriteFile(m_run.HandsetFolder(u"h3"_s) + u"/offline"_s, "");
+    ShardedRun run(m_run.log());
     AddWorkers(run, handsets);
-    EXPECT_FALSE(run.Run(Selection()));
+    EXPECT_FALSE(run.Run(m_run.Select()));
 
     const QList<ShardedRun::HandsetResult> results = run.Handsets();
     for (const ShardedRun::HandsetResult &handset : results)
@@ -240,17 +192,16 @@ TEST_F(ShardedRunTest, WhenEveryHandsetIsGoneTheModulesLeftAreListed)
     EXPECT_EQ(notRun.size(), kCtfModules + kAppletModules - 1);
     for (const ShardedRun::ModuleResult &module : run.Modules())
         EXPECT_EQ(module.ran, !notRun.contains(module.name)) << module.name.toStdString();
-    EXPECT_TRUE(m_log.Text().contains(
-        QStringLiteral("Every handset has dropped out; %1 modules never ran: ").arg(notRun.size())));
+    EXPECT_TRUE(m_run.LogText().contains(u"Every handset has dropped out; %1 modules never ran: "_s.arg(notRun.size())));
 }
 
 TEST_F(ShardedRunTest, NothingToRunOrNoHandsetIsRefused)
 {
-    ShardedRun run(m_log.log());
+    ShardedRun run(m_run.log());
     EXPECT_FALSE(run.Run({}));
-    EXPECT_TRUE(m_log.Text().contains(QStringLiteral("No modules to run.")));
-    EXPECT_FALSE(run.Run(Selection()));
-    EXPECT_TRUE(m_log.Text().contains(QStringLiteral("No handsets to run on.\n")));
+    EXPECT_TRUE(m_run.LogText().contains(u"No modules to run."_s));
+    EXPECT_FALSE(run.Run(m_run.Select()));
+    EXPECT_TRUE(m_run.LogText().contains(u"No handsets to run on.\n"_s));
     EXPECT_EQ(run.NotRun().size(), kCtfModules + kAppletModules);
 }
 

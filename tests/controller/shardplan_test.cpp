@@ -16,6 +16,8 @@
 #include <algorithm>
 #include <random>
 
+using namespace Qt::StringLiterals;
+
 namespace {
 
 using Module = ShardPlan::Module;
@@ -25,7 +27,7 @@ QMap<QString, int> Assignment(const ShardPlan &plan)
 {
     QMap<QString, int> shards;
     for (const ShardPlan::Entry &entry : plan.Modules())
-        shards.insert(entry.source + QLatin1Char('/') + entry.name, entry.shard);
+        shards.insert(entry.source + u'/' + entry.name, entry.shard);
     return shards;
 }
 
@@ -37,13 +39,13 @@ TEST(ShardPlanTest, EveryModuleLandsInExactlyOneShardForAnyCount)
         const int size = int(random() % 150);
         for (int i = 0; i < size; ++i) {
             const bool known = random() % 3 != 0;
-            selection.append({QStringLiteral("M%1").arg(random() % 200), i % 2 ? QStringLiteral("PVS") : QStringLiteral("KVK"),
+            selection.append({u"M%1"_s.arg(random() % 200), i % 2 ? u"PVS"_s : u"KVK"_s,
                               int(random() % 20), known ? qint64(random() % 100000) : -1});
         }
         const ShardPlan plan = ShardPlan::Make(selection, count);
         QSet<QString> distinct;
         for (const Module &module : selection)
-            distinct.insert(module.source + QLatin1Char('/') + module.name);
+            distinct.insert(module.source + u'/' + module.name);
         ASSERT_EQ(plan.Modules().size(), distinct.size()) << count;
         qsizetype inShards = 0;
         qint64 total = 0;
@@ -69,7 +71,7 @@ TEST(ShardPlanTest, PlanIsTheSameWhateverTheSelectionOrder)
 {
     QList<Module> selection;
     for (int i = 0; i < 60; ++i)  // many equal times, so only the tie rule decides
-        selection.append({QStringLiteral("Mod%1").arg(i), QStringLiteral("KVK"), 3, i % 4 ? 1000 : -1});
+        selection.append({u"Mod%1"_s.arg(i), u"KVK"_s, 3, i % 4 ? 1000 : -1});
     const QMap<QString, int> reference = Assignment(ShardPlan::Make(selection, 7));
     std::mt19937 random(7);
     for (int round = 0; round < 5; ++round) {
@@ -82,11 +84,11 @@ TEST(ShardPlanTest, LongestFirstBalancesAndUnknownModulesCountTheirTestCases)
 {
     // Known: 6000 ms for 3 test cases and 1000 ms for 1: the median is 1500
     // ms per test case (of 2000 and 1000), so 4 test cases count 6000 ms.
-    const QList<Module> selection{{QStringLiteral("a"), QStringLiteral("KVK"), 3, 6000},
-                                  {QStringLiteral("b"), QStringLiteral("KVK"), 1, 1000},
-                                  {QStringLiteral("c"), QStringLiteral("KVK"), 4, -1},
-                                  {QStringLiteral("d"), QStringLiteral("KVK"), 0, -1},
-                                  {QStringLiteral("B"), QStringLiteral("KVK"), 9, 9}};  // "b" again
+    const QList<Module> selection{{u"a"_s, u"KVK"_s, 3, 6000},
+                                  {u"b"_s, u"KVK"_s, 1, 1000},
+                                  {u"c"_s, u"KVK"_s, 4, -1},
+                                  {u"d"_s, u"KVK"_s, 0, -1},
+                                  {u"B"_s, u"KVK"_s, 9, 9}};  // "b" again
     const ShardPlan plan = ShardPlan::Make(selection, 2);
     ASSERT_EQ(plan.Modules().size(), 4);
     EXPECT_EQ(plan.Modules().at(2).expectedMs, 6000);
@@ -98,7 +100,7 @@ TEST(ShardPlanTest, LongestFirstBalancesAndUnknownModulesCountTheirTestCases)
     EXPECT_EQ(plan.LongestShardMs(), 7500);
 
     // Nothing known: the default time per test case.
-    const ShardPlan blind = ShardPlan::Make({{QStringLiteral("x"), QStringLiteral("KVK"), 2, -1}}, 3);
+    const ShardPlan blind = ShardPlan::Make({{u"x"_s, u"KVK"_s, 2, -1}}, 3);
     EXPECT_EQ(blind.Modules().at(0).expectedMs, 2 * ShardPlan::kDefaultMsPerTestCase);
 
     EXPECT_EQ(plan.Format(1), QStringLiteral("Shard 1 of 2: 2 modules, expected 7.0 s\n"
@@ -106,7 +108,7 @@ TEST(ShardPlanTest, LongestFirstBalancesAndUnknownModulesCountTheirTestCases)
                                              "  c       KVK      6.0 s  (estimated from test cases)\n"));
     EXPECT_TRUE(plan.Format().startsWith(QStringLiteral("4 modules in 2 shards; longest shard 7.5 s, mean 7.3 s\n"
                                                         "Shard 0 of 2: 2 modules, expected 7.5 s\n")));
-    EXPECT_EQ(ShardPlan::FormatDuration(3723400), QStringLiteral("1:02:03"));
+    EXPECT_EQ(ShardPlan::FormatDuration(3723400), u"1:02:03"_s);
 }
 
 struct SettingRow
@@ -136,7 +138,7 @@ TEST_P(ShardSettingTest, ReadsOptionsAndEngineVariables)
         EXPECT_EQ(setting.index, row.expectedIndex) << row.what;
         EXPECT_EQ(setting.count, row.expectedCount) << row.what;
         EXPECT_EQ(setting.sharded, row.expectedCount > 1 || !row.index.isEmpty() || !row.count.isEmpty()
-                                       || row.environment.contains(QStringLiteral("TEST_SHARD_INDEX")))
+                                       || row.environment.contains(u"TEST_SHARD_INDEX"_s))
             << row.what;
     } else {
         EXPECT_TRUE(error.contains(QLatin1String(row.errorPart))) << row.what << ": " << error.toStdString();
@@ -186,70 +188,70 @@ TEST(ShardSettingTest, CountAloneServesThePlanOfEveryShardAndBazelLearnsOfShardi
     QTemporaryDir dir;
     ShardSetting setting;
     QString error;
-    ASSERT_TRUE(ShardSetting::Resolve(QString(), QStringLiteral("4"),
-                                      {{QStringLiteral("TEST_SHARD_STATUS_FILE"), dir.filePath(QStringLiteral("out/status"))}},
+    ASSERT_TRUE(ShardSetting::Resolve(QString(), u"4"_s,
+                                      {{u"TEST_SHARD_STATUS_FILE"_s, dir.filePath(u"out/status"_s)}},
                                       false, &setting, &error))
         << error.toStdString();
     EXPECT_EQ(setting.index, -1);
     EXPECT_EQ(setting.count, 4);
     ASSERT_TRUE(setting.TouchStatusFile(&error)) << error.toStdString();
-    EXPECT_TRUE(QFileInfo::exists(dir.filePath(QStringLiteral("out/status"))));
+    EXPECT_TRUE(QFileInfo::exists(dir.filePath(u"out/status"_s)));
 
-    setting.statusFile = dir.filePath(QStringLiteral("out/status")) + QStringLiteral("/below-a-file");
+    setting.statusFile = dir.filePath(u"out/status"_s) + u"/below-a-file"_s;
     EXPECT_FALSE(setting.TouchStatusFile(&error));
-    EXPECT_TRUE(error.contains(QLatin1String("TEST_SHARD_STATUS_FILE")));
+    EXPECT_TRUE(error.contains(u"TEST_SHARD_STATUS_FILE"_s));
 }
 
 ModuleTimings::Run At(qint64 ms, const QString &host, int minute)
 {
-    return {ms, QStringLiteral("h1"), host, QDateTime(QDate(2026, 12, 6), QTime(20, minute), QTimeZone::utc())};
+    return {ms, u"h1"_s, host, QDateTime(QDate(2026, 12, 6), QTime(20, minute), QTimeZone::utc())};
 }
 
 TEST(ModuleTimingsTest, RecordsMergesAndKeepsTheRecentRuns)
 {
     QTemporaryDir dir;
-    const QString a = dir.filePath(QStringLiteral("a/Timings.json"));
-    const QString b = dir.filePath(QStringLiteral("b/Timings.json"));
-    QDir().mkpath(dir.filePath(QStringLiteral("a")));
-    QDir().mkpath(dir.filePath(QStringLiteral("b")));
+    const QString a = dir.filePath(u"a/Timings.json"_s);
+    const QString b = dir.filePath(u"b/Timings.json"_s);
+    QDir().mkpath(dir.filePath(u"a"_s));
+    QDir().mkpath(dir.filePath(u"b"_s));
     QString error;
     for (int i = 0; i < 12; ++i)  // 100, 200, ... 1200 ms on host a
-        ASSERT_TRUE(ModuleTimings::Record(a, QStringLiteral("Audio"), QStringLiteral("KVK"), At(100 * (i + 1), QStringLiteral("a"), i), &error))
+        ASSERT_TRUE(ModuleTimings::Record(a, u"Audio"_s, u"KVK"_s, At(100 * (i + 1), u"a"_s, i), &error))
             << error.toStdString();
-    ASSERT_TRUE(ModuleTimings::Record(b, QStringLiteral("AUDIO"), QStringLiteral("KVK"), At(50, QStringLiteral("b"), 30), &error));
-    ASSERT_TRUE(ModuleTimings::Record(b, QStringLiteral("Audio"), QStringLiteral("PVS"), At(7, QStringLiteral("b"), 31), &error));
+    ASSERT_TRUE(ModuleTimings::Record(b, u"AUDIO"_s, u"KVK"_s, At(50, u"b"_s, 30), &error));
+    ASSERT_TRUE(ModuleTimings::Record(b, u"Audio"_s, u"PVS"_s, At(7, u"b"_s, 31), &error));
 
     ModuleTimings timings;
     ASSERT_TRUE(timings.Read(a)) << timings.ErrorString().toStdString();
     // The ten most recent: 300 .. 1200; median (700 + 800) / 2.
-    EXPECT_EQ(timings.Runs(QStringLiteral("audio"), QStringLiteral("KVK")).size(), ModuleTimings::kRecentRuns);
-    EXPECT_EQ(timings.ExpectedMs(QStringLiteral("Audio"), QStringLiteral("KVK")), 750);
-    EXPECT_EQ(timings.ExpectedMs(QStringLiteral("Audio"), QStringLiteral("PVS")), -1);
+    EXPECT_EQ(timings.Runs(u"audio"_s, u"KVK"_s).size(), ModuleTimings::kRecentRuns);
+    EXPECT_EQ(timings.ExpectedMs(u"Audio"_s, u"KVK"_s), 750);
+    EXPECT_EQ(timings.ExpectedMs(u"Audio"_s, u"PVS"_s), -1);
 
     ASSERT_TRUE(timings.Merge(b)) << timings.ErrorString().toStdString();
     ASSERT_TRUE(timings.Merge(a));  // the same runs again change nothing
-    const QList<ModuleTimings::Run> runs = timings.Runs(QStringLiteral("Audio"), QStringLiteral("KVK"));
+    const QList<ModuleTimings::Run> runs = timings.Runs(u"Audio"_s, u"KVK"_s);
     ASSERT_EQ(runs.size(), ModuleTimings::kRecentRuns);
-    EXPECT_EQ(runs.last().host, QStringLiteral("b"));  // the latest, from the other host
+    EXPECT_EQ(runs.last().host, u"b"_s);  // the latest, from the other host
     EXPECT_EQ(runs.first().ms, 400);
-    EXPECT_EQ(timings.ExpectedMs(QStringLiteral("Audio"), QStringLiteral("PVS")), 7);
+    EXPECT_EQ(timings.ExpectedMs(u"Audio"_s, u"PVS"_s), 7);
     EXPECT_EQ(timings.ModuleCount(), 2);
 
-    const QString merged = dir.filePath(QStringLiteral("merged.json"));
+    const QString merged = dir.filePath(u"merged.json"_s);
     ASSERT_TRUE(timings.Save(merged));
     ModuleTimings again;
     ASSERT_TRUE(again.Read(merged));
-    EXPECT_EQ(again.Runs(QStringLiteral("Audio"), QStringLiteral("KVK")), runs);
-    EXPECT_EQ(ModuleTimings::PathFor(QStringLiteral("h1")).section(QLatin1Char('/'), -3),
-              QStringLiteral("Logs/ProcessedResults/Timings.json"));
+    EXPECT_EQ(again.Runs(u"Audio"_s, u"KVK"_s), runs);
+    EXPECT_EQ(ModuleTimings::PathFor(u"h1"_s).section(u'/', -3),
+              u"Logs/ProcessedResults/Timings.json"_s);
 }
 
 TEST(ModuleTimingsTest, RefusesBadOrForeignFilesAndLosesNothing)
 {
     QTemporaryDir dir;
-    const QString path = dir.filePath(QStringLiteral("Timings.json"));
-    const QString good = dir.filePath(QStringLiteral("good.json"));
-    ASSERT_TRUE(ModuleTimings::Record(good, QStringLiteral("Audio"), QStringLiteral("KVK"), At(10, QStringLiteral("a"), 0)));
+    const QString path = dir.filePath(u"Timings.json"_s);
+    const QString good = dir.filePath(u"good.json"_s);
+    ASSERT_TRUE(ModuleTimings::Record(good, u"Audio"_s, u"KVK"_s, At(10, u"a"_s, 0)));
     const QList<QPair<QByteArray, const char *>> rows{
         {"{\"modules\": [", "not JSON"},
         {"[1, 2]", "not a timings file"},
@@ -268,14 +270,14 @@ TEST(ModuleTimingsTest, RefusesBadOrForeignFilesAndLosesNothing)
         ASSERT_TRUE(timings.Read(good));
         EXPECT_FALSE(timings.Merge(path)) << message;
         EXPECT_TRUE(timings.ErrorString().contains(QLatin1String(message))) << timings.ErrorString().toStdString();
-        EXPECT_EQ(timings.ExpectedMs(QStringLiteral("Audio"), QStringLiteral("KVK")), 10) << message;
+        EXPECT_EQ(timings.ExpectedMs(u"Audio"_s, u"KVK"_s), 10) << message;
         QString error;
-        EXPECT_FALSE(ModuleTimings::Record(path, QStringLiteral("B"), QStringLiteral("KVK"), At(1, QStringLiteral("a"), 1), &error)) << message;
+        EXPECT_FALSE(ModuleTimings::Record(path, u"B"_s, u"KVK"_s, At(1, u"a"_s, 1), &error)) << message;
         EXPECT_EQ(testutil::ReadFile(path), bytes) << message;
     }
     ModuleTimings timings;
-    EXPECT_FALSE(timings.Read(dir.filePath(QStringLiteral("missing.json"))));
-    EXPECT_TRUE(timings.ErrorString().contains(QLatin1String("cannot open")));
+    EXPECT_FALSE(timings.Read(dir.filePath(u"missing.json"_s)));
+    EXPECT_TRUE(timings.ErrorString().contains(u"cannot open"_s));
 }
 
 } // namespace

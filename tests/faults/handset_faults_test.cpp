@@ -6,41 +6,37 @@
 // In every case the run must end (quickly, with the instant clock), report
 // what happened, and keep every verdict recorded before.
 
-#include "controller/controllertest.h"
-
 #include "common/clock.h"
+#include "controller/harness.h"
 #include "environment/testdirectories.h"
-#include "support/handsetfixture.h"
-#include "support/kitbuilder.h"
+#include "support/kitrun.h"
 
 #include <QDir>
 #include <QDirIterator>
 #include <QSettings>
 
-#include <memory>
+#include <gtest/gtest.h>
+
 #include <set>
 
 using namespace Qt::StringLiterals;
 
 namespace {
 
-using controllertest::ReadResults;
-using controllertest::ResultsView;
-using harnesstest::CapturedLog;
-using testutil::EnvGuard;
+using testutil::CapturedLog;
 using testutil::ReadFile;
+using testutil::ReadResults;
+using testutil::ResultsView;
 using testutil::WriteFile;
 
 // A CTF module's behaviour: the shared CTF log with two verdicts, ended by
 // the end marker unless told otherwise.
-QByteArray CtfBehaviour(const QString &suite, const QString &passing, const QString &failing,
-                        bool ends = true)
+QByteArray CtfBehaviour(const QString &suite, const QString &passing, const QString &failing, bool ends = true)
 {
     return u"mkdir -p usermods/CTF\n"
-                          "printf 'Suite: %1\\nTest: %2\\nResult: Pass\\nTest: %3\\nResult: Fail\\n%4' "
-                          "> usermods/CTF/CTF.log\n"_s
-        .arg(suite, passing, failing, ends ? u"[/VERBOSE]\\n"_s : QString())
-        .toUtf8();
+           "printf 'Suite: %1\\nTest: %2\\nResult: Pass\\nTest: %3\\nResult: Fail\\n%4' "
+           "> usermods/CTF/CTF.log\n"_s.arg(suite, passing, failing, ends ? u"[/VERBOSE]\\n"_s : QString())
+               .toUtf8();
 }
 
 kitbuilder::Module CtfModule(const QString &name, unsigned int classId, const QStringList &cases)
@@ -61,56 +57,30 @@ kitbuilder::Module CtfModule(const QString &name, unsigned int classId, const QS
 class HandsetFaultTest : public ::testing::Test
 {
 protected:
-    HandsetFaultTest()
-        : m_env("KESTIX_DATA_ROOT", m_dir.filePath(u"data"_s)),
-          m_kit(m_dir.filePath(u"kit"_s))
-    {
-    }
-
     void SetUp() override
     {
-        ASSERT_TRUE(m_dir.isValid());
-        m_kit.AddFrameworkPackage(u"testframeworks"_s, u"ctf"_s, u"Win32"_s, u"Debug"_s);
+        m_run.Kit().AddFrameworkPackage(u"testframeworks"_s, u"ctf"_s, u"Win32"_s, u"Debug"_s);
         AddModule(CtfModule(u"Audio"_s, 0x01230001, {u"play"_s, u"record"_s}));
         AddModule(CtfModule(u"Video"_s, 0x01230002, {u"show"_s, u"seek"_s}));
-        ASSERT_TRUE(m_kit.Ok()) << m_kit.Errors().join(QLatin1Char('\n')).toStdString();
-        m_handsets.AddHandset(u"phone"_s, u"Emulated phone"_s, u"win32"_s);
+        ASSERT_TRUE(m_run.KitOk());
+        m_run.AddHandset(u"phone"_s);
     }
 
     void AddModule(const kitbuilder::Module &module)
     {
-        m_kit.AddSourceModule(u"tests/"_s + module.name.toLower(), module);
+        m_run.Kit().AddSourceModule(u"tests/"_s + module.name.toLower(), module);
     }
 
-    // A harness set up for the kit and the handset; logs go to LogFolder().
-    std::unique_ptr<Harness> MakeHarness()
+    bool RunModules(const QStringList &names, Log *log = nullptr)
     {
-        auto harness = std::make_unique<Harness>();
-        harness->SetLogger(m_log.log());
-        harness->SetTestkit(m_kit.Root());
-        harness->SetTarget(u"phone"_s);
-        harness->SetLogOutputPath(LogFolder());
-        return harness;
+        Harness harness;
+        m_run.Configure(harness, u"phone"_s, log ? log : m_run.log());
+        return m_run.RunModules(harness, names);
     }
 
-    // Queues the kit modules of those names and runs them.
-    bool RunModules(Harness &harness, const QStringList &names)
-    {
-        for (const QString &name : names) {
-            QList<QSharedPointer<_TestModule>> found;
-            harness.GetTestModules(found, QStringList{name}, QString(), QString());
-            EXPECT_EQ(found.size(), 1) << name.toStdString();
-            for (const QSharedPointer<_TestModule> &module : found)
-                harness.AddTest(module);
-        }
-        const bool result = harness.Run();
-        harness.DisconnectTarget();
-        return result;
-    }
-
-    QString LogFolder() const { return m_dir.filePath(u"logs"_s); }
-    QString ResultsPath() const { return TestDirectories::GetProcessResultsPath(u"phone"_s); }
-    QString HandsetFolder() const { return m_handsets.HandsetFolder(u"phone"_s); }
+    QString LogFolder() const { return m_run.LogFolder(u"phone"_s); }
+    QString ResultsPath() const { return m_run.ResultsPath(u"phone"_s); }
+    QString HandsetFolder() const { return m_run.HandsetFolder(u"phone"_s); }
 
     void SetHandsetKey(const QString &key, const QVariant &value)
     {
@@ -131,18 +101,13 @@ protected:
         ASSERT_TRUE(QDir().mkpath(HandsetFolder() + u"/fs"_s));
     }
 
-    QTemporaryDir m_dir;
-    EnvGuard m_env;
-    kitbuilder::KitBuilder m_kit;
-    testutil::HandsetFixture m_handsets;
-    CapturedLog m_log;
+    testutil::KitRun m_run;
 };
 
-const QMap<QString, QString> kAllRecorded{
-    {u"Audio/play"_s, u"pass"_s},
-    {u"Audio/record"_s, u"fail"_s},
-    {u"Video/show"_s, u"pass"_s},
-    {u"Video/seek"_s, u"fail"_s}};
+const QMap<QString, QString> kAllRecorded{{u"Audio/play"_s, u"pass"_s},
+                                          {u"Audio/record"_s, u"fail"_s},
+                                          {u"Video/show"_s, u"pass"_s},
+                                          {u"Video/seek"_s, u"fail"_s}};
 
 // The step of a module's run at which the handset was lost, told from the
 // messages of one run; empty when it was not lost.
@@ -167,11 +132,8 @@ QString LostAt(const QString &log)
 
 TEST_F(HandsetFaultTest, HandsetLostAtAnyStepEndsTheRunAndKeepsRecordedVerdicts)
 {
-    {
-        auto harness = MakeHarness();
-        ASSERT_TRUE(RunModules(*harness, {u"Audio"_s, u"Video"_s}));
-    }
-    ASSERT_EQ(ReadResults(ResultsPath()).verdicts, kAllRecorded) << m_log.Text().toStdString();
+    ASSERT_TRUE(RunModules({u"Audio"_s, u"Video"_s}));
+    ASSERT_EQ(ReadResults(ResultsPath()).verdicts, kAllRecorded) << m_run.LogText().toStdString();
 
     // The handset answers n operations of the next run and then drops out;
     // n grows until a whole run of Video gets through.
@@ -182,9 +144,7 @@ TEST_F(HandsetFaultTest, HandsetLostAtAnyStepEndsTheRunAndKeepsRecordedVerdicts)
         ResetHandset();
         SetHandsetKey(u"offlineAfter"_s, answered);
         CapturedLog log;
-        auto harness = MakeHarness();
-        harness->SetLogger(log.log());
-        const bool result = RunModules(*harness, {u"Video"_s});
+        const bool result = RunModules({u"Video"_s}, log.log());
         const QString text = log.Text();
         const bool lost = QFileInfo::exists(HandsetFolder() + u"/offline"_s);
         completed = !lost;
@@ -204,31 +164,19 @@ TEST_F(HandsetFaultTest, HandsetLostAtAnyStepEndsTheRunAndKeepsRecordedVerdicts)
     }
     EXPECT_TRUE(completed);
     SetHandsetKey(u"offlineAfter"_s, QVariant());
-    EXPECT_EQ(steps, (std::set<QString>{u"install"_s, u"start"_s,
-                                        u"log wait"_s, u"copy"_s,
-                                        u"remove"_s, u"unload"_s}));
+    EXPECT_EQ(steps, (std::set<QString>{u"install"_s, u"start"_s, u"log wait"_s, u"copy"_s, u"remove"_s, u"unload"_s}));
 }
 
-class NeverEndingLogTest : public HandsetFaultTest
+TEST_F(HandsetFaultTest, NeverEndingLogIsTakenAfterTheBoundedWaitWithWhatItHolds)
 {
-protected:
-    void SetUp() override
-    {
-        HandsetFaultTest::SetUp();
-        kitbuilder::Module endless = CtfModule(u"Endless"_s, 0x01230003, {u"first"_s, u"second"_s});
-        endless.package.behaviour = CtfBehaviour(u"Endless"_s, u"first"_s, u"second"_s, false);
-        AddModule(endless);
-        ASSERT_TRUE(m_kit.Ok());
-    }
-};
-
-TEST_F(NeverEndingLogTest, RunMovesOnAfterTheBoundedWaitWithWhatTheLogHolds)
-{
-    auto harness = MakeHarness();
+    kitbuilder::Module endless = CtfModule(u"Endless"_s, 0x01230003, {u"first"_s, u"second"_s});
+    endless.package.behaviour = CtfBehaviour(u"Endless"_s, u"first"_s, u"second"_s, false);
+    AddModule(endless);
+    ASSERT_TRUE(m_run.KitOk());
     Clock::Timer timer;
-    ASSERT_TRUE(RunModules(*harness, {u"Endless"_s, u"Audio"_s}));
+    ASSERT_TRUE(RunModules({u"Endless"_s, u"Audio"_s}));
     RecordProperty("wall_ms", int(timer.Elapsed()));
-    const QString log = m_log.Text();
+    const QString log = m_run.LogText();
     EXPECT_TRUE(log.contains(u"   Removing test Endless\n"_s)) << log.toStdString();
     const ResultsView view = ReadResults(ResultsPath());
     EXPECT_EQ(view.verdicts.value(u"Endless/first"_s), u"pass"_s);
@@ -236,31 +184,20 @@ TEST_F(NeverEndingLogTest, RunMovesOnAfterTheBoundedWaitWithWhatTheLogHolds)
     EXPECT_EQ(view.verdicts.value(u"Audio/play"_s), u"pass"_s);
 }
 
-class HugeLogTest : public HandsetFaultTest
+TEST_F(HandsetFaultTest, HugeLogIsCopiedParsedAndRecorded)
 {
-protected:
-    void SetUp() override
-    {
-        HandsetFaultTest::SetUp();
-        kitbuilder::Module chatty = CtfModule(u"Chatty"_s, 0x01230004, {u"early"_s, u"late"_s});
-        // About 24 MB: a verdict, half a million lines of chatter, one line
-        // of 4 MB without a break, then the last verdict and the end marker.
-        chatty.package.behaviour =
-            "mkdir -p usermods/CTF\n"
-            "{ printf 'Suite: Chatty\\nTest: early\\nResult: Pass\\n'\n"
-            "  yes 'chatter from a test that tells everything it does' | head -n 400000\n"
-            "  head -c 4000000 /dev/zero | tr '\\0' 'x'\n"
-            "  printf '\\nTest: late\\nResult: Fail\\n[/VERBOSE]\\n'\n"
-            "} > usermods/CTF/CTF.log\n";
-        AddModule(chatty);
-        ASSERT_TRUE(m_kit.Ok());
-    }
-};
-
-TEST_F(HugeLogTest, HugeLogIsCopiedParsedAndRecorded)
-{
-    auto harness = MakeHarness();
-    ASSERT_TRUE(RunModules(*harness, {u"Chatty"_s})) << m_log.Text().toStdString();
+    kitbuilder::Module chatty = CtfModule(u"Chatty"_s, 0x01230004, {u"early"_s, u"late"_s});
+    // About 24 MB: a verdict, half a million lines of chatter, one line of 4
+    // MB without a break, then the last verdict and the end marker.
+    chatty.package.behaviour = "mkdir -p usermods/CTF\n"
+                               "{ printf 'Suite: Chatty\\nTest: early\\nResult: Pass\\n'\n"
+                               "  yes 'chatter from a test that tells everything it does' | head -n 400000\n"
+                               "  head -c 4000000 /dev/zero | tr '\\0' 'x'\n"
+                               "  printf '\\nTest: late\\nResult: Fail\\n[/VERBOSE]\\n'\n"
+                               "} > usermods/CTF/CTF.log\n";
+    AddModule(chatty);
+    ASSERT_TRUE(m_run.KitOk());
+    ASSERT_TRUE(RunModules({u"Chatty"_s})) << m_run.LogText().toStdString();
     const ResultsView view = ReadResults(ResultsPath());
     EXPECT_EQ(view.verdicts.value(u"Chatty/early"_s), u"pass"_s);
     EXPECT_EQ(view.verdicts.value(u"Chatty/late"_s), u"fail"_s);
@@ -286,15 +223,14 @@ TEST_P(CorruptMifTest, ModuleFailsToStartAndTheRunGoesOn)
     // The package, written again with the damaged file in place.
     testutil::Members members = testutil::ModuleMembers(broken.package);
     for (auto &member : members) {
-        if (member.first.endsWith(QLatin1String(".mif")))
+        if (member.first.endsWith(u".mif"_s))
             member.second = mif;
     }
-    m_kit.AddPackage(folder + u"/package"_s, u"Broken_Win32_Debug"_s, members);
-    ASSERT_TRUE(m_kit.Ok());
+    m_run.Kit().AddPackage(folder + u"/package"_s, u"Broken_Win32_Debug"_s, members);
+    ASSERT_TRUE(m_run.KitOk());
 
-    auto harness = MakeHarness();
-    ASSERT_TRUE(RunModules(*harness, {u"Broken"_s, u"Audio"_s}));
-    const QString log = m_log.Text();
+    ASSERT_TRUE(RunModules({u"Broken"_s, u"Audio"_s}));
+    const QString log = m_run.LogText();
     EXPECT_TRUE(log.contains(u"Test Broken Failed\n"_s)) << log.toStdString();
     EXPECT_FALSE(log.contains(u"Device Connection has died."_s));
     const ResultsView view = ReadResults(ResultsPath());
@@ -314,19 +250,15 @@ TEST_F(HandsetFaultTest, UnwritableResultsFileIsReportedAndTheLogsStayForReproce
     const QString folder = QFileInfo(ResultsPath()).absolutePath();
     ASSERT_TRUE(QDir(folder).removeRecursively());
     WriteFile(folder, "a file where the folder should be");
-    {
-        auto harness = MakeHarness();
-        EXPECT_TRUE(RunModules(*harness, {u"Audio"_s, u"Video"_s}));
-    }
-    const QString log = m_log.Text();
+    EXPECT_TRUE(RunModules({u"Audio"_s, u"Video"_s}));
+    const QString log = m_run.LogText();
     EXPECT_TRUE(log.contains(u"could not be written"_s)) << log.toStdString();
     EXPECT_TRUE(log.contains(u"   Removing test Video\n"_s));
     EXPECT_EQ(ReadFile(folder), QByteArray("a file where the folder should be"));
 
     // The copied logs still hold every verdict: reprocessing records them.
     ASSERT_TRUE(QFile::remove(folder));
-    auto harness = MakeHarness();
-    ASSERT_TRUE(harness->Process(0));
+    ASSERT_TRUE(m_run.NewHarness(u"phone"_s).Process(0));
     EXPECT_EQ(ReadResults(LogFolder() + u"/ProcessedResults/ProcessedResults.xml"_s).verdicts, kAllRecorded);
 }
 
@@ -336,8 +268,7 @@ TEST_F(HandsetFaultTest, UnwritableCatalogueCacheStillRunsTheKit)
     const QString caches = QFileInfo(TestDirectories::GetManifestDirectory(u"#1"_s)).absolutePath();
     ASSERT_TRUE(QDir(caches).removeRecursively());
     WriteFile(caches, "not a folder");
-    auto harness = MakeHarness();
-    EXPECT_TRUE(RunModules(*harness, {u"Audio"_s})) << m_log.Text().toStdString();
+    EXPECT_TRUE(RunModules({u"Audio"_s})) << m_run.LogText().toStdString();
     EXPECT_EQ(ReadResults(ResultsPath()).verdicts.value(u"Audio/play"_s), u"pass"_s);
     EXPECT_EQ(ReadFile(caches), QByteArray("not a folder"));
 }

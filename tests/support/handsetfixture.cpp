@@ -9,6 +9,8 @@
 
 #include <gtest/gtest.h>
 
+using namespace Qt::StringLiterals;
+
 namespace testutil {
 
 HandsetFixture::HandsetFixture()
@@ -23,28 +25,28 @@ HandsetFixture::~HandsetFixture() = default;
 
 QString HandsetFixture::HandsetsFolder() const
 {
-    return m_dir.filePath(QStringLiteral("handsets"));
+    return m_dir.filePath(u"handsets"_s);
 }
 
 QString HandsetFixture::WorkFolder() const
 {
-    return m_dir.filePath(QStringLiteral("work"));
+    return m_dir.filePath(u"work"_s);
 }
 
-QString HandsetFixture::AddHandset(const QString &name, const QString &description,
-                                   const QString &platform, const QString &version)
+QString HandsetFixture::AddHandset(const QString &name, const QString &description, const QString &platform,
+                                   const QString &version)
 {
     const QString folder = HandsetFolder(name);
-    EXPECT_TRUE(QDir().mkpath(folder + QStringLiteral("/fs")));
+    EXPECT_TRUE(QDir().mkpath(folder + u"/fs"_s));
     // QSettings writes no file for no keys, but the file marks the handset.
-    WriteFile(folder + QStringLiteral("/handset.ini"), QByteArray());
-    QSettings settings(folder + QStringLiteral("/handset.ini"), QSettings::IniFormat);
+    WriteFile(folder + u"/handset.ini"_s, QByteArray());
+    QSettings settings(folder + u"/handset.ini"_s, QSettings::IniFormat);
     if (!description.isEmpty())
-        settings.setValue(QStringLiteral("description"), description);
+        settings.setValue(u"description"_s, description);
     if (!platform.isEmpty())
-        settings.setValue(QStringLiteral("platform"), platform);
+        settings.setValue(u"platform"_s, platform);
     if (!version.isEmpty())
-        settings.setValue(QStringLiteral("version"), version);
+        settings.setValue(u"version"_s, version);
     settings.sync();
     EXPECT_EQ(settings.status(), QSettings::NoError);
     return folder;
@@ -52,7 +54,7 @@ QString HandsetFixture::AddHandset(const QString &name, const QString &descripti
 
 QString HandsetFixture::HandsetFolder(const QString &name) const
 {
-    return HandsetsFolder() + QLatin1Char('/') + name;
+    return HandsetsFolder() + u'/' + name;
 }
 
 QString HandsetFixture::HostPath(const QString &name, const QString &handsetPath) const
@@ -67,7 +69,7 @@ QString HandsetFixture::MakePackage(const QString &fileName, const ModuleSpec &l
 
 QString HandsetFixture::MakePackage(const QString &fileName, const Members &members) const
 {
-    const QString path = WorkFolder() + QLatin1Char('/') + fileName;
+    const QString path = WorkFolder() + u'/' + fileName;
     if (!WritePackage(path, members)) {
         ADD_FAILURE() << "cannot write package " << path.toStdString();
         return QString();

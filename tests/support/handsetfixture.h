@@ -66,8 +66,8 @@ public:
 
     // Creates <handsets>/<name>/handset.ini holding the keys given (empty
     // ones are left out) and an empty fs folder; returns the handset folder.
-    QString AddHandset(const QString &name, const QString &description = QString(),
-                       const QString &platform = QString(), const QString &version = QString());
+    QString AddHandset(const QString &name, const QString &description = QString(), const QString &platform = QString(),
+                       const QString &version = QString());
     QString HandsetFolder(const QString &name) const;
     // The host path of a handset path ("fs:/a/b") of handset name.
     QString HostPath(const QString &name, const QString &handsetPath) const;

@@ -12,6 +12,8 @@
 
 #include <cstdlib>
 
+using namespace Qt::StringLiterals;
+
 namespace testutil {
 
 EnvGuard::~EnvGuard()
@@ -45,7 +47,8 @@ void EnvGuard::Unset(const char *name)
     qunsetenv(name);
 }
 
-CurrentDirectory::CurrentDirectory(const QString &path) : m_previous(QDir::currentPath())
+CurrentDirectory::CurrentDirectory(const QString &path)
+    : m_previous(QDir::currentPath())
 {
     QDir::setCurrent(path);
 }
@@ -97,16 +100,16 @@ bool HaveProgram(const QString &program)
 
 QString DataPath(const QString &relative)
 {
-    return QStringLiteral(HARNESS_TEST_DATA_DIR) + QLatin1Char('/') + relative;
+    return QStringLiteral(HARNESS_TEST_DATA_DIR) + u'/' + relative;
 }
 
 void IsolateEnvironment(const QTemporaryDir &root)
 {
     qputenv("KESTIX_DATA_ROOT", root.path().toLocal8Bit());
-    qputenv("KESTIX_HANDSETS", (root.path() + QStringLiteral("/handsets")).toLocal8Bit());
+    qputenv("KESTIX_HANDSETS", (root.path() + u"/handsets"_s).toLocal8Bit());
     qputenv("KESTIX_TIME_SCALE", "0");
-    for (const char *name : {"KESTIX_TOOLSET", "KESTIX_PLATFORMS_ALL", "KESTIX_PLATFORM",
-                             "KESTIX_TESTSETS_ALL", "KESTIX_TESTSET"})
+    for (const char *name :
+         {"KESTIX_TOOLSET", "KESTIX_PLATFORMS_ALL", "KESTIX_PLATFORM", "KESTIX_TESTSETS_ALL", "KESTIX_TESTSET"})
         qunsetenv(name);
     Clock::SetScale(0.0);
 }

@@ -47,8 +47,8 @@ QByteArray ReadFile(const QString &path);
 
 // Runs a program to completion; returns its exit code (-1 when it could not
 // start). Standard output and error go to output when given.
-int RunProgram(const QString &program, const QStringList &arguments,
-               QByteArray *output = nullptr, const QString &workingDirectory = QString());
+int RunProgram(const QString &program, const QStringList &arguments, QByteArray *output = nullptr,
+               const QString &workingDirectory = QString());
 
 // True when a program of that name is on PATH.
 bool HaveProgram(const QString &program);
