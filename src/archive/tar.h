@@ -17,8 +17,8 @@ class QDataStream;
 // and how many bytes it holds. The member's other bytes are holes (zeros).
 struct HARNESS_EXPORT TarSparseRun
 {
-    quint32 position = 0;
-    quint32 length = 0;
+    quint32 position = 0;  // offset in the member's contents, in bytes
+    quint32 length = 0;    // bytes stored for this run
 };
 
 // One member of a tar archive.
@@ -54,7 +54,9 @@ struct HARNESS_EXPORT TarFileEntry
     bool IsFile() const;
     // True for a directory member (type flag '5' or 'D', or a name ending in "/").
     bool IsDirectory() const;
+    // True for a symbolic link member (type flag '2'); linkName is its target.
     bool IsSymLink() const;
+    // True for a hard link member (type flag '1'); linkName names the member it links to.
     bool IsHardLink() const;
 };
 
@@ -109,6 +111,7 @@ public:
     // words GNU tar uses ("does not look like a tar archive", "unexpected end
     // of archive at offset N", "checksum error at offset N", ...).
     bool IsDamaged() const;
+    // Why the archive is damaged; empty when the last Open read it cleanly.
     QString ErrorString() const;
     // Closes the open file; the entry list stays.
     void Close();

@@ -44,17 +44,18 @@ public:
 // ended, and the verdicts its logs gave in this run.
 struct HARNESS_EXPORT ModuleRecord
 {
-    QString name;
+    QString name;          // the module's name
     QString source;        // "KVK" or "PVS"
-    QString testType;
+    QString testType;      // the module's test type word
     QString handset;       // the connected handset's name
     QDateTime start;       // UTC, when the loop took the module
     qint64 durationMs = 0; // until the outcome was known, on the library's clock
     qint64 timeLimitMs = 0; // the time limit it outlived (TimedOut)
+    // How it ended; Interrupted until the outcome is known.
     ModuleSource::Outcome outcome = ModuleSource::Interrupted;
+    bool parsed = false;   // a log was recognised; results holds its verdicts
     // The verdicts the module's logs gave when they were recorded; empty
     // unless outcome is Recorded and a log was recognised.
-    bool parsed = false;
     TestResults results;
     QStringList logs;      // host paths of the logs copied in this run
 
@@ -76,5 +77,7 @@ public:
     // ("its start", "its log") and the milliseconds since it started, on the
     // library's clock.
     virtual void ModuleWaiting(const ModuleRecord &record, const QString &waitingFor, qint64 elapsedMs);
+    // The module's outcome is known: the record now holds it, the duration,
+    // the copied logs and, when recorded, the verdicts.
     virtual void ModuleEnded(const ModuleRecord &record) = 0;
 };

@@ -21,19 +21,22 @@
 class HARNESS_EXPORT ModuleTimings
 {
 public:
+    // One recorded run of a module.
     struct Run
     {
-        qint64 ms = 0;
-        QString handset;
-        QString host;
+        qint64 ms = 0;     // its wall time in milliseconds, on the library's clock
+        QString handset;   // the name of the handset it ran on
+        QString host;      // the name of the host machine that ran it
         QDateTime at;  // when it ended (UTC)
 
+        // The same run: equal time, handset, host and end. Such runs are kept once.
         bool operator==(const Run &other) const
         {
             return ms == other.ms && handset == other.handset && host == other.host && at == other.at;
         }
     };
 
+    // Runs kept per module; older ones are dropped.
     static constexpr int kRecentRuns = 10;
     // Larger files are not timings files.
     static constexpr qint64 kMaxFileSize = 64 * 1024 * 1024;
@@ -50,6 +53,7 @@ public:
     bool Read(const QString &path);
     // Adds the file's runs to the content; refused as Read.
     bool Merge(const QString &path);
+    // Adds the other's runs to the content (a run already known is kept once).
     void Merge(const ModuleTimings &other);
 
     // Adds one run (runs with a negative time are ignored).
@@ -69,8 +73,10 @@ public:
     qint64 ExpectedMs(const QString &name, const QString &source) const;
     // The module's recent runs, oldest first.
     QList<Run> Runs(const QString &name, const QString &source) const;
+    // The number of modules known, by lower-cased name and source.
     int ModuleCount() const { return int(m_modules.size()); }
 
+    // Why the last Read, Merge of a file or Save failed; empty after one that succeeded.
     QString ErrorString() const { return m_error; }
 
 private:

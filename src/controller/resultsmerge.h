@@ -28,28 +28,30 @@ class _TestModule;
 class HARNESS_EXPORT ResultsMerge
 {
 public:
+    // One module of the merged results.
     struct Row
     {
-        QString name;
+        QString name;       // the module's name
         QString source;  // "KVK", "PVS", or empty for a module known only from logs
-        QString family;
-        QString subFamily;
+        QString family;     // the family the module belongs to; empty when none is given
+        QString subFamily;  // the sub-family within family; empty when none is given
         QString host;     // where it ran; several joined by ", "
-        QString handset;
-        bool ran = false;
+        QString handset;  // the handset it ran on; several joined by ", "; empty when none
+        bool ran = false; // some file shows a verdict other than "unexecuted" for it
         QList<QPair<QString, QString>> testCases;  // (name, result word), in file order
     };
 
     // A module the selection holds.
     struct Expected
     {
-        QString name;
-        QString source;
-        QString family;
-        QString subFamily;
-        QStringList testCases;
+        QString name;           // the module's name
+        QString source;         // "KVK" or "PVS"
+        QString family;         // the family the module belongs to
+        QString subFamily;      // the sub-family within family
+        QStringList testCases;  // the names of its test cases, in catalogue order
     };
 
+    // Larger files (in bytes) are not processed-results files: Add refuses them.
     static constexpr qint64 kMaxFileSize = 256 * 1024 * 1024;
 
     // Reads one processed-results file. handset defaults to the handset
@@ -69,12 +71,14 @@ public:
     // Every module that ran somewhere or was expected: first the expected
     // ones in their order, then the others in the order they were first seen.
     QList<Row> Rows() const;
+    // The names of the rows that did not run, in the order of Rows().
     QStringList NotRun() const;
 
     // The runs of every "Timings.json" found beside the files added, for
     // the next plan.
     const ModuleTimings &Timings() const { return m_timings; }
 
+    // Why the last Add failed; empty after one that succeeded.
     QString ErrorString() const { return m_error; }
 
 private:

@@ -102,6 +102,7 @@ public:
     // frameworks and ends; the modules not taken are left not run. Only
     // sets a flag, so it may be called from any thread or a signal handler.
     void Stop();
+    // True once Stop has been called.
     bool Stopped() const;
 
     // Per module, in run order.

@@ -21,19 +21,19 @@ public:
     // One module of the selection; expectedMs < 0 when nothing is known of it.
     struct Module
     {
-        QString name;
+        QString name;            // the module's name
         QString source;  // "KVK" or "PVS"
-        int testCases = 0;
-        qint64 expectedMs = -1;
+        int testCases = 0;       // how many test cases it has
+        qint64 expectedMs = -1;  // its expected wall time in milliseconds; -1 when unknown
     };
 
     // Where one module goes and the time the split counted for it.
     struct Entry
     {
-        QString name;
-        QString source;
-        int shard = 0;
-        qint64 expectedMs = 0;
+        QString name;            // the module's name
+        QString source;          // "KVK" or "PVS"
+        int shard = 0;           // the 0-based index of the shard it goes to
+        qint64 expectedMs = 0;   // the milliseconds the split counted for it
         bool estimated = false;  // from its test cases, not from recorded runs
     };
 
@@ -51,14 +51,18 @@ public:
     // has any.
     static ShardPlan Make(const QList<Module> &selection, int shardCount);
 
+    // The number of shards, 1..kMaxShards.
     int ShardCount() const { return m_shardCount; }
     // Every module once, in selection order.
     const QList<Entry> &Modules() const { return m_entries; }
     // The modules of one shard, in selection order; empty for an index out
     // of range.
     QList<Entry> Shard(int index) const;
+    // The expected milliseconds of one shard; 0 for an index out of range.
     qint64 ShardMs(int index) const;
+    // The expected milliseconds of the longest shard.
     qint64 LongestShardMs() const;
+    // The expected milliseconds of a shard on average.
     double MeanShardMs() const;
 
     // The plan as text for people: with index in range that shard only,

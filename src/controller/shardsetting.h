@@ -19,7 +19,7 @@ struct HARNESS_EXPORT ShardSetting
 {
     bool sharded = false;  // a shard index or count was given at all
     int index = -1;        // 0-based; -1 when only a count was given
-    int count = 1;
+    int count = 1;         // how many shards; 1 when none was given
     QString from;          // what gave the index ("--shard-index", "CI_NODE_INDEX", ...)
     QString statusFile;    // TEST_SHARD_STATUS_FILE, when set
 

@@ -93,7 +93,7 @@ HARNESS_EXPORT void FreeEncoder(QEncoding *encoder);
 struct HARNESS_EXPORT LostCharacter
 {
     qsizetype position = 0;  // 1-based, counted in characters (code points)
-    char32_t codePoint = 0;
+    char32_t codePoint = 0;  // the character's Unicode code point
 
     // "character 7 U+30C6 'テ'"
     QString Describe() const;
