@@ -28,9 +28,8 @@ struct Encoding
 };
 
 const Encoding kEncodings[] = {
-    {ENCODING_ISOLATIN1, "ISO-8859-1"}, {ENCODING_KSC5601, "EUC-KR"},
-    {ENCODING_SJIS, "SHIFT_JIS"},       {ENCODING_GB2312, "GB2312"},
-    {ENCODING_CP949, "CP949"},          {ENCODING_UTF8, "UTF-8"},
+    {ENCODING_ISOLATIN1, "ISO-8859-1"}, {ENCODING_KSC5601, "EUC-KR"}, {ENCODING_SJIS, "SHIFT_JIS"},
+    {ENCODING_GB2312, "GB2312"},        {ENCODING_CP949, "CP949"},    {ENCODING_UTF8, "UTF-8"},
 };
 
 const Encoding &EncodingAt(int index)
@@ -40,7 +39,7 @@ const Encoding &EncodingAt(int index)
 
 struct IconvHandle
 {
-    explicit IconvHandle(const char *to, const char *from) : cd(iconv_open(to, from)) {}
+    explicit IconvHandle(const char *to, const char *from) : cd(iconv_open(to, from)) { }
     ~IconvHandle()
     {
         if (cd != iconv_t(-1))
@@ -139,9 +138,8 @@ const Sample &SampleFor(int index)
         sample.text += chunk;
     }
     IconvHandle toEncoding(encoding.iconvName, "UTF-16LE");
-    if (!toEncoding.Convert(reinterpret_cast<const char *>(sample.text.utf16()),
-                            size_t(sample.text.size()) * 2, sample.bytes,
-                            size_t(sample.text.size()) * 4 + 16))
+    if (!toEncoding.Convert(reinterpret_cast<const char *>(sample.text.utf16()), size_t(sample.text.size()) * 2,
+                            sample.bytes, size_t(sample.text.size()) * 4 + 16))
         sample.error = QStringLiteral("iconv cannot encode the sample");
     return sample;
 }
@@ -238,8 +236,7 @@ void BM_EncodeIconv(benchmark::State &state)
     IconvHandle encoder(EncodingAt(index).iconvName, "UTF-16LE");
     for (auto _ : state) {
         QByteArray out;
-        if (!encoder.Convert(reinterpret_cast<const char *>(sample.text.utf16()),
-                             size_t(sample.text.size()) * 2, out,
+        if (!encoder.Convert(reinterpret_cast<const char *>(sample.text.utf16()), size_t(sample.text.size()) * 2, out,
                              size_t(sample.text.size()) * 4 + 16)) {
             state.SkipWithError("iconv cannot encode the sample");
             break;

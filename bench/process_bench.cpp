@@ -5,10 +5,10 @@
 
 #include "catalogue/manifest.h"
 #include "catalogue/testmodule.h"
+#include "catalogue/testresults.h"
 #include "controller/harness.h"
 #include "controller/processedresults.h"
 #include "controller/resultssession.h"
-#include "catalogue/testresults.h"
 
 #include "support/benchkits.h"
 #include "support/benchutil.h"
@@ -27,8 +27,7 @@
 class HarnessControllerAccess
 {
 public:
-    static void SetCatalogues(Harness &harness, QSharedPointer<Manifest> kit,
-                              QSharedPointer<Manifest> platform)
+    static void SetCatalogues(Harness &harness, QSharedPointer<Manifest> kit, QSharedPointer<Manifest> platform)
     {
         harness.m_kitManifest = kit;
         harness.m_platformManifest = platform;
@@ -43,7 +42,7 @@ public:
     // module) or, with deferSave, as Process holds it (written at the end).
     struct Session
     {
-        Session(Harness &harness, bool deferSave) : session(harness, deferSave) {}
+        Session(Harness &harness, bool deferSave) : session(harness, deferSave) { }
         Harness::ResultsSession session;
     };
 };
@@ -209,10 +208,8 @@ void RecordModule(benchmark::State &state, Recording mode)
     record();
     for (auto _ : state)
         record();
-    state.counters["file_bytes"] =
-        double(QFileInfo(HarnessControllerAccess::Environment(harness).value(
-                             QStringLiteral("ProcessedResultsPath")))
-                   .size());
+    state.counters["file_bytes"] = double(
+        QFileInfo(HarnessControllerAccess::Environment(harness).value(QStringLiteral("ProcessedResultsPath"))).size());
 }
 
 void BM_RecordModule(benchmark::State &state)

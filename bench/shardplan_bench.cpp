@@ -23,7 +23,7 @@ constexpr int kModules = 10000;
 struct Workload
 {
     QList<ShardPlan::Module> selection;
-    std::vector<double> trueMs;  // by selection index
+    std::vector<double> trueMs; // by selection index
 };
 
 Workload Make(int percentKnown)
@@ -65,8 +65,8 @@ void BM_ShardPlan(benchmark::State &state)
     const double mean = total / shards;
     state.counters["longest_over_mean"] = *std::max_element(real.begin(), real.end()) / mean;
     state.counters["planned_longest_over_mean"] = double(plan.LongestShardMs()) / plan.MeanShardMs();
-    state.counters["largest_module_over_mean"] =
-        *std::max_element(workload.trueMs.begin(), workload.trueMs.end()) / mean;
+    state.counters["largest_module_over_mean"]
+        = *std::max_element(workload.trueMs.begin(), workload.trueMs.end()) / mean;
 }
 BENCHMARK(BM_ShardPlan)
     ->ArgNames({"shards", "known_percent"})

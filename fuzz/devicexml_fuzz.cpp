@@ -9,8 +9,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size)
     // Includes are also looked for below the home folder: keep it private.
     static const bool ready = [] {
         qputenv("HOME", fuzzutil::Scratch().toLocal8Bit());
-        fuzzutil::WriteBytes(fuzzutil::ScratchPath(QStringLiteral("keys.xml")),
-                             "<i><keys><key n=\"1\"/></keys></i>");
+        fuzzutil::WriteBytes(fuzzutil::ScratchPath(QStringLiteral("keys.xml")), "<i><keys><key n=\"1\"/></keys></i>");
         fuzzutil::WriteBytes(fuzzutil::ScratchPath(QStringLiteral("broken.xml")), "<i><open></i>");
         return true;
     }();

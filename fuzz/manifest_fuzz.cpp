@@ -15,8 +15,7 @@ void Query(Manifest &catalogue)
 {
     QList<QSharedPointer<_TestModule>> modules;
     catalogue.GetTestModules(modules, QStringList(), QString(), QString());
-    catalogue.GetTestModules(modules, QStringList{QStringLiteral("*a*"), QStringLiteral("b*")}, QString(),
-                             QString());
+    catalogue.GetTestModules(modules, QStringList{QStringLiteral("*a*"), QStringLiteral("b*")}, QString(), QString());
     catalogue.GetTestModules(modules, QStringList(), QStringLiteral("m"), QStringLiteral("s"));
     for (const QSharedPointer<_TestModule> &module : std::as_const(catalogue.testModules)) {
         Check(catalogue.FindTestModule(module->moduleName) != nullptr);

@@ -16,10 +16,9 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size)
     const QString path = fuzzutil::ScratchPath(QStringLiteral("module.xml"));
     fuzzutil::WriteBytes(path, fuzzutil::Bytes(data, size));
 
-    std::unique_ptr<_TestModule> kinds[] = {
-        std::make_unique<CtfTestModule>(), std::make_unique<CtfAppletTestModule>(),
-        std::make_unique<OatTestModule>(), std::make_unique<UTTestModule>(),
-        std::make_unique<SecondaryModule>()};
+    std::unique_ptr<_TestModule> kinds[]
+        = {std::make_unique<CtfTestModule>(), std::make_unique<CtfAppletTestModule>(),
+           std::make_unique<OatTestModule>(), std::make_unique<UTTestModule>(), std::make_unique<SecondaryModule>()};
     for (std::unique_ptr<_TestModule> &module : kinds) {
         if (!module->ProcessModuleXML(path))
             continue;

@@ -73,8 +73,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size)
         AddModule<CtfTestModule>(kit, QStringLiteral("Audio"), kAudioHash,
                                  {QStringLiteral("play"), QStringLiteral("record")});
         AddModule<UTTestModule>(kit, QStringLiteral("Menu"), QString(), {QStringLiteral("open")});
-        AddModule<CtfTestModule>(platform, QStringLiteral("Shell"), QStringLiteral("#99"),
-                                 {QStringLiteral("boot")});
+        AddModule<CtfTestModule>(platform, QStringLiteral("Shell"), QStringLiteral("#99"), {QStringLiteral("boot")});
         return true;
     }();
     (void)ready;

@@ -49,8 +49,8 @@ QByteArray LogOf(const ModuleInfo &module, int index)
     } else if (module.kind == QLatin1String("oat")) {
         log += "@#" + name + "#\nTimeStamp: 14:05:09 12-03-2026\n";
         for (int t = 0; t < module.testCases; ++t)
-            log += "@" + QByteArray::number(t + 1) + ": " + TestCaseName(t).toUtf8() + "\nStatus: "
-                   + verdict(t, "Success", "Failed") + "\n";
+            log += "@" + QByteArray::number(t + 1) + ": " + TestCaseName(t).toUtf8()
+                + "\nStatus: " + verdict(t, "Success", "Failed") + "\n";
         log += "TEST RESULT: done\n";
     } else {
         log += "SuiteName: UT" + name + " 14:05:09 03-Dec-2026\n---- results\n";
@@ -103,8 +103,7 @@ QString Kit(int modules, QString *error)
     for (const char *framework : {"ctf", "ctfapplet", "oat", "uitf"}) {
         for (const char *variant : {"Win32_Debug", "RVCT22arm9_Release"}) {
             const QStringList parts = QString::fromLatin1(variant).split(QLatin1Char('_'));
-            kit.AddFrameworkPackage(QStringLiteral("testframeworks"), QLatin1String(framework), parts[0],
-                                    parts[1]);
+            kit.AddFrameworkPackage(QStringLiteral("testframeworks"), QLatin1String(framework), parts[0], parts[1]);
         }
     }
     for (int i = 0; i < modules && kit.Ok(); ++i) {

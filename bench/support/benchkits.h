@@ -16,7 +16,7 @@ namespace benchkits {
 // secondary), 20 to 50 test cases, two packages each holding its ".mif".
 struct ModuleInfo
 {
-    QString kind;   // "ctf", "ctfapplet", "oat", "uitf" or "secondary"
+    QString kind; // "ctf", "ctfapplet", "oat", "uitf" or "secondary"
     QString name;
     QString folder; // below the kit's root
     int testCases = 0;

@@ -47,8 +47,7 @@ QByteArray RunChild(const QString &name, const QStringList &arguments, QString *
 {
     QProcess process;
     process.setProcessChannelMode(QProcess::ForwardedErrorChannel);
-    process.start(QCoreApplication::applicationFilePath(),
-                  QStringList{QStringLiteral("--child"), name} + arguments);
+    process.start(QCoreApplication::applicationFilePath(), QStringList{QStringLiteral("--child"), name} + arguments);
     if (!process.waitForStarted() || !process.waitForFinished(-1)) {
         *error = process.errorString();
         return QByteArray();
@@ -72,7 +71,9 @@ long PeakRssKiB()
                 return line.mid(6).trimmed().split(' ').value(0).toLong();
         }
     }
-    struct rusage usage {};
+    struct rusage usage
+    {
+    };
     if (getrusage(RUSAGE_SELF, &usage) != 0)
         return -1;
     return usage.ru_maxrss;
@@ -81,8 +82,7 @@ long PeakRssKiB()
 qint64 ReadTree(const QString &root)
 {
     qint64 total = 0;
-    QDirIterator it(root, QDir::Files | QDir::NoDotAndDotDot | QDir::Hidden,
-                    QDirIterator::Subdirectories);
+    QDirIterator it(root, QDir::Files | QDir::NoDotAndDotDot | QDir::Hidden, QDirIterator::Subdirectories);
     while (it.hasNext()) {
         QFile file(it.next());
         if (file.open(QIODevice::ReadOnly))

@@ -36,8 +36,8 @@ static int Hello(const QStringList &arguments)
     }
     QSharedPointer<_TestModule> chosen = modules.first();
     for (const QSharedPointer<_TestModule> &module : modules) {
-        out << "  " << module->TestType() << "  " << module->moduleName << "  ("
-            << module->testCases.size() << " test cases)" << Qt::endl;
+        out << "  " << module->TestType() << "  " << module->moduleName << "  (" << module->testCases.size()
+            << " test cases)" << Qt::endl;
         if (arguments.size() > 1 && module->moduleName.compare(arguments.at(1), Qt::CaseInsensitive) == 0)
             chosen = module;
     }

@@ -115,8 +115,8 @@ bool ParsePax(const QByteArray &data, PaxRecords &records)
     while (pos < data.size()) {
         const int space = data.indexOf(' ', pos);
         quint64 length = 0;
-        if (space < 0 || !ReadDecimal(data.mid(pos, space - pos), length)
-            || length <= quint64(space - pos + 1) || length > quint64(data.size() - pos))
+        if (space < 0 || !ReadDecimal(data.mid(pos, space - pos), length) || length <= quint64(space - pos + 1)
+            || length > quint64(data.size() - pos))
             return false;
         const int end = pos + int(length);
         if (data.at(end - 1) != '\n')
@@ -263,10 +263,7 @@ Tar::~Tar()
 }
 
 Tar::Tar(const Tar &other)
-    : m_entries(other.m_entries),
-      m_fileName(other.m_fileName),
-      m_members(other.m_members),
-      m_mtime(other.m_mtime),
+    : m_entries(other.m_entries), m_fileName(other.m_fileName), m_members(other.m_members), m_mtime(other.m_mtime),
       m_error(other.m_error)
 {
 }
@@ -513,7 +510,9 @@ bool Tar::Read(QDataStream &stream)
         QVector<TarSparseRun> runs;
         quint64 realSize = stored;
         bool sparse = false;
-        const auto badMap = [&]() { return Damaged(QStringLiteral("invalid sparse map at offset %1").arg(pos)); };
+        const auto badMap = [&]() {
+            return Damaged(QStringLiteral("invalid sparse map at offset %1").arg(pos));
+        };
         if (typeflag == kTypeGnuSparse) {
             sparse = true;
             if (!ReadNumber(header + kGnuRealSizeOffset, kSparseNumberSize, realSize))
@@ -634,8 +633,6 @@ unsigned int Tar::CalcChecksum(signed char *header)
     return sum;
 }
 
-
-
 void Tar::PutOctalNumber(signed char *field, unsigned int width, int value, bool checksumStyle)
 {
     if (width == 0 || value < 0 || (checksumStyle && width < 2))
@@ -708,8 +705,7 @@ bool Tar::SplitUstarName(const QByteArray &name, QByteArray &prefix, QByteArray 
     // The last "/" that leaves at most 100 bytes after it and 155 before it.
     // A directory's own trailing "/" stays in the name part.
     const int searchFrom = name.endsWith('/') ? name.size() - 2 : name.size() - 1;
-    for (int slash = name.lastIndexOf('/', searchFrom); slash > 0;
-         slash = name.lastIndexOf('/', slash - 1)) {
+    for (int slash = name.lastIndexOf('/', searchFrom); slash > 0; slash = name.lastIndexOf('/', slash - 1)) {
         if (name.size() - slash - 1 > kNameSize)
             return false;
         if (slash <= kPrefixSize) {
@@ -739,13 +735,10 @@ bool Tar::MakeHeader(const Member &member, qint64 mtime, signed char *header)
     const quint64 size = quint64(member.data.size());
     if (size > kMaxUstarSize || mtime < 0)
         return false;
-    if (!PutOctal64(header + kModeOffset, kIdSize, member.mode & 07777)
-        || !PutOctal64(header + kUidOffset, kIdSize, 0)
-        || !PutOctal64(header + kGidOffset, kIdSize, 0)
-        || !PutOctal64(header + kSizeOffset, kSizeSize, size)
+    if (!PutOctal64(header + kModeOffset, kIdSize, member.mode & 07777) || !PutOctal64(header + kUidOffset, kIdSize, 0)
+        || !PutOctal64(header + kGidOffset, kIdSize, 0) || !PutOctal64(header + kSizeOffset, kSizeSize, size)
         || !PutOctal64(header + kMtimeOffset, kMtimeSize, quint64(mtime))
-        || !PutOctal64(header + kDevMajorOffset, kIdSize, 0)
-        || !PutOctal64(header + kDevMinorOffset, kIdSize, 0))
+        || !PutOctal64(header + kDevMajorOffset, kIdSize, 0) || !PutOctal64(header + kDevMinorOffset, kIdSize, 0))
         return false;
     header[kTypeflagOffset] = member.typeflag;
     std::memcpy(header + kMagicOffset, kPosixMagic, kPosixMagicSize);
@@ -810,7 +803,9 @@ unsigned int Tar::ReadOctal(const signed char *field)
 bool Tar::ReadNumber(const char *field, int width, quint64 &value)
 {
     value = 0;
-    const auto byte = [field](int i) { return static_cast<unsigned char>(field[i]); };
+    const auto byte = [field](int i) {
+        return static_cast<unsigned char>(field[i]);
+    };
     if (byte(0) & 0x80) {
         // GNU base-256: big-endian two's complement after the marker bit.
         if (byte(0) & 0x40)

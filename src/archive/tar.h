@@ -17,8 +17,8 @@ class QDataStream;
 // and how many bytes it holds. The member's other bytes are holes (zeros).
 struct HARNESS_EXPORT TarSparseRun
 {
-    quint32 position = 0;  // offset in the member's contents, in bytes
-    quint32 length = 0;    // bytes stored for this run
+    quint32 position = 0; // offset in the member's contents, in bytes
+    quint32 length = 0; // bytes stored for this run
 };
 
 // One member of a tar archive.

@@ -1,8 +1,8 @@
 #pragma once
 
-#include "compilervariant.h"
 #include "../common/export.h"
 #include "../device/device.h"
+#include "compilervariant.h"
 
 #include <QDomElement>
 #include <QMap>

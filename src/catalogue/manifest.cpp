@@ -38,8 +38,7 @@ bool MatchesPattern(const QString &pattern, const QString &moduleName)
 } // namespace
 
 Manifest::Manifest(const QString &path, bool isPlatform)
-    : isPlatform(isPlatform)
-    , kitPath(QDir::cleanPath(QDir::current().absoluteFilePath(path)))
+    : isPlatform(isPlatform), kitPath(QDir::cleanPath(QDir::current().absoluteFilePath(path)))
 {
     rootHash = StringHashName(kitPath);
     cacheDirectory = TestDirectories::GetManifestDirectory(rootHash);
@@ -136,8 +135,7 @@ void Manifest::ReadDocument(const XmlNode &root)
             for (const XmlNode *entry : section->ChildElements()) {
                 if (entry->Name().toLower() != QLatin1String("testmodule"))
                     continue;
-                QSharedPointer<_TestModule> module =
-                    CreateModule(entry->Attribute(QStringLiteral("testtype")));
+                QSharedPointer<_TestModule> module = CreateModule(entry->Attribute(QStringLiteral("testtype")));
                 if (!module)
                     continue;
                 // A module without a name is kept all the same, under the
@@ -149,8 +147,7 @@ void Manifest::ReadDocument(const XmlNode &root)
             for (const XmlNode *entry : section->ChildElements()) {
                 if (entry->Name().toLower() != QLatin1String("framework"))
                     continue;
-                QSharedPointer<_Framework> framework =
-                    CreateFramework(entry->Attribute(QStringLiteral("name")));
+                QSharedPointer<_Framework> framework = CreateFramework(entry->Attribute(QStringLiteral("name")));
                 if (framework->ReadFromManifest(*entry))
                     frameworks.insert(framework->name, framework);
             }
@@ -172,9 +169,7 @@ bool Manifest::WriteManifest(const QString &path)
         QDir().mkpath(cacheDirectory);
     }
     const auto fail = [this, &destination](const QString &error) {
-        LogMessage(QStringLiteral("Manifest::WriteManifest could not write %1: %2\n")
-                       .arg(destination, error),
-                   true);
+        LogMessage(QStringLiteral("Manifest::WriteManifest could not write %1: %2\n").arg(destination, error), true);
         return false;
     };
     // Written beside the destination and renamed over it once complete.
@@ -232,9 +227,8 @@ QSharedPointer<_TestModule> Manifest::FindTestModule(const QString &name)
     return {};
 }
 
-unsigned int Manifest::GetTestModules(QList<QSharedPointer<_TestModule>> &out,
-                                      const QStringList &names, const QString &family,
-                                      const QString &subFamily)
+unsigned int Manifest::GetTestModules(QList<QSharedPointer<_TestModule>> &out, const QStringList &names,
+                                      const QString &family, const QString &subFamily)
 {
     for (const QSharedPointer<_TestModule> &module : std::as_const(testModules)) {
         if (!module->selectable)
@@ -243,8 +237,7 @@ unsigned int Manifest::GetTestModules(QList<QSharedPointer<_TestModule>> &out,
         if (names.isEmpty()) {
             matches = family.isEmpty()
                 || (module->family.contains(family, Qt::CaseInsensitive)
-                    && (subFamily.isEmpty()
-                        || module->subFamily.contains(subFamily, Qt::CaseInsensitive)));
+                    && (subFamily.isEmpty() || module->subFamily.contains(subFamily, Qt::CaseInsensitive)));
         } else {
             for (const QString &pattern : names) {
                 if (MatchesPattern(pattern, module->moduleName)) {

@@ -349,8 +349,7 @@ bool Manifest::ProcessXMLDocument(const QString &path)
         testModules.insert(key, module);
         if (module->family.isEmpty()) {
             QStringList parts = QString(path).remove(kitPath).split(QLatin1Char('/'));
-            while (!parts.isEmpty()
-                   && (parts.first().isEmpty() || PathWordsToSkip().contains(parts.first().toLower())))
+            while (!parts.isEmpty() && (parts.first().isEmpty() || PathWordsToSkip().contains(parts.first().toLower())))
                 parts.removeFirst();
             if (parts.size() >= 2) {
                 module->family = parts.at(0);
@@ -504,7 +503,9 @@ void Manifest::ProcessSecondaryModules()
     QHash<QString, int> names;
     for (const QSharedPointer<_TestModule> &module : std::as_const(testModules))
         ++names[module->moduleName.toLower()];
-    const auto taken = [&names](const QString &name) { return names.value(name.toLower()) > 0; };
+    const auto taken = [&names](const QString &name) {
+        return names.value(name.toLower()) > 0;
+    };
 
     for (auto it = secondaryModules.cbegin(); it != secondaryModules.cend(); ++it) {
         const QString &key = it.key();

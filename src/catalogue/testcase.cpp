@@ -3,7 +3,9 @@
 #include "common/xmlnode.h"
 
 TestCase::TestCase() = default;
-TestCase::TestCase(const QString &name, const QString &type) : name(name), type(type) {}
+TestCase::TestCase(const QString &name, const QString &type) : name(name), type(type)
+{
+}
 TestCase::TestCase(const TestCase &other) = default;
 TestCase &TestCase::operator=(const TestCase &other) = default;
 TestCase::~TestCase() = default;

@@ -71,8 +71,7 @@ bool ReadEntry(_TestModule &module, const XmlNode &element)
                 TestCase testCase;
                 testCase.ReadFromXML(item);
                 module.testCases.append(testCase);
-            } else if (tag == QLatin1String("secondary_modules")
-                       && itemTag == QLatin1String("secondary_module")) {
+            } else if (tag == QLatin1String("secondary_modules") && itemTag == QLatin1String("secondary_module")) {
                 const QString name = item.Attribute(QStringLiteral("name"));
                 if (!name.isEmpty())
                     module.secondaryModules.append(name);
@@ -85,8 +84,7 @@ bool ReadEntry(_TestModule &module, const XmlNode &element)
 // The manifest entry of module.
 void WriteEntry(_TestModule &module, XmlNode &element)
 {
-    module.idHash =
-        StringHashName(module.source + module.moduleName + module.family + module.subFamily);
+    module.idHash = StringHashName(module.source + module.moduleName + module.family + module.subFamily);
 
     element.SetAttribute(QStringLiteral("testtype"), module.TestType());
     element.SetAttribute(QStringLiteral("idhash"), module.idHash);
@@ -128,7 +126,7 @@ void WriteEntry(_TestModule &module, XmlNode &element)
             item.SetAttribute(QStringLiteral("privset"), QString::number(applet.privset));
             item.SetAttribute(QStringLiteral("flags"), QString::number(applet.flags));
             item.SetAttribute(QStringLiteral("flagshex"),
-                         QStringLiteral("0x%1").arg(applet.flags, 4, 16, QLatin1Char('0')));
+                              QStringLiteral("0x%1").arg(applet.flags, 4, 16, QLatin1Char('0')));
         }
     }
 
@@ -200,8 +198,7 @@ void _TestModule::AddDesktopLogFile(const QString &path)
     desktopLogFiles.append(path);
 }
 
-QSharedPointer<_CompilerVariant> _TestModule::GetCompilerVariant(IKestoDevice::Platform platform,
-                                                                 bool debug)
+QSharedPointer<_CompilerVariant> _TestModule::GetCompilerVariant(IKestoDevice::Platform platform, bool debug)
 {
     const QLatin1String wanted = debug ? QLatin1String("debug") : QLatin1String("release");
     QSharedPointer<_CompilerVariant> last;
@@ -231,8 +228,8 @@ bool _TestModule::ProcessModuleXML(const QString &path)
     XmlParseError error;
     const std::unique_ptr<XmlNode> root = XmlNode::Parse(file.readAll(), &error);
     if (!root) {
-        errorText = QStringLiteral("Error processing oat xml file:") + path + QStringLiteral("\n\t")
-            + error.message + QStringLiteral(": Line(%1) Column(%2)").arg(error.line).arg(error.column);
+        errorText = QStringLiteral("Error processing oat xml file:") + path + QStringLiteral("\n\t") + error.message
+            + QStringLiteral(": Line(%1) Column(%2)").arg(error.line).arg(error.column);
         return false;
     }
     file.close();
@@ -267,8 +264,7 @@ bool _TestModule::ProcessModuleXML(const QString &path)
         } else if (tag == QLatin1String("secondary_modules")) {
             secondaryModules.append(child->InnerText());
         } else {
-            LogMessage(QStringLiteral("   Unrecognized Node:") + child->Name() + QStringLiteral("\n"),
-                       false);
+            LogMessage(QStringLiteral("   Unrecognized Node:") + child->Name() + QStringLiteral("\n"), false);
         }
     }
     return true;

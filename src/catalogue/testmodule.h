@@ -1,11 +1,11 @@
 #pragma once
 
-#include "compilervariant.h"
-#include "testcase.h"
 #include "../common/export.h"
 #include "../device/device.h"
-#include "testresults.h"
 #include "../resources/mif.h"
+#include "compilervariant.h"
+#include "testcase.h"
+#include "testresults.h"
 
 #include <QDomElement>
 #include <QList>
@@ -142,9 +142,9 @@ public:
 protected:
     // Where the header lines go when a copied log is stamped.
     enum class StampAnchor {
-        FirstTestLine,    // before the first line beginning "Test:"
+        FirstTestLine, // before the first line beginning "Test:"
         LastModuleVerLine, // before the last line beginning "ModuleVer:"
-        SecondLine,       // after the first line
+        SecondLine, // after the first line
     };
 
     // Inserts "GUID:", "Manifest Name:" and "ID Hash:" lines into a copied
@@ -157,8 +157,7 @@ protected:
     // "-yyyy-MM-dd-hh-mm-ss."; the file lands in directory. Messages name
     // the handset path, or only its file name with nameFileOnly.
     bool CopyLogFiles(IKestoDevice *device, const QStringList &paths, const QString &directory,
-                      QString (*rename)(const QString &fileName, const QString &moduleName),
-                      bool nameFileOnly);
+                      QString (*rename)(const QString &fileName, const QString &moduleName), bool nameFileOnly);
 
     // "0X" + KestoID() as 8 lower-case hexadecimal digits.
     QString HexModuleName();

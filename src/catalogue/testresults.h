@@ -11,8 +11,7 @@ struct HARNESS_EXPORT TestCaseResult
 {
     TestCaseResult() = default;
     // The verdict result of testCase.
-    TestCaseResult(const QString &testCase, const QString &result)
-        : testCase(testCase), result(result) {}
+    TestCaseResult(const QString &testCase, const QString &result) : testCase(testCase), result(result) { }
 
     // The test case's name as the log states it.
     QString testCase;

@@ -8,9 +8,9 @@
 // Exit statuses of the tool.
 enum ExitStatus {
     ExitSuccess = 0,
-    ExitTestFailed = 1,  // a test case failed or a module could not run
-    ExitUsage = 2,       // bad usage or a set-up failure (no kit, no handset, ...)
-    ExitInterrupted = 130,  // a run stopped by SIGINT or SIGTERM
+    ExitTestFailed = 1, // a test case failed or a module could not run
+    ExitUsage = 2, // bad usage or a set-up failure (no kit, no handset, ...)
+    ExitInterrupted = 130, // a run stopped by SIGINT or SIGTERM
 };
 
 // One sub-command: its name, a one-line summary and its entry point, which

@@ -25,24 +25,24 @@ const QString kPlatformTree = kPlatformDir + QStringLiteral("/pvs/platform");
 // NAME=RESULT words.
 struct DemoModule
 {
-    QString tree;         // the kit or the platform, below the demo folder
-    QString folder;       // below tree
-    QString kind;         // the module kind's type word
+    QString tree; // the kit or the platform, below the demo folder
+    QString folder; // below tree
+    QString kind; // the module kind's type word
     QString name;
     QString family;
     QString subFamily;
-    QString handsetDir;   // the module's folder on the handset
+    QString handsetDir; // the module's folder on the handset
     unsigned int classId; // 0: none
     unsigned int appletId; // 0: none
-    KitProgram program;   // no name: none
+    KitProgram program; // no name: none
     QString suiteProgram; // OAT suite program key; empty: none
-    QString script;       // the behaviour script's resource name
+    QString script; // the behaviour script's resource name
     QString scriptMember; // its package member: "behaviour" or a suite script
     QString suite;
     QString log;
     QList<QPair<QString, QString>> cases;
     QStringList secondaryModules;
-    QByteArray baseLine;  // written as <name>.baseline when not empty
+    QByteArray baseLine; // written as <name>.baseline when not empty
 };
 
 QList<DemoModule> DemoModules()
@@ -50,46 +50,129 @@ QList<DemoModule> DemoModules()
     const QString tests = kKit + QStringLiteral("/tests");
     const QString behaviour = QStringLiteral("behaviour");
     return {
-        {kPlatformTree + QStringLiteral("/tests"), QStringLiteral("core/version/PlatformVersion"), QStringLiteral("ctf"),
-         QStringLiteral("PlatformVersion"), QStringLiteral("core"), QStringLiteral("version"),
-         QStringLiteral("platformversion"), 0x20000040, 0, {QStringLiteral("PlatformVersion_k"), QStringLiteral("-report")},
-         QString(), QStringLiteral("ctf-program.sh"), behaviour, QStringLiteral("PlatformVersion"), QString(),
-         {{QStringLiteral("ReportVersion"), QStringLiteral("PASS")}, {QStringLiteral("CheckBuildDate"), QStringLiteral("PASS")}},
-         {}, {}},
-        {tests, QStringLiteral("system/timer/ITimer"), QStringLiteral("ctf"), QStringLiteral("ITimer"),
-         QStringLiteral("system"), QStringLiteral("timer"), QStringLiteral("itimer"), 0x20000001, 0,
-         {QStringLiteral("ITimer_k"), QStringLiteral("-all")}, QString(), QStringLiteral("ctf-program.sh"), behaviour,
-         QStringLiteral("ITimer"), QString(),
-         {{QStringLiteral("CreateTimer"), QStringLiteral("PASS")}, {QStringLiteral("StartStop"), QStringLiteral("PASS")},
-          {QStringLiteral("Expiry"), QStringLiteral("FAIL")}, {QStringLiteral("HighResolution"), QStringLiteral("UNSUPPORTED")},
+        {kPlatformTree + QStringLiteral("/tests"),
+         QStringLiteral("core/version/PlatformVersion"),
+         QStringLiteral("ctf"),
+         QStringLiteral("PlatformVersion"),
+         QStringLiteral("core"),
+         QStringLiteral("version"),
+         QStringLiteral("platformversion"),
+         0x20000040,
+         0,
+         {QStringLiteral("PlatformVersion_k"), QStringLiteral("-report")},
+         QString(),
+         QStringLiteral("ctf-program.sh"),
+         behaviour,
+         QStringLiteral("PlatformVersion"),
+         QString(),
+         {{QStringLiteral("ReportVersion"), QStringLiteral("PASS")},
+          {QStringLiteral("CheckBuildDate"), QStringLiteral("PASS")}},
+         {},
+         {}},
+        {tests,
+         QStringLiteral("system/timer/ITimer"),
+         QStringLiteral("ctf"),
+         QStringLiteral("ITimer"),
+         QStringLiteral("system"),
+         QStringLiteral("timer"),
+         QStringLiteral("itimer"),
+         0x20000001,
+         0,
+         {QStringLiteral("ITimer_k"), QStringLiteral("-all")},
+         QString(),
+         QStringLiteral("ctf-program.sh"),
+         behaviour,
+         QStringLiteral("ITimer"),
+         QString(),
+         {{QStringLiteral("CreateTimer"), QStringLiteral("PASS")},
+          {QStringLiteral("StartStop"), QStringLiteral("PASS")},
+          {QStringLiteral("Expiry"), QStringLiteral("FAIL")},
+          {QStringLiteral("HighResolution"), QStringLiteral("UNSUPPORTED")},
           {QStringLiteral("HelperPresent"), QStringLiteral("HELPER")}},
-         {QStringLiteral("Helper")}, {}},
-        {tests, QStringLiteral("system/clock/IClock"), QStringLiteral("ctf"), QStringLiteral("IClock"),
-         QStringLiteral("system"), QStringLiteral("clock"), QStringLiteral("iclock"), 0x20000002, 0,
-         {QStringLiteral("IClock_k"), QString()}, QString(), QStringLiteral("ctf-program.sh"), behaviour,
-         QStringLiteral("IClock"), QString(),
-         {{QStringLiteral("ReadClock"), QStringLiteral("PASS")}, {QStringLiteral("SetAlarm"), QStringLiteral("PASS")},
+         {QStringLiteral("Helper")},
+         {}},
+        {tests,
+         QStringLiteral("system/clock/IClock"),
+         QStringLiteral("ctf"),
+         QStringLiteral("IClock"),
+         QStringLiteral("system"),
+         QStringLiteral("clock"),
+         QStringLiteral("iclock"),
+         0x20000002,
+         0,
+         {QStringLiteral("IClock_k"), QString()},
+         QString(),
+         QStringLiteral("ctf-program.sh"),
+         behaviour,
+         QStringLiteral("IClock"),
+         QString(),
+         {{QStringLiteral("ReadClock"), QStringLiteral("PASS")},
+          {QStringLiteral("SetAlarm"), QStringLiteral("PASS")},
           {QStringLiteral("TimeZones"), QStringLiteral("PASS")}},
-         {}, {}},
-        {tests, QStringLiteral("ui/widgets/Widgets"), QStringLiteral("ctfapplet"), QStringLiteral("Widgets"),
-         QStringLiteral("ui"), QStringLiteral("widgets"), QStringLiteral("widgets"), 0, 0x20000010, {}, QString(),
-         QStringLiteral("ctf-applet.sh"), behaviour, QStringLiteral("Widgets_k"), QStringLiteral("widgets_k.log"),
-         {{QStringLiteral("ButtonPress"), QStringLiteral("PASS")}, {QStringLiteral("ListScroll"), QStringLiteral("PASS")},
+         {},
+         {}},
+        {tests,
+         QStringLiteral("ui/widgets/Widgets"),
+         QStringLiteral("ctfapplet"),
+         QStringLiteral("Widgets"),
+         QStringLiteral("ui"),
+         QStringLiteral("widgets"),
+         QStringLiteral("widgets"),
+         0,
+         0x20000010,
+         {},
+         QString(),
+         QStringLiteral("ctf-applet.sh"),
+         behaviour,
+         QStringLiteral("Widgets_k"),
+         QStringLiteral("widgets_k.log"),
+         {{QStringLiteral("ButtonPress"), QStringLiteral("PASS")},
+          {QStringLiteral("ListScroll"), QStringLiteral("PASS")},
           {QStringLiteral("TextInput"), QStringLiteral("FAIL")}},
-         {}, {}},
-        {tests, QStringLiteral("media/audio/OatAudio"), QStringLiteral("oat"), QStringLiteral("OatAudio"),
-         QStringLiteral("media"), QStringLiteral("audio"), QStringLiteral("oataudio"), 0x20000020, 0, {},
-         QStringLiteral("kesto:oat:AudioSuite"), QStringLiteral("oat-suite.sh"), QStringLiteral("suite-AudioSuite.sh"),
-         QStringLiteral("OatAudio"), QStringLiteral("audio"),
-         {{QStringLiteral("PlayTone"), QStringLiteral("Success")}, {QStringLiteral("RecordClip"), QStringLiteral("Failed")},
-          {QStringLiteral("Mixer"), QStringLiteral("Unsupported")}, {QStringLiteral("Equalizer"), QStringLiteral("Success")}},
-         {}, "PlayTone 440Hz\n"},
-        {tests, QStringLiteral("net/sockets/Sockets"), QStringLiteral("uitf"), QStringLiteral("Sockets"),
-         QStringLiteral("net"), QStringLiteral("sockets"), QStringLiteral("utsockets"), 0, 0x20000030, {}, QString(),
-         QStringLiteral("ut-applet.sh"), behaviour, QStringLiteral("UTSockets"), QStringLiteral("sockets"),
-         {{QStringLiteral("OpenSocket"), QStringLiteral("PASSED")}, {QStringLiteral("Connect"), QStringLiteral("PASSED")},
-          {QStringLiteral("SendReceive"), QStringLiteral("FAILED")}, {QStringLiteral("Ipv6"), QStringLiteral("UNSUPPORTED")}},
-         {}, {}},
+         {},
+         {}},
+        {tests,
+         QStringLiteral("media/audio/OatAudio"),
+         QStringLiteral("oat"),
+         QStringLiteral("OatAudio"),
+         QStringLiteral("media"),
+         QStringLiteral("audio"),
+         QStringLiteral("oataudio"),
+         0x20000020,
+         0,
+         {},
+         QStringLiteral("kesto:oat:AudioSuite"),
+         QStringLiteral("oat-suite.sh"),
+         QStringLiteral("suite-AudioSuite.sh"),
+         QStringLiteral("OatAudio"),
+         QStringLiteral("audio"),
+         {{QStringLiteral("PlayTone"), QStringLiteral("Success")},
+          {QStringLiteral("RecordClip"), QStringLiteral("Failed")},
+          {QStringLiteral("Mixer"), QStringLiteral("Unsupported")},
+          {QStringLiteral("Equalizer"), QStringLiteral("Success")}},
+         {},
+         "PlayTone 440Hz\n"},
+        {tests,
+         QStringLiteral("net/sockets/Sockets"),
+         QStringLiteral("uitf"),
+         QStringLiteral("Sockets"),
+         QStringLiteral("net"),
+         QStringLiteral("sockets"),
+         QStringLiteral("utsockets"),
+         0,
+         0x20000030,
+         {},
+         QString(),
+         QStringLiteral("ut-applet.sh"),
+         behaviour,
+         QStringLiteral("UTSockets"),
+         QStringLiteral("sockets"),
+         {{QStringLiteral("OpenSocket"), QStringLiteral("PASSED")},
+          {QStringLiteral("Connect"), QStringLiteral("PASSED")},
+          {QStringLiteral("SendReceive"), QStringLiteral("FAILED")},
+          {QStringLiteral("Ipv6"), QStringLiteral("UNSUPPORTED")}},
+         {},
+         {}},
     };
 }
 
@@ -103,7 +186,7 @@ QByteArray ShellQuote(const QString &text)
 class DemoWriter
 {
 public:
-    explicit DemoWriter(const QString &root) : m_kit(root) {}
+    explicit DemoWriter(const QString &root) : m_kit(root) { }
 
     // Writes the whole environment; false with ErrorString() on failure.
     bool Write();
@@ -195,8 +278,9 @@ bool DemoWriter::WriteFrameworks()
             if (layout.behaviour.isEmpty())
                 return false;
         }
-        if (m_kit.AddFrameworkPackage(frameworks, kind.type, QStringLiteral("Win32"), QStringLiteral("Release"),
-                                      &layout).isEmpty())
+        if (m_kit
+                .AddFrameworkPackage(frameworks, kind.type, QStringLiteral("Win32"), QStringLiteral("Release"), &layout)
+                .isEmpty())
             return false;
     }
     return Copy(QStringLiteral("PostProcess3.pl"), frameworks + QStringLiteral("/oat/tools/bin/PostProcess3.pl"), true);
@@ -211,9 +295,10 @@ bool DemoWriter::WriteModule(const DemoModule &module)
     QByteArray cases;
     for (const auto &c : module.cases)
         cases += (cases.isEmpty() ? "" : " ") + ShellQuote(c.first + QLatin1Char('=') + c.second);
-    const QByteArray script = Resource(module.script, {{QStringLiteral("SUITE"), module.suite.toUtf8()},
-                                                       {QStringLiteral("LOG"), module.log.toUtf8()},
-                                                       {QStringLiteral("CASES"), cases}});
+    const QByteArray script = Resource(module.script,
+                                       {{QStringLiteral("SUITE"), module.suite.toUtf8()},
+                                        {QStringLiteral("LOG"), module.log.toUtf8()},
+                                        {QStringLiteral("CASES"), cases}});
     if (script.isEmpty())
         return false;
 
@@ -257,8 +342,10 @@ bool DemoWriter::WriteSecondaryModule()
     helper.directory = QStringLiteral("Helper");
     helper.classIds = {0x20000050};
     helper.files = {{QStringLiteral("helper.dat"), "helper data for ITimer\n"}};
-    return !m_kit.AddPackage(kKit + QStringLiteral("/tests/common/Helper/package"), QStringLiteral("Helper_Win32_Release"),
-                             helper.Members()).isEmpty();
+    return !m_kit
+                .AddPackage(kKit + QStringLiteral("/tests/common/Helper/package"),
+                            QStringLiteral("Helper_Win32_Release"), helper.Members())
+                .isEmpty();
 }
 
 bool DemoWriter::Write()
@@ -283,18 +370,17 @@ QString DemoWriter::EnvironmentText() const
         + line("KESTIX_TOOLSET", m_kit.Path(QStringLiteral("toolset")))
         + line("KESTIX_PLATFORMS_ALL", m_kit.Path(QStringLiteral("platforms")))
         + line("KESTIX_PLATFORM", m_kit.Path(kPlatformDir) + QLatin1Char('/'))
-        + line("KESTIX_TESTSETS_ALL", m_kit.Path(QStringLiteral("kits")))
-        + line("KESTIX_TESTSET", m_kit.Path(kKit));
+        + line("KESTIX_TESTSETS_ALL", m_kit.Path(QStringLiteral("kits"))) + line("KESTIX_TESTSET", m_kit.Path(kKit));
 }
 
 int DemoCommand(const QStringList &arguments)
 {
     QCommandLineParser parser;
-    parser.setApplicationDescription(QStringLiteral(
-        "demo init DIR: writes a complete demo environment into DIR (a new or empty folder): a "
-        "professional platform, a test kit with frameworks and modules of every kind, a stand-in SDK "
-        "tool set, test data and one emulated handset. Prints the environment variables that point at "
-        "it (also written to DIR/env.sh)."));
+    parser.setApplicationDescription(
+        QStringLiteral("demo init DIR: writes a complete demo environment into DIR (a new or empty folder): a "
+                       "professional platform, a test kit with frameworks and modules of every kind, a stand-in SDK "
+                       "tool set, test data and one emulated handset. Prints the environment variables that point at "
+                       "it (also written to DIR/env.sh)."));
     parser.addPositionalArgument(QStringLiteral("init"), QStringLiteral("The action."));
     parser.addPositionalArgument(QStringLiteral("DIR"), QStringLiteral("The folder to create."));
     int status = ExitSuccess;

@@ -40,8 +40,8 @@ bool LoadResources(KestoResources &resources, const QString &path, const QString
 int HashCommand(const QStringList &arguments)
 {
     QCommandLineParser parser;
-    parser.setApplicationDescription(QStringLiteral(
-        "Prints the string hash that names manifest caches, module ID hashes and cache files."));
+    parser.setApplicationDescription(
+        QStringLiteral("Prints the string hash that names manifest caches, module ID hashes and cache files."));
     parser.addPositionalArgument(QStringLiteral("TEXT"), QStringLiteral("The text to hash."));
     int status = ExitSuccess;
     if (!ParseArguments(parser, arguments, status, 1, 1))
@@ -85,11 +85,11 @@ QString ListResources(KestoResources &resources)
 int ResCommand(const QStringList &arguments)
 {
     QCommandLineParser parser;
-    parser.setApplicationDescription(QStringLiteral(
-        "Compiled resource files.\n"
-        "  dump FILE             the container's header, map, offsets and blocks\n"
-        "  list FILE             resource types and IDs with sizes; strings decoded\n"
-        "  compile SOURCE OUTPUT compile a resource source (see README) into OUTPUT"));
+    parser.setApplicationDescription(
+        QStringLiteral("Compiled resource files.\n"
+                       "  dump FILE             the container's header, map, offsets and blocks\n"
+                       "  list FILE             resource types and IDs with sizes; strings decoded\n"
+                       "  compile SOURCE OUTPUT compile a resource source (see README) into OUTPUT"));
     parser.addPositionalArgument(QStringLiteral("ACTION"), QStringLiteral("dump, list or compile."));
     parser.addPositionalArgument(QStringLiteral("FILE"), QStringLiteral("The resource file or source."));
     int status = ExitSuccess;
@@ -140,9 +140,9 @@ int ResCommand(const QStringList &arguments)
 int MifCommand(const QStringList &arguments)
 {
     QCommandLineParser parser;
-    parser.setApplicationDescription(QStringLiteral(
-        "Prints the records of a module-information file: header counts, class IDs, applets, external "
-        "classes, notifications, MIME types and program records."));
+    parser.setApplicationDescription(
+        QStringLiteral("Prints the records of a module-information file: header counts, class IDs, applets, external "
+                       "classes, notifications, MIME types and program records."));
     parser.addPositionalArgument(QStringLiteral("FILE"), QStringLiteral("The .mif file."));
     int status = ExitSuccess;
     if (!ParseArguments(parser, arguments, status, 1, 1))
@@ -160,16 +160,25 @@ int MifCommand(const QStringList &arguments)
     QString text = QStringLiteral("header: value1 %1, value2 %2, counts %3 %4 %5 %6, notifications %7, "
                                   "MIME types %8, count7 %9\n")
                        .arg(Hex32(h.value1), Hex32(h.value2))
-                       .arg(h.count1).arg(h.count2).arg(h.count3).arg(h.count4)
-                       .arg(h.notificationCount).arg(h.mimeTypeCount).arg(h.count7);
+                       .arg(h.count1)
+                       .arg(h.count2)
+                       .arg(h.count3)
+                       .arg(h.count4)
+                       .arg(h.notificationCount)
+                       .arg(h.mimeTypeCount)
+                       .arg(h.count7);
     text += QStringLiteral("classes: %1\n").arg(entry.classes.size());
     for (unsigned int id : entry.classes)
         text += QStringLiteral("  %1\n").arg(Hex32(id));
     text += QStringLiteral("applets: %1\n").arg(entry.applets.size());
     for (const Applet &a : entry.applets)
         text += QStringLiteral("  %1  baseid %2  apptype %3  hostid %4  privset %5  flags %6\n")
-                    .arg(Hex32(a.appletid)).arg(a.baseid).arg(a.apptype).arg(Hex32(a.hostid))
-                    .arg(a.privset).arg(a.flags);
+                    .arg(Hex32(a.appletid))
+                    .arg(a.baseid)
+                    .arg(a.apptype)
+                    .arg(Hex32(a.hostid))
+                    .arg(a.privset)
+                    .arg(a.flags);
     text += QStringLiteral("external classes: %1\n").arg(entry.externalClasses.size());
     for (unsigned int id : entry.externalClasses)
         text += QStringLiteral("  %1\n").arg(Hex32(id));
@@ -213,10 +222,17 @@ QString Printable(const QString &name)
             continue;
         }
         switch (u) {
-        case '\n': text += QStringLiteral("\\n"); break;
-        case '\t': text += QStringLiteral("\\t"); break;
-        case '\r': text += QStringLiteral("\\r"); break;
-        default: text += QStringLiteral("\\%1").arg(unsigned(u), 3, 8, QLatin1Char('0'));
+        case '\n':
+            text += QStringLiteral("\\n");
+            break;
+        case '\t':
+            text += QStringLiteral("\\t");
+            break;
+        case '\r':
+            text += QStringLiteral("\\r");
+            break;
+        default:
+            text += QStringLiteral("\\%1").arg(unsigned(u), 3, 8, QLatin1Char('0'));
         }
     }
     return text;
@@ -229,12 +245,18 @@ QChar TypeLetter(const TarFileEntry &entry)
     if (entry.IsDirectory())
         return QLatin1Char('d');
     switch (entry.typeflag) {
-    case '1': return QLatin1Char('h');
-    case '2': return QLatin1Char('l');
-    case '3': return QLatin1Char('c');
-    case '4': return QLatin1Char('b');
-    case '6': return QLatin1Char('p');
-    default: return entry.IsFile() ? QLatin1Char('-') : QLatin1Char('?');
+    case '1':
+        return QLatin1Char('h');
+    case '2':
+        return QLatin1Char('l');
+    case '3':
+        return QLatin1Char('c');
+    case '4':
+        return QLatin1Char('b');
+    case '6':
+        return QLatin1Char('p');
+    default:
+        return entry.IsFile() ? QLatin1Char('-') : QLatin1Char('?');
     }
 }
 
@@ -256,13 +278,13 @@ QString NotAFile(const TarFileEntry &entry)
 int TarCommand(const QStringList &arguments)
 {
     QCommandLineParser parser;
-    parser.setApplicationDescription(QStringLiteral(
-        "Tar package archives.\n"
-        "  list FILE         one line per member: type (- d l h c b p ?), size, name\n"
-        "                    (tab-separated; links followed by \" -> TARGET\" or\n"
-        "                    \" link to TARGET\"; control characters escaped)\n"
-        "  cat FILE MEMBER   the bytes of a member on standard output\n"
-        "A damaged archive is reported on standard error with exit status 2."));
+    parser.setApplicationDescription(
+        QStringLiteral("Tar package archives.\n"
+                       "  list FILE         one line per member: type (- d l h c b p ?), size, name\n"
+                       "                    (tab-separated; links followed by \" -> TARGET\" or\n"
+                       "                    \" link to TARGET\"; control characters escaped)\n"
+                       "  cat FILE MEMBER   the bytes of a member on standard output\n"
+                       "A damaged archive is reported on standard error with exit status 2."));
     parser.addPositionalArgument(QStringLiteral("ACTION"), QStringLiteral("list or cat."));
     parser.addPositionalArgument(QStringLiteral("FILE"), QStringLiteral("The archive."));
     int status = ExitSuccess;
@@ -370,7 +392,8 @@ int EncodeCommand(const QStringList &arguments)
     const QString text = parser.positionalArguments().at(1);
     const QList<LostCharacter> lost = LostCharacters(text, format);
     for (const LostCharacter &character : lost)
-        Err(arguments.at(0) + QStringLiteral(": %1 cannot be held by %2\n").arg(character.Describe(), QEncoding::Format2Name(format)));
+        Err(arguments.at(0)
+            + QStringLiteral(": %1 cannot be held by %2\n").arg(character.Describe(), QEncoding::Format2Name(format)));
     if (!lost.isEmpty())
         return ExitTestFailed;
     KestoResources resources;
@@ -382,9 +405,10 @@ int EncodeCommand(const QStringList &arguments)
 int DecodeCommand(const QStringList &arguments)
 {
     QCommandLineParser parser;
-    parser.setApplicationDescription(QStringLiteral(
-        "Detects the encoding of a resource string block from its mark and decodes it."));
-    parser.addPositionalArgument(QStringLiteral("HEX"), QStringLiteral("The block's bytes in hexadecimal (blanks allowed)."));
+    parser.setApplicationDescription(
+        QStringLiteral("Detects the encoding of a resource string block from its mark and decodes it."));
+    parser.addPositionalArgument(QStringLiteral("HEX"),
+                                 QStringLiteral("The block's bytes in hexadecimal (blanks allowed)."));
     int status = ExitSuccess;
     if (!ParseArguments(parser, arguments, status, 1, -1))
         return status;

@@ -126,8 +126,10 @@ QString Number(double value)
 
 void Counts(HtmlWriter &html, const RunReport &report, bool withNotFinished)
 {
-    const int total = report.Total(kPass) + report.Total(kFail) + report.Total(kUnsupported) + report.Total(kUnexecuted);
-    const struct {
+    const int total
+        = report.Total(kPass) + report.Total(kFail) + report.Total(kUnsupported) + report.Total(kUnexecuted);
+    const struct
+    {
         const char *cls;
         const char *word;
         int count;
@@ -155,13 +157,16 @@ void Counts(HtmlWriter &html, const RunReport &report, bool withNotFinished)
         html.Close();
     }
     html.Close();
-    html.Open("div", {{"class", QStringLiteral("bar")}, {"role", QStringLiteral("img")},
-                      {"aria-label", QStringLiteral("test case verdicts")}});
+    html.Open("div",
+              {{"class", QStringLiteral("bar")},
+               {"role", QStringLiteral("img")},
+               {"aria-label", QStringLiteral("test case verdicts")}});
     for (const auto &entry : counts) {
         if (entry.count > 0 && total > 0)
-            html.Element("span", QString(), {{"class", QLatin1String(entry.cls)},
-                                             {"style", QStringLiteral("width:%1%").arg(Number(100.0 * entry.count / total))},
-                                             {"title", QStringLiteral("%1 %2").arg(entry.count).arg(QLatin1String(entry.word))}});
+            html.Element("span", QString(),
+                         {{"class", QLatin1String(entry.cls)},
+                          {"style", QStringLiteral("width:%1%").arg(Number(100.0 * entry.count / total))},
+                          {"title", QStringLiteral("%1 %2").arg(entry.count).arg(QLatin1String(entry.word))}});
     }
     html.Close();
 }
@@ -171,7 +176,8 @@ void Counts(HtmlWriter &html, const RunReport &report, bool withNotFinished)
 // module starts no earlier than the one before it on that handset ended.
 void Timeline(HtmlWriter &html, const RunReport &report)
 {
-    struct Bar {
+    struct Bar
+    {
         const ModuleReport *module;
         qint64 startMs;
         qint64 durationMs;
@@ -209,15 +215,24 @@ void Timeline(HtmlWriter &html, const RunReport &report)
         html.Element("p", QStringLiteral("No module was taken by a handset."), {{"class", QStringLiteral("note")}});
         return;
     }
-    html.Open("svg", {{"id", QStringLiteral("timeline")}, {"xmlns", QStringLiteral("http://www.w3.org/2000/svg")},
-                      {"width", QString::number(kLabelWidth + kPlotWidth + 10)}, {"height", QString::number(height)},
-                      {"role", QStringLiteral("img")}, {"aria-label", QStringLiteral("modules per handset over time")}});
+    html.Open("svg",
+              {{"id", QStringLiteral("timeline")},
+               {"xmlns", QStringLiteral("http://www.w3.org/2000/svg")},
+               {"width", QString::number(kLabelWidth + kPlotWidth + 10)},
+               {"height", QString::number(height)},
+               {"role", QStringLiteral("img")},
+               {"aria-label", QStringLiteral("modules per handset over time")}});
     for (qsizetype lane = 0; lane < lanes.size(); ++lane) {
         const int y = int(lane) * kLaneHeight;
         html.Open("g", {{"class", QStringLiteral("lane")}, {"data-handset", lanes.at(lane)}});
-        html.Empty("rect", {{"class", QStringLiteral("lane")}, {"x", QString::number(kLabelWidth)}, {"y", QString::number(y + 2)},
-                            {"width", QString::number(kPlotWidth)}, {"height", QString::number(kLaneHeight - 4)}});
-        html.Element("text", lanes.at(lane), {{"x", QStringLiteral("0")}, {"y", QString::number(y + kLaneHeight / 2 + 4)}});
+        html.Empty("rect",
+                   {{"class", QStringLiteral("lane")},
+                    {"x", QString::number(kLabelWidth)},
+                    {"y", QString::number(y + 2)},
+                    {"width", QString::number(kPlotWidth)},
+                    {"height", QString::number(kLaneHeight - 4)}});
+        html.Element("text", lanes.at(lane),
+                     {{"x", QStringLiteral("0")}, {"y", QString::number(y + kLaneHeight / 2 + 4)}});
         qsizetype index = 0;
         const QList<Bar> laneBars = bars.value(lanes.at(lane));
         for (const Bar &bar : laneBars) {
@@ -225,23 +240,34 @@ void Timeline(HtmlWriter &html, const RunReport &report)
             const double x = scale > 0 ? bar.startMs * scale : double(index) * kPlotWidth / double(laneBars.size());
             const double width = scale > 0 ? bar.durationMs * scale : double(kPlotWidth) / double(laneBars.size());
             const QString outcome = Outcome(*bar.module);
-            html.Open("rect", {{"class", QStringLiteral("module ") + outcome}, {"data-module", bar.module->name},
-                               {"x", Number(kLabelWidth + x)}, {"y", QString::number(y + (kLaneHeight - kBarHeight) / 2)},
-                               {"width", Number(qMax(width - 1.0, 2.0))}, {"height", QString::number(kBarHeight)}});
-            html.Element("title", QStringLiteral("%1 on %2: %3, %4")
-                                      .arg(bar.module->name, bar.module->handset, OutcomeWord(outcome), Seconds(bar.module->durationMs)));
+            html.Open("rect",
+                      {{"class", QStringLiteral("module ") + outcome},
+                       {"data-module", bar.module->name},
+                       {"x", Number(kLabelWidth + x)},
+                       {"y", QString::number(y + (kLaneHeight - kBarHeight) / 2)},
+                       {"width", Number(qMax(width - 1.0, 2.0))},
+                       {"height", QString::number(kBarHeight)}});
+            html.Element(
+                "title",
+                QStringLiteral("%1 on %2: %3, %4")
+                    .arg(bar.module->name, bar.module->handset, OutcomeWord(outcome), Seconds(bar.module->durationMs)));
             html.Close();
             // The name inside the bar when it fits (about 7 pixels a letter).
             if (width > 7.0 * double(bar.module->name.size()) + 8.0)
-                html.Element("text", bar.module->name, {{"class", QStringLiteral("inbar")}, {"x", Number(kLabelWidth + x + 4)},
-                                                        {"y", QString::number(y + kLaneHeight / 2 + 4)}});
+                html.Element("text", bar.module->name,
+                             {{"class", QStringLiteral("inbar")},
+                              {"x", Number(kLabelWidth + x + 4)},
+                              {"y", QString::number(y + kLaneHeight / 2 + 4)}});
             ++index;
         }
         html.Close();
     }
-    html.Element("text", QStringLiteral("0 s"), {{"x", QString::number(kLabelWidth)}, {"y", QString::number(height - 4)}});
-    html.Element("text", Seconds(span), {{"x", QString::number(kLabelWidth + kPlotWidth)}, {"y", QString::number(height - 4)},
-                                         {"text-anchor", QStringLiteral("end")}});
+    html.Element("text", QStringLiteral("0 s"),
+                 {{"x", QString::number(kLabelWidth)}, {"y", QString::number(height - 4)}});
+    html.Element("text", Seconds(span),
+                 {{"x", QString::number(kLabelWidth + kPlotWidth)},
+                  {"y", QString::number(height - 4)},
+                  {"text-anchor", QStringLiteral("end")}});
     html.Close();
 }
 
@@ -271,13 +297,15 @@ void ModuleTable(HtmlWriter &html, const RunReport &report)
     html.Open("table", {{"id", QStringLiteral("modules")}});
     html.Open("thead");
     html.Open("tr");
-    const struct {
+    const struct
+    {
         const char *title;
         bool number;
-    } columns[] = {{"Module", false}, {"Family", false}, {"Handset", false}, {"Duration", true}, {"Passed", true},
-                   {"Failed", true}, {"Unsupported", true}, {"Unexecuted", true}, {"Outcome", false}};
+    } columns[] = {{"Module", false}, {"Family", false},     {"Handset", false},   {"Duration", true}, {"Passed", true},
+                   {"Failed", true},  {"Unsupported", true}, {"Unexecuted", true}, {"Outcome", false}};
     for (const auto &column : columns) {
-        if ((!withHandset && qstrcmp(column.title, "Handset") == 0) || (!withDuration && qstrcmp(column.title, "Duration") == 0))
+        if ((!withHandset && qstrcmp(column.title, "Handset") == 0)
+            || (!withDuration && qstrcmp(column.title, "Duration") == 0))
             continue;
         html.Element("th", QLatin1String(column.title),
                      {{"data-type", column.number ? QStringLiteral("number") : QStringLiteral("text")}});
@@ -289,12 +317,16 @@ void ModuleTable(HtmlWriter &html, const RunReport &report)
         const ModuleReport &module = report.modules.at(i);
         const QString outcome = Outcome(module);
         const bool ok = module.Finished() && module.Count(kFail) == 0;
-        html.Open("tr", {{"class", QStringLiteral("module")}, {"data-module", module.name},
-                         {"data-ok", ok ? QStringLiteral("1") : QStringLiteral("0")}});
+        html.Open("tr",
+                  {{"class", QStringLiteral("module")},
+                   {"data-module", module.name},
+                   {"data-ok", ok ? QStringLiteral("1") : QStringLiteral("0")}});
         html.Open("td", {{"data-value", module.name}});
         html.Element("a", module.name, {{"href", QStringLiteral("#module-%1").arg(i)}});
         html.Close();
-        Cell(html, module.subFamily.isEmpty() ? module.family : module.family + QStringLiteral(" / ") + module.subFamily, module.family);
+        Cell(html,
+             module.subFamily.isEmpty() ? module.family : module.family + QStringLiteral(" / ") + module.subFamily,
+             module.family);
         if (withHandset)
             Cell(html, module.handset, module.handset);
         if (withDuration)
@@ -319,9 +351,12 @@ void ModuleDetails(HtmlWriter &html, const RunReport &report, const QString &fol
     for (qsizetype i = 0; i < report.modules.size(); ++i) {
         const ModuleReport &module = report.modules.at(i);
         const bool ok = module.Finished() && module.Count(kFail) == 0;
-        html.Open("section", {{"class", QStringLiteral("module")}, {"id", QStringLiteral("module-%1").arg(i)},
-                              {"data-ok", ok ? QStringLiteral("1") : QStringLiteral("0")}});
-        html.Element("h3", module.handset.isEmpty() ? module.name : QStringLiteral("%1 on %2").arg(module.name, module.handset));
+        html.Open("section",
+                  {{"class", QStringLiteral("module")},
+                   {"id", QStringLiteral("module-%1").arg(i)},
+                   {"data-ok", ok ? QStringLiteral("1") : QStringLiteral("0")}});
+        html.Element(
+            "h3", module.handset.isEmpty() ? module.name : QStringLiteral("%1 on %2").arg(module.name, module.handset));
         if (!module.Finished())
             html.Element("p", QStringLiteral("Not finished: ") + module.reason, {{"class", QStringLiteral("note")}});
         if (!module.logs.isEmpty()) {
@@ -332,7 +367,10 @@ void ModuleDetails(HtmlWriter &html, const RunReport &report, const QString &fol
                     html.Text(QStringLiteral(", "));
                 const QString relative = base.relativeFilePath(module.logs.at(j));
                 // A log name may hold "#", "?" or "%": the link is encoded.
-                html.Element("a", relative, {{"href", QString::fromLatin1(QUrl::toPercentEncoding(QDir::fromNativeSeparators(relative), "/"))}});
+                html.Element(
+                    "a", relative,
+                    {{"href",
+                      QString::fromLatin1(QUrl::toPercentEncoding(QDir::fromNativeSeparators(relative), "/"))}});
             }
             html.Close();
         }
@@ -372,17 +410,19 @@ QByteArray RunReport::Html(const QString &folder) const
         html.Element("p", QStringLiteral("The standing verdict of every test case a processed-results file holds."),
                      {{"class", QStringLiteral("meta")}});
     } else {
-        html.Element("p", QStringLiteral("Started %1 UTC on %2, %3, handsets: %4%5")
-                              .arg(start.toUTC().toString(QStringLiteral("yyyy-MM-dd HH:mm:ss")), host, Seconds(durationMs),
-                                   handsets.join(QStringLiteral(", ")),
-                                   interrupted ? QStringLiteral(" (stopped by a signal)") : QString()),
+        html.Element("p",
+                     QStringLiteral("Started %1 UTC on %2, %3, handsets: %4%5")
+                         .arg(start.toUTC().toString(QStringLiteral("yyyy-MM-dd HH:mm:ss")), host, Seconds(durationMs),
+                              handsets.join(QStringLiteral(", ")),
+                              interrupted ? QStringLiteral(" (stopped by a signal)") : QString()),
                      {{"class", QStringLiteral("meta")}});
     }
     Counts(html, *this, !history);
     if (history) {
         html.Element("h2", QStringLiteral("History"));
-        html.Element("p", QStringLiteral("This processed-results file keeps one standing verdict per test case, "
-                                         "not the runs that gave it: no history across runs is recorded, so none is shown."),
+        html.Element("p",
+                     QStringLiteral("This processed-results file keeps one standing verdict per test case, "
+                                    "not the runs that gave it: no history across runs is recorded, so none is shown."),
                      {{"class", QStringLiteral("note")}, {"id", QStringLiteral("history")}});
     } else {
         Timeline(html, *this);

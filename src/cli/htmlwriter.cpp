@@ -10,13 +10,26 @@ QString HtmlWriter::Escape(const QString &text)
     escaped.reserve(text.size());
     for (const QChar c : text) {
         switch (c.unicode()) {
-        case '&': escaped += QStringLiteral("&amp;"); break;
-        case '<': escaped += QStringLiteral("&lt;"); break;
-        case '>': escaped += QStringLiteral("&gt;"); break;
-        case '"': escaped += QStringLiteral("&quot;"); break;
-        case '\'': escaped += QStringLiteral("&#39;"); break;
-        case 0: escaped += QChar::ReplacementCharacter; break;
-        default: escaped += c;
+        case '&':
+            escaped += QStringLiteral("&amp;");
+            break;
+        case '<':
+            escaped += QStringLiteral("&lt;");
+            break;
+        case '>':
+            escaped += QStringLiteral("&gt;");
+            break;
+        case '"':
+            escaped += QStringLiteral("&quot;");
+            break;
+        case '\'':
+            escaped += QStringLiteral("&#39;");
+            break;
+        case 0:
+            escaped += QChar::ReplacementCharacter;
+            break;
+        default:
+            escaped += c;
         }
     }
     return escaped;

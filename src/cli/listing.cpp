@@ -8,8 +8,7 @@
 
 namespace {
 
-int ListCommand(const QStringList &arguments, const QString &description,
-                const std::function<QString()> &list)
+int ListCommand(const QStringList &arguments, const QString &description, const std::function<QString()> &list)
 {
     QCommandLineParser parser;
     parser.setApplicationDescription(description);
@@ -33,7 +32,8 @@ int KitsCommand(const QStringList &arguments)
                            QString text;
                            for (const TestKit &kit : kits)
                                text += QStringLiteral("%1 %2\t%3\n")
-                                           .arg(haveDefault && kit.path == chosen.path ? QLatin1Char('*') : QLatin1Char(' '))
+                                           .arg(haveDefault && kit.path == chosen.path ? QLatin1Char('*')
+                                                                                       : QLatin1Char(' '))
                                            .arg(kit.name, kit.path);
                            return text;
                        });

@@ -25,7 +25,8 @@ int ModulesCommand(const QStringList &arguments)
     SelectionOptions selection;
     setup.AddTo(parser);
     selection.AddTo(parser);
-    parser.addPositionalArgument(QStringLiteral("PATTERN"), QStringLiteral("Module name patterns."), QStringLiteral("[PATTERN...]"));
+    parser.addPositionalArgument(QStringLiteral("PATTERN"), QStringLiteral("Module name patterns."),
+                                 QStringLiteral("[PATTERN...]"));
     int status = ExitSuccess;
     if (!ParseArguments(parser, arguments, status))
         return status;
@@ -56,10 +57,11 @@ const QString kPlatformCatalogue = QStringLiteral("PlatformManifest.xml");
 int ManifestCommand(const QStringList &arguments)
 {
     QCommandLineParser parser;
-    parser.setApplicationDescription(QStringLiteral(
-        "Scans the test kit and the platform again and writes their catalogues: to their caches, or with "
-        "-o into the folder DIR, the kit's as %1 and the platform's as %2.")
-                                         .arg(kKitCatalogue, kPlatformCatalogue));
+    parser.setApplicationDescription(
+        QStringLiteral(
+            "Scans the test kit and the platform again and writes their catalogues: to their caches, or with "
+            "-o into the folder DIR, the kit's as %1 and the platform's as %2.")
+            .arg(kKitCatalogue, kPlatformCatalogue));
     SetupOptions setup;
     setup.AddTo(parser);
     const QCommandLineOption output({QStringLiteral("o"), QStringLiteral("output")},
@@ -75,7 +77,8 @@ int ManifestCommand(const QStringList &arguments)
     if (parser.isSet(output)) {
         folder = QFileInfo(parser.value(output)).absoluteFilePath();
         if (QFileInfo::exists(folder) && !QFileInfo(folder).isDir()) {
-            Err(arguments.at(0) + QStringLiteral(": -o names a folder for both catalogues; %1 is a file\n").arg(folder));
+            Err(arguments.at(0)
+                + QStringLiteral(": -o names a folder for both catalogues; %1 is a file\n").arg(folder));
             return ExitUsage;
         }
         if (!QDir().mkpath(folder)) {
@@ -103,7 +106,8 @@ int ManifestCommand(const QStringList &arguments)
         if (!harness.GenerateManifest(path))
             return false;
         if (!path.isEmpty())
-            Out(QStringLiteral("%1 catalogue: %2\n").arg(platform ? QStringLiteral("Platform") : QStringLiteral("Kit"), path));
+            Out(QStringLiteral("%1 catalogue: %2\n")
+                    .arg(platform ? QStringLiteral("Platform") : QStringLiteral("Kit"), path));
         return true;
     };
     bool ok = true;

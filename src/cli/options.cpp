@@ -18,11 +18,10 @@ QString HelpText(const QCommandLineParser &parser, const QString &command)
 
 } // namespace
 
-bool ParseArguments(QCommandLineParser &parser, const QStringList &arguments, int &status,
-                    int minPositional, int maxPositional)
+bool ParseArguments(QCommandLineParser &parser, const QStringList &arguments, int &status, int minPositional,
+                    int maxPositional)
 {
-    const QCommandLineOption help({QStringLiteral("h"), QStringLiteral("help")},
-                                  QStringLiteral("Show this help."));
+    const QCommandLineOption help({QStringLiteral("h"), QStringLiteral("help")}, QStringLiteral("Show this help."));
     parser.addOption(help);
     if (!parser.parse(arguments)) {
         Err(arguments.value(0) + QStringLiteral(": ") + parser.errorText() + QLatin1Char('\n'));

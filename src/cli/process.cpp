@@ -16,8 +16,8 @@ namespace {
 // Any file below folder that processing would read as a log.
 bool HasLogs(const QString &folder)
 {
-    QDirIterator it(folder, {QStringLiteral("*.oat"), QStringLiteral("*.log"), QStringLiteral("*.txt")},
-                    QDir::Files, QDirIterator::Subdirectories);
+    QDirIterator it(folder, {QStringLiteral("*.oat"), QStringLiteral("*.log"), QStringLiteral("*.txt")}, QDir::Files,
+                    QDirIterator::Subdirectories);
     return it.hasNext();
 }
 
@@ -31,8 +31,12 @@ int ProcessCommand(const QStringList &arguments)
         "does.\nExit status 1 when a test case failed."));
     SetupOptions setup;
     setup.AddTo(parser);
-    const QCommandLineOption logDir(QStringLiteral("log-dir"), QStringLiteral("The folder of saved logs."), QStringLiteral("DIR"));
-    const QCommandLineOption results(QStringLiteral("results"), QStringLiteral("The processed-results file (default: DIR/ProcessedResults/ProcessedResults.xml)."), QStringLiteral("FILE"));
+    const QCommandLineOption logDir(QStringLiteral("log-dir"), QStringLiteral("The folder of saved logs."),
+                                    QStringLiteral("DIR"));
+    const QCommandLineOption results(
+        QStringLiteral("results"),
+        QStringLiteral("The processed-results file (default: DIR/ProcessedResults/ProcessedResults.xml)."),
+        QStringLiteral("FILE"));
     parser.addOptions({logDir, results, JUnitOption(), JsonOption(), HtmlOption()});
     int status = ExitSuccess;
     if (!ParseArguments(parser, arguments, status, 0, 0))

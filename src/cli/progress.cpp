@@ -45,12 +45,8 @@ int TerminalWidth(std::FILE *stream)
 } // namespace
 
 ProgressPrinter::ProgressPrinter(std::FILE *stream, int total, int handsetWidth, int moduleWidth)
-    : m_stream(stream),
-      m_terminal(IsTerminal(stream)),
-      m_colour(ColourWanted(stream)),
-      m_total(total),
-      m_handsetWidth(handsetWidth),
-      m_moduleWidth(moduleWidth)
+    : m_stream(stream), m_terminal(IsTerminal(stream)), m_colour(ColourWanted(stream)), m_total(total),
+      m_handsetWidth(handsetWidth), m_moduleWidth(moduleWidth)
 {
 }
 
@@ -75,7 +71,7 @@ QString ProgressPrinter::Paint(const QString &text, const char *colour) const
 QString ProgressPrinter::Columns(const QString &count, const QString &handset, const QString &module) const
 {
     return count + QLatin1Char(' ') + handset.leftJustified(m_handsetWidth) + QStringLiteral("  ")
-           + module.leftJustified(m_moduleWidth) + QStringLiteral("  ");
+        + module.leftJustified(m_moduleWidth) + QStringLiteral("  ");
 }
 
 void ProgressPrinter::Write(std::FILE *stream, const QString &text)
@@ -131,8 +127,9 @@ void ProgressPrinter::ModuleWaiting(const ModuleRecord &record, const QString &w
     if (beats <= m_beats.value(record.handset))
         return;
     m_beats.insert(record.handset, beats);
-    Write(m_stream, Columns(QStringLiteral("[...]"), record.handset, record.name) + QStringLiteral("still running: ")
-                        + what + QLatin1Char('\n'));
+    Write(m_stream,
+          Columns(QStringLiteral("[...]"), record.handset, record.name) + QStringLiteral("still running: ") + what
+              + QLatin1Char('\n'));
 }
 
 void ProgressPrinter::ModuleEnded(const ModuleRecord &record)
@@ -153,7 +150,8 @@ void ProgressPrinter::ModuleEnded(const ModuleRecord &record)
             QMap<QString, int> counts;
             for (const TestCaseResult &verdict : record.results.caseResults)
                 ++counts[verdict.result];
-            const struct {
+            const struct
+            {
                 const char *word;
                 const char *shown;
                 const char *colour;
@@ -162,7 +160,8 @@ void ProgressPrinter::ModuleEnded(const ModuleRecord &record)
             for (const auto &entry : known) {
                 const int count = counts.take(QLatin1String(entry.word));
                 if (count > 0 || qstrcmp(entry.word, "pass") == 0)
-                    parts.append(Paint(QStringLiteral("%1 %2").arg(count).arg(QLatin1String(entry.shown)), count > 0 ? entry.colour : nullptr));
+                    parts.append(Paint(QStringLiteral("%1 %2").arg(count).arg(QLatin1String(entry.shown)),
+                                       count > 0 ? entry.colour : nullptr));
             }
             for (auto it = counts.cbegin(); it != counts.cend(); ++it)
                 parts.append(QStringLiteral("%1 %2").arg(it.value()).arg(it.key()));
@@ -172,8 +171,9 @@ void ProgressPrinter::ModuleEnded(const ModuleRecord &record)
     const int digits = int(QString::number(m_total).size());
     const QString count = QStringLiteral("[%1/%2]").arg(m_done, digits).arg(m_total);
     ClearStatus();
-    Write(m_stream, Columns(count, record.handset, record.name) + verdicts + QStringLiteral("  ")
-                        + Duration(record.durationMs) + QLatin1Char('\n'));
+    Write(m_stream,
+          Columns(count, record.handset, record.name) + verdicts + QStringLiteral("  ") + Duration(record.durationMs)
+              + QLatin1Char('\n'));
     DrawStatus();
 }
 

@@ -60,8 +60,7 @@ QString IsoTime(const QDateTime &utc)
 
 QString LogText(const ModuleReport &module)
 {
-    return module.logs.isEmpty() ? QString()
-                                 : QStringLiteral(" (log: %1)").arg(module.logs.join(QStringLiteral(", ")));
+    return module.logs.isEmpty() ? QString() : QStringLiteral(" (log: %1)").arg(module.logs.join(QStringLiteral(", ")));
 }
 
 } // namespace
@@ -81,7 +80,8 @@ QString VerdictLines(const QString &logPath, const QString &testCase, const QStr
             if (j > i && lines.at(j).contains(testCase))
                 break;
             if (lines.at(j).contains(verdict, Qt::CaseInsensitive))
-                return j == i ? lines.at(i).trimmed() : lines.at(i).trimmed() + QStringLiteral(" / ") + lines.at(j).trimmed();
+                return j == i ? lines.at(i).trimmed()
+                              : lines.at(i).trimmed() + QStringLiteral(" / ") + lines.at(j).trimmed();
         }
     }
     return {};
@@ -141,8 +141,7 @@ bool RunReport::Read(const QString &path, QString *error)
         *error = QStringLiteral("%1 is not a processed-results file").arg(path);
         return false;
     }
-    for (QDomElement module = root.firstChildElement(); !module.isNull();
-         module = module.nextSiblingElement()) {
+    for (QDomElement module = root.firstChildElement(); !module.isNull(); module = module.nextSiblingElement()) {
         if (module.tagName().toLower() != QLatin1String("module"))
             continue;
         ModuleReport report;
@@ -153,8 +152,8 @@ bool RunReport::Read(const QString &path, QString *error)
         report.handset = module.attribute(QStringLiteral("handset"));
         for (QDomElement tc = module.firstChildElement(); !tc.isNull(); tc = tc.nextSiblingElement()) {
             if (tc.tagName().toLower() == QLatin1String("testcase"))
-                report.testCases.append({tc.attribute(QStringLiteral("name")),
-                                         tc.attribute(QStringLiteral("result")), QString()});
+                report.testCases.append(
+                    {tc.attribute(QStringLiteral("name")), tc.attribute(QStringLiteral("result")), QString()});
         }
         modules.append(report);
     }
@@ -181,8 +180,8 @@ int RunReport::Errors() const
 
 int RunReport::NotFinished() const
 {
-    return int(std::count_if(modules.cbegin(), modules.cend(),
-                             [](const ModuleReport &module) { return !module.Finished(); }));
+    return int(
+        std::count_if(modules.cbegin(), modules.cend(), [](const ModuleReport &module) { return !module.Finished(); }));
 }
 
 QString RunReport::Summary(bool withHandset) const
@@ -194,8 +193,8 @@ QString RunReport::Summary(bool withHandset) const
         nameWidth = qMax(nameWidth, int(module.name.size()));
         handsetWidth = qMax(handsetWidth, int(module.handset.size()));
     }
-    auto row = [&](const QString &name, const QString &handset, const QString &a, const QString &b,
-                   const QString &c, const QString &d) {
+    auto row = [&](const QString &name, const QString &handset, const QString &a, const QString &b, const QString &c,
+                   const QString &d) {
         QString line = Cell(name, nameWidth) + QStringLiteral("  ");
         if (withHandset)
             line += Cell(handset, handsetWidth) + QStringLiteral("  ");
@@ -209,8 +208,7 @@ QString RunReport::Summary(bool withHandset) const
         text += row(m.name, m.handset, QString::number(m.Count(kPass)), QString::number(m.Count(kFail)),
                     QString::number(m.Count(kUnsupported)), QString::number(m.Count(kUnexecuted)));
     }
-    text += row(totalLabel, QString(),
-                QString::number(Total(kPass)), QString::number(Total(kFail)),
+    text += row(totalLabel, QString(), QString::number(Total(kPass)), QString::number(Total(kFail)),
                 QString::number(Total(kUnsupported)), QString::number(Total(kUnexecuted)));
     for (const ModuleReport &m : modules) {
         if (!m.Finished())
@@ -223,8 +221,8 @@ QString RunReport::Summary(bool withHandset) const
 QByteArray RunReport::JUnit() const
 {
     QDomDocument document;
-    document.appendChild(document.createProcessingInstruction(
-        QStringLiteral("xml"), QStringLiteral("version=\"1.0\" encoding=\"UTF-8\"")));
+    document.appendChild(document.createProcessingInstruction(QStringLiteral("xml"),
+                                                              QStringLiteral("version=\"1.0\" encoding=\"UTF-8\"")));
     QDomElement suites = document.createElement(QStringLiteral("testsuites"));
     suites.setAttribute(QStringLiteral("name"), QStringLiteral("harness"));
     document.appendChild(suites);
@@ -233,7 +231,8 @@ QByteArray RunReport::JUnit() const
     int id = 0;
     for (const ModuleReport &module : modules) {
         QDomElement suite = document.createElement(QStringLiteral("testsuite"));
-        const QString className = module.family.isEmpty() ? module.name : module.family + QLatin1Char('.') + module.name;
+        const QString className
+            = module.family.isEmpty() ? module.name : module.family + QLatin1Char('.') + module.name;
         // A module that did not finish has no verdicts to trust: each of its
         // test cases (or the module itself, without any) is an error.
         QList<TestCaseReport> cases = module.testCases;
@@ -258,10 +257,12 @@ QByteArray RunReport::JUnit() const
                 ++errors;
             } else if (testCase.result == kFail) {
                 QDomElement failure = document.createElement(QStringLiteral("failure"));
-                failure.setAttribute(QStringLiteral("message"),
-                                     QStringLiteral("%1%2").arg(testCase.detail.isEmpty() ? QStringLiteral("test case %1 failed").arg(testCase.name)
-                                                                                          : testCase.detail,
-                                                                LogText(module)));
+                failure.setAttribute(
+                    QStringLiteral("message"),
+                    QStringLiteral("%1%2").arg(testCase.detail.isEmpty()
+                                                   ? QStringLiteral("test case %1 failed").arg(testCase.name)
+                                                   : testCase.detail,
+                                               LogText(module)));
                 failure.setAttribute(QStringLiteral("type"), kFail);
                 element.appendChild(failure);
                 ++failures;
@@ -354,8 +355,7 @@ QByteArray RunReport::Json() const
 
 void RunReport::DropNotExecuted()
 {
-    modules.erase(std::remove_if(modules.begin(), modules.end(),
-                                 [](const ModuleReport &m) { return !m.Executed(); }),
+    modules.erase(std::remove_if(modules.begin(), modules.end(), [](const ModuleReport &m) { return !m.Executed(); }),
                   modules.end());
 }
 
@@ -377,9 +377,9 @@ const QCommandLineOption &JsonOption()
 
 const QCommandLineOption &HtmlOption()
 {
-    static const QCommandLineOption option(QStringLiteral("html"),
-                                           QStringLiteral("Write a self-contained HTML report to FILE ('-': standard output)."),
-                                           QStringLiteral("FILE"));
+    static const QCommandLineOption option(
+        QStringLiteral("html"), QStringLiteral("Write a self-contained HTML report to FILE ('-': standard output)."),
+        QStringLiteral("FILE"));
     return option;
 }
 
@@ -440,13 +440,15 @@ int PublishReport(const RunReport &report, const QCommandLineParser &parser, boo
     if (trailer)
         say(trailer());
     enum Kind { JUnit, Json, Html };
-    for (const auto &[option, kind] : {std::pair{&JUnitOption(), JUnit}, std::pair{&JsonOption(), Json}, std::pair{&HtmlOption(), Html}}) {
+    for (const auto &[option, kind] :
+         {std::pair{&JUnitOption(), JUnit}, std::pair{&JsonOption(), Json}, std::pair{&HtmlOption(), Html}}) {
         if (!parser.isSet(*option))
             continue;
         const QString path = parser.value(*option);
-        const QByteArray bytes = kind == Json  ? report.Json()
-                                 : kind == Html ? report.Html(path == QLatin1String("-") ? QDir::currentPath() : QFileInfo(path).absolutePath())
-                                                : report.JUnit();
+        const QByteArray bytes = kind == Json ? report.Json()
+            : kind == Html
+            ? report.Html(path == QLatin1String("-") ? QDir::currentPath() : QFileInfo(path).absolutePath())
+            : report.JUnit();
         if (path == QLatin1String("-")) {
             Out(QString::fromUtf8(bytes));
             continue;
@@ -457,8 +459,11 @@ int PublishReport(const RunReport &report, const QCommandLineParser &parser, boo
                     .arg(path, error.isEmpty() ? QStringLiteral("unknown error") : error));
             return ExitUsage;
         }
-        say(QStringLiteral("%1: %2\n").arg(kind == Json ? QStringLiteral("JSON summary") : kind == Html ? QStringLiteral("HTML report") : QStringLiteral("JUnit report"),
-                                            kind == Html ? QFileInfo(path).absoluteFilePath() : path));
+        say(QStringLiteral("%1: %2\n")
+                .arg(kind == Json       ? QStringLiteral("JSON summary")
+                         : kind == Html ? QStringLiteral("HTML report")
+                                        : QStringLiteral("JUnit report"),
+                     kind == Html ? QFileInfo(path).absoluteFilePath() : path));
     }
     return ExitSuccess;
 }
@@ -509,26 +514,30 @@ int ReportCommand(const QStringList &arguments)
 {
     const QString command = arguments.at(0);
     QCommandLineParser parser;
-    parser.setApplicationDescription(QStringLiteral(
-        "Prints the summary of a processed-results file, the verdicts gathered there over every run, "
-        "and exports it as JUnit XML, JSON or a self-contained HTML page.\n"
-        "Modules without any executed test case are left out unless --all is given.\n"
-        "With --merge, merges the processed results of several hosts and handsets (each ran a shard of "
-        "one selection) into one row per module; with --expect-all, the modules of the selection that "
-        "no shard ran are listed as not run.\n"
-        "Exit status 1 when a test case failed or an expected module did not run."));
-    parser.addPositionalArgument(QStringLiteral("RESULTS.xml"), QStringLiteral("The processed-results file (with --merge, several)."),
+    parser.setApplicationDescription(
+        QStringLiteral("Prints the summary of a processed-results file, the verdicts gathered there over every run, "
+                       "and exports it as JUnit XML, JSON or a self-contained HTML page.\n"
+                       "Modules without any executed test case are left out unless --all is given.\n"
+                       "With --merge, merges the processed results of several hosts and handsets (each ran a shard of "
+                       "one selection) into one row per module; with --expect-all, the modules of the selection that "
+                       "no shard ran are listed as not run.\n"
+                       "Exit status 1 when a test case failed or an expected module did not run."));
+    parser.addPositionalArgument(QStringLiteral("RESULTS.xml"),
+                                 QStringLiteral("The processed-results file (with --merge, several)."),
                                  QStringLiteral("RESULTS.xml..."));
     const QCommandLineOption all(QStringLiteral("all"), QStringLiteral("Include modules that never ran."));
     const QCommandLineOption merge(QStringLiteral("merge"), QStringLiteral("Merge several processed-results files."));
-    const QCommandLineOption expectAll(QStringLiteral("expect-all"),
-                                       QStringLiteral("With --merge: list the selection's modules no file shows run "
-                                                      "(the selection of --kit, --platform, --family, --features and --pattern)."));
-    const QCommandLineOption pattern(QStringLiteral("pattern"), QStringLiteral("With --expect-all: a module name pattern of the selection."),
+    const QCommandLineOption expectAll(
+        QStringLiteral("expect-all"),
+        QStringLiteral("With --merge: list the selection's modules no file shows run "
+                       "(the selection of --kit, --platform, --family, --features and --pattern)."));
+    const QCommandLineOption pattern(QStringLiteral("pattern"),
+                                     QStringLiteral("With --expect-all: a module name pattern of the selection."),
                                      QStringLiteral("P"));
-    const QCommandLineOption saveTimings(QStringLiteral("save-timings"),
-                                         QStringLiteral("With --merge: write the recorded module times found beside the files to FILE."),
-                                         QStringLiteral("FILE"));
+    const QCommandLineOption saveTimings(
+        QStringLiteral("save-timings"),
+        QStringLiteral("With --merge: write the recorded module times found beside the files to FILE."),
+        QStringLiteral("FILE"));
     SetupOptions setup;
     SelectionOptions selection;
     setup.AddTo(parser);

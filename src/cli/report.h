@@ -14,9 +14,9 @@
 struct TestCaseReport
 {
     QString name;
-    QString result;  // "pass", "fail", "unsupported", "unexecuted" or the log's own word
-    QString detail;  // for a failure: the log's lines that give the verdict, when found
-    qint64 timeMs = -1;  // as the log gives it; -1 when it gives none
+    QString result; // "pass", "fail", "unsupported", "unexecuted" or the log's own word
+    QString detail; // for a failure: the log's lines that give the verdict, when found
+    qint64 timeMs = -1; // as the log gives it; -1 when it gives none
 };
 
 // One module of a report: where and when it ran, how it ended and its
@@ -28,18 +28,18 @@ struct ModuleReport
     QString family;
     QString subFamily;
     QString source;
-    QString host;       // the computer that drove the run
-    QString handset;    // the handset that ran it, when known
-    QDateTime start;    // UTC; invalid when unknown
-    qint64 durationMs = -1;  // -1 when unknown
+    QString host; // the computer that drove the run
+    QString handset; // the handset that ran it, when known
+    QDateTime start; // UTC; invalid when unknown
+    qint64 durationMs = -1; // -1 when unknown
     // Why the module did not run or did not finish ("handset lost",
     // "interrupted before it ran", ...); empty when it ran to its verdicts.
     QString reason;
-    QStringList logs;   // host paths of the logs copied for it
+    QStringList logs; // host paths of the logs copied for it
     QList<TestCaseReport> testCases;
 
     int Count(const QString &result) const;
-    bool Executed() const;  // any test case with a verdict other than "unexecuted"
+    bool Executed() const; // any test case with a verdict other than "unexecuted"
     bool Finished() const { return reason.isEmpty(); }
 };
 
@@ -47,11 +47,11 @@ struct ModuleReport
 // file has gathered over time (report).
 struct RunReport
 {
-    QString host;       // the computer that drove the run
-    QDateTime start;    // UTC; invalid for the history view
+    QString host; // the computer that drove the run
+    QDateTime start; // UTC; invalid for the history view
     qint64 durationMs = -1;
     QStringList handsets;
-    bool interrupted = false;  // stopped by a signal
+    bool interrupted = false; // stopped by a signal
     QList<ModuleReport> modules;
 
     // Reads a processed-results file ("testmodules" / "module" / "testcase").
@@ -72,7 +72,7 @@ struct RunReport
     QByteArray Html(const QString &folder) const;
 
     int Total(const QString &result) const;
-    int Errors() const;  // test cases of modules that did not finish
+    int Errors() const; // test cases of modules that did not finish
     int NotFinished() const;
 
     // Drops the modules without any executed test case.

@@ -45,8 +45,7 @@ extern "C" void OnStopSignal(int)
         _exit(ExitInterrupted);
     if (ShardedRun *run = g_run.load())
         run->Stop();
-    static const char message[] =
-        "\nharness run: stopping after the module in hand (signal again to end at once)\n";
+    static const char message[] = "\nharness run: stopping after the module in hand (signal again to end at once)\n";
     const ssize_t ignored = write(STDERR_FILENO, message, sizeof message - 1);
     (void)ignored;
 }
@@ -96,14 +95,16 @@ bool ResolveTargets(const QStringList &wanted, bool allTargets, const QString &c
                 matches = QStringList{handset.name};
                 break;
             }
-            if (handset.name.contains(text, Qt::CaseInsensitive) || handset.description.contains(text, Qt::CaseInsensitive))
+            if (handset.name.contains(text, Qt::CaseInsensitive)
+                || handset.description.contains(text, Qt::CaseInsensitive))
                 matches.append(handset.name);
         }
         if (matches.isEmpty())
             return Fail(command, QStringLiteral("no handset matching '%1' (see 'harness targets')").arg(text));
         if (matches.size() > 1)
-            return Fail(command, QStringLiteral("'%1' matches several handsets: %2; name one of them")
-                                     .arg(text, matches.join(QStringLiteral(", "))));
+            return Fail(command,
+                        QStringLiteral("'%1' matches several handsets: %2; name one of them")
+                            .arg(text, matches.join(QStringLiteral(", "))));
         names.append(matches.constFirst());
     }
     if (wanted.isEmpty() && !allTargets && !listed.isEmpty())
@@ -135,7 +136,7 @@ bool Reachable(const QString &name, const QString &command)
 std::unique_ptr<QLockFile> LockHandset(const QString &name, bool wait, const QString &command)
 {
     auto lock = std::make_unique<QLockFile>(TestDirectories::GetTargetDirectory(name) + QStringLiteral("/run.lock"));
-    lock->setStaleLockTime(0);  // a live holder keeps it however long its run takes
+    lock->setStaleLockTime(0); // a live holder keeps it however long its run takes
     if (lock->tryLock(0))
         return lock;
     qint64 pid = 0;
@@ -158,7 +159,8 @@ std::unique_ptr<QLockFile> LockHandset(const QString &name, bool wait, const QSt
 QStringList DamagedCopies(const QString &resultsPath)
 {
     const QFileInfo info(resultsPath);
-    QStringList copies = QDir(info.absolutePath()).entryList({info.fileName() + QStringLiteral(".unreadable-*")}, QDir::Files, QDir::Name);
+    QStringList copies = QDir(info.absolutePath())
+                             .entryList({info.fileName() + QStringLiteral(".unreadable-*")}, QDir::Files, QDir::Name);
     for (QString &copy : copies)
         copy = info.absolutePath() + QLatin1Char('/') + copy;
     return copies;
@@ -201,7 +203,8 @@ ModuleReport RowOf(const ShardedRun::ModuleResult &result, const QSharedPointer<
             times.insert(CaseTimes(log));
         for (const TestCaseResult &verdict : record.results.caseResults) {
             TestCaseReport testCase{verdict.testCase, verdict.result, QString(), times.value(verdict.testCase, -1)};
-            for (qsizetype i = 0; testCase.result == QLatin1String("fail") && testCase.detail.isEmpty() && i < record.logs.size(); ++i)
+            for (qsizetype i = 0;
+                 testCase.result == QLatin1String("fail") && testCase.detail.isEmpty() && i < record.logs.size(); ++i)
                 testCase.detail = VerdictLines(record.logs.at(i), verdict.testCase, verdict.result);
             row.testCases.append(testCase);
         }
@@ -250,9 +253,13 @@ QString Plan(const QList<QSharedPointer<_TestModule>> &order, const QStringList 
 {
     QString text = QStringLiteral("Dry run: nothing is installed or started.\n");
     text += handsets.size() == 1
-                ? QStringLiteral("%1 on %2, in this order:\n").arg(order.size() == 1 ? QStringLiteral("1 module") : QStringLiteral("%1 modules").arg(order.size()), handsets.constFirst())
-                : QStringLiteral("%1 shared by %2 (one queue in this order; each handset takes the next module when it is free):\n")
-                      .arg(order.size() == 1 ? QStringLiteral("1 module") : QStringLiteral("%1 modules").arg(order.size()), handsets.join(QStringLiteral(", ")));
+        ? QStringLiteral("%1 on %2, in this order:\n")
+              .arg(order.size() == 1 ? QStringLiteral("1 module") : QStringLiteral("%1 modules").arg(order.size()),
+                   handsets.constFirst())
+        : QStringLiteral(
+              "%1 shared by %2 (one queue in this order; each handset takes the next module when it is free):\n")
+              .arg(order.size() == 1 ? QStringLiteral("1 module") : QStringLiteral("%1 modules").arg(order.size()),
+                   handsets.join(QStringLiteral(", ")));
     int width = 0;
     for (const QSharedPointer<_TestModule> &module : order)
         width = qMax(width, int(module->moduleName.size()));
@@ -262,12 +269,15 @@ QString Plan(const QList<QSharedPointer<_TestModule>> &order, const QStringList 
         text += QStringLiteral("%1. %2  %3  %4  %5\n")
                     .arg(i + 1, digits)
                     .arg(module->moduleName.leftJustified(width), module->TestType(), module->Source(),
-                         module->testCases.size() == 1 ? QStringLiteral("1 test case") : QStringLiteral("%1 test cases").arg(module->testCases.size()));
+                         module->testCases.size() == 1 ? QStringLiteral("1 test case")
+                                                       : QStringLiteral("%1 test cases").arg(module->testCases.size()));
     }
     if (!retried.isEmpty())
-        text += QStringLiteral("--retry leaves out what the processed results show passed: %1\n").arg(retried.join(QStringLiteral(", ")));
+        text += QStringLiteral("--retry leaves out what the processed results show passed: %1\n")
+                    .arg(retried.join(QStringLiteral(", ")));
     if (!testCases.isEmpty())
-        text += QStringLiteral("Test cases of %1: %2\n").arg(order.constFirst()->moduleName, testCases.join(QStringLiteral(", ")));
+        text += QStringLiteral("Test cases of %1: %2\n")
+                    .arg(order.constFirst()->moduleName, testCases.join(QStringLiteral(", ")));
     if (timeoutSeconds > 0)
         text += QStringLiteral("A module still running after %1 is stopped.\n").arg(Seconds(timeoutSeconds));
     return text;
@@ -281,7 +291,8 @@ QString Slowest(const RunReport &report, int count)
         if (module.durationMs >= 0 && module.start.isValid())
             timed.append(&module);
     }
-    std::stable_sort(timed.begin(), timed.end(), [](const ModuleReport *a, const ModuleReport *b) { return a->durationMs > b->durationMs; });
+    std::stable_sort(timed.begin(), timed.end(),
+                     [](const ModuleReport *a, const ModuleReport *b) { return a->durationMs > b->durationMs; });
     QStringList parts;
     for (qsizetype i = 0; i < qMin<qsizetype>(count, timed.size()); ++i)
         parts.append(QStringLiteral("%1 %2").arg(timed.at(i)->name, Seconds(double(timed.at(i)->durationMs) / 1000.0)));
@@ -305,22 +316,51 @@ int RunCommand(const QStringList &arguments)
     setup.AddTo(parser);
     selection.AddTo(parser);
     shard.AddTo(parser);
-    const QCommandLineOption target(QStringLiteral("target"), QStringLiteral("The handset: its name, or a part of one handset's name or description; several times to share the run."), QStringLiteral("T"));
-    const QCommandLineOption testData(QStringLiteral("test-data"), QStringLiteral("Resource source of the test data to push."), QStringLiteral("FILE"));
-    const QCommandLineOption dpk(QStringLiteral("dpk"), QStringLiteral("Device pack (default: the platform's)."), QStringLiteral("FILE"));
-    const QCommandLineOption testCases(QStringLiteral("test-cases"), QStringLiteral("Run only these test cases of the first module in run order."), QStringLiteral("A,B"));
-    const QCommandLineOption runOption(QStringLiteral("run-option"), QStringLiteral("Run option for OAT modules (auto, interactive, all)."), QStringLiteral("O"));
-    const QCommandLineOption noDelete(QStringLiteral("no-delete"), QStringLiteral("Leave the modules installed on the handset."));
-    const QCommandLineOption copyDelay(QStringLiteral("copy-delay"), QStringLiteral("Pause before copying each log."), QStringLiteral("MS"));
-    const QCommandLineOption logDir(QStringLiteral("log-dir"), QStringLiteral("Folder for the copied logs (default: the handset's log folder; with several handsets one sub-folder each)."), QStringLiteral("DIR"));
-    const QCommandLineOption retry(QStringLiteral("retry"), QStringLiteral("Run only the selected modules that no handset's processed results show with every test case passed."));
-    const QCommandLineOption allTargets(QStringLiteral("all-targets"), QStringLiteral("Share the modules among every handset 'harness targets' lists."));
-    const QCommandLineOption wait(QStringLiteral("wait"), QStringLiteral("Wait for a handset another run is using instead of failing."));
-    const QCommandLineOption dryRun(QStringLiteral("dry-run"), QStringLiteral("Print what would run, on which handsets and in which order (after --retry), and stop; no handset is touched."));
-    const QCommandLineOption timeout(QStringLiteral("timeout"), QStringLiteral("Stop a module still running SECONDS after it started: it is removed from the handset and reported as not finished."), QStringLiteral("SECONDS"));
-    parser.addOptions({target, testData, dpk, testCases, runOption, noDelete, copyDelay, logDir,
-                       JUnitOption(), JsonOption(), HtmlOption(), retry, allTargets, wait, dryRun, timeout});
-    parser.addPositionalArgument(QStringLiteral("PATTERN"), QStringLiteral("Module name patterns ('*' at either end); each must match a module."), QStringLiteral("[PATTERN...]"));
+    const QCommandLineOption target(
+        QStringLiteral("target"),
+        QStringLiteral(
+            "The handset: its name, or a part of one handset's name or description; several times to share the run."),
+        QStringLiteral("T"));
+    const QCommandLineOption testData(QStringLiteral("test-data"),
+                                      QStringLiteral("Resource source of the test data to push."),
+                                      QStringLiteral("FILE"));
+    const QCommandLineOption dpk(QStringLiteral("dpk"), QStringLiteral("Device pack (default: the platform's)."),
+                                 QStringLiteral("FILE"));
+    const QCommandLineOption testCases(QStringLiteral("test-cases"),
+                                       QStringLiteral("Run only these test cases of the first module in run order."),
+                                       QStringLiteral("A,B"));
+    const QCommandLineOption runOption(QStringLiteral("run-option"),
+                                       QStringLiteral("Run option for OAT modules (auto, interactive, all)."),
+                                       QStringLiteral("O"));
+    const QCommandLineOption noDelete(QStringLiteral("no-delete"),
+                                      QStringLiteral("Leave the modules installed on the handset."));
+    const QCommandLineOption copyDelay(QStringLiteral("copy-delay"), QStringLiteral("Pause before copying each log."),
+                                       QStringLiteral("MS"));
+    const QCommandLineOption logDir(QStringLiteral("log-dir"),
+                                    QStringLiteral("Folder for the copied logs (default: the handset's log folder; "
+                                                   "with several handsets one sub-folder each)."),
+                                    QStringLiteral("DIR"));
+    const QCommandLineOption retry(
+        QStringLiteral("retry"),
+        QStringLiteral(
+            "Run only the selected modules that no handset's processed results show with every test case passed."));
+    const QCommandLineOption allTargets(
+        QStringLiteral("all-targets"),
+        QStringLiteral("Share the modules among every handset 'harness targets' lists."));
+    const QCommandLineOption wait(QStringLiteral("wait"),
+                                  QStringLiteral("Wait for a handset another run is using instead of failing."));
+    const QCommandLineOption dryRun(QStringLiteral("dry-run"),
+                                    QStringLiteral("Print what would run, on which handsets and in which order (after "
+                                                   "--retry), and stop; no handset is touched."));
+    const QCommandLineOption timeout(QStringLiteral("timeout"),
+                                     QStringLiteral("Stop a module still running SECONDS after it started: it is "
+                                                    "removed from the handset and reported as not finished."),
+                                     QStringLiteral("SECONDS"));
+    parser.addOptions({target, testData, dpk, testCases, runOption, noDelete, copyDelay, logDir, JUnitOption(),
+                       JsonOption(), HtmlOption(), retry, allTargets, wait, dryRun, timeout});
+    parser.addPositionalArgument(QStringLiteral("PATTERN"),
+                                 QStringLiteral("Module name patterns ('*' at either end); each must match a module."),
+                                 QStringLiteral("[PATTERN...]"));
     int status = ExitSuccess;
     if (!ParseArguments(parser, arguments, status))
         return status;
@@ -342,14 +382,20 @@ int RunCommand(const QStringList &arguments)
         bool ok = false;
         timeoutSeconds = parser.value(timeout).toDouble(&ok);
         if (!ok || !(timeoutSeconds > 0) || timeoutSeconds > kMaxTimeoutSeconds)
-            return Refuse(command, QStringLiteral("--timeout needs a number of seconds above 0 and at most %1").arg(kMaxTimeoutSeconds));
+            return Refuse(
+                command,
+                QStringLiteral("--timeout needs a number of seconds above 0 and at most %1").arg(kMaxTimeoutSeconds));
     }
     static const QStringList kRunOptions{QStringLiteral("auto"), QStringLiteral("interactive"), QStringLiteral("all")};
     if (parser.isSet(runOption) && !kRunOptions.contains(parser.value(runOption).toLower()))
-        return Refuse(command, QStringLiteral("unknown --run-option '%1' (auto, interactive or all)").arg(parser.value(runOption)));
+        return Refuse(
+            command,
+            QStringLiteral("unknown --run-option '%1' (auto, interactive or all)").arg(parser.value(runOption)));
     for (const QCommandLineOption *file : {&testData, &dpk}) {
         if (parser.isSet(*file) && !QFileInfo(parser.value(*file)).isFile())
-            return Refuse(command, QStringLiteral("--%1: %2 does not exist").arg(file->names().constFirst(), parser.value(*file)));
+            return Refuse(
+                command,
+                QStringLiteral("--%1: %2 does not exist").arg(file->names().constFirst(), parser.value(*file)));
     }
     if (parser.isSet(logDir) && !QDir().mkpath(parser.value(logDir)))
         return Refuse(command, QStringLiteral("cannot create the log folder %1").arg(parser.value(logDir)));
@@ -413,7 +459,8 @@ int RunCommand(const QStringList &arguments)
         harness.SetTarget(name);
         QString folder = TestDirectories::GetLogDirectory(name);
         if (parser.isSet(logDir)) {
-            folder = QFileInfo(parser.value(logDir)).absoluteFilePath() + (names.size() > 1 ? QLatin1Char('/') + name : QString());
+            folder = QFileInfo(parser.value(logDir)).absoluteFilePath()
+                + (names.size() > 1 ? QLatin1Char('/') + name : QString());
             QDir().mkpath(folder);
             harness.SetLogOutputPath(folder);
         }
@@ -444,9 +491,13 @@ int RunCommand(const QStringList &arguments)
         QString error;
         if (!history.Read(path, &error)) {
             if (parser.isSet(retry))
-                return Refuse(command, QStringLiteral("cannot retry: the processed results of %1 are unreadable (%2)").arg(name, error));
-            Err(command + QStringLiteral(": warning: the processed results of %1 are unreadable (%2); "
-                                         "this run starts a new file and keeps the damaged one aside\n").arg(name, error));
+                return Refuse(
+                    command,
+                    QStringLiteral("cannot retry: the processed results of %1 are unreadable (%2)").arg(name, error));
+            Err(command
+                + QStringLiteral(": warning: the processed results of %1 are unreadable (%2); "
+                                 "this run starts a new file and keeps the damaged one aside\n")
+                      .arg(name, error));
             continue;
         }
         passed.unite(PassedModules(history));
@@ -478,7 +529,9 @@ int RunCommand(const QStringList &arguments)
             const bool known = std::any_of(first->testCases.cbegin(), first->testCases.cend(),
                                            [&](const TestCase &testCase) { return testCase.name == wanted; });
             if (!known)
-                return Refuse(command, QStringLiteral("module %1 (the first in run order) has no test case '%2'").arg(first->moduleName, wanted));
+                return Refuse(command,
+                              QStringLiteral("module %1 (the first in run order) has no test case '%2'")
+                                  .arg(first->moduleName, wanted));
         }
     }
 
@@ -541,16 +594,18 @@ int RunCommand(const QStringList &arguments)
         if (!handset.lost)
             continue;
         text += handset.connected
-                    ? QStringLiteral("Handset %1 dropped out at %2, after %3.\n")
-                          .arg(handset.handset, handset.lostAt.toString(Qt::ISODateWithMs),
-                               handset.modulesRun == 1 ? QStringLiteral("1 module") : QStringLiteral("%1 modules").arg(handset.modulesRun))
-                    : QStringLiteral("Handset %1 could not be connected (%2).\n")
-                          .arg(handset.handset, handset.lostAt.toString(Qt::ISODateWithMs));
+            ? QStringLiteral("Handset %1 dropped out at %2, after %3.\n")
+                  .arg(handset.handset, handset.lostAt.toString(Qt::ISODateWithMs),
+                       handset.modulesRun == 1 ? QStringLiteral("1 module")
+                                               : QStringLiteral("%1 modules").arg(handset.modulesRun))
+            : QStringLiteral("Handset %1 could not be connected (%2).\n")
+                  .arg(handset.handset, handset.lostAt.toString(Qt::ISODateWithMs));
     }
     if (report.NotFinished() > 0)
         text += QStringLiteral("Run the modules that did not finish again with --retry.\n");
     for (const QString &name : std::as_const(names)) {
-        text += QStringLiteral("Logs of %1: %2\nProcessed results of %1: %3\n").arg(name, logFolders.value(name), resultsPaths.value(name));
+        text += QStringLiteral("Logs of %1: %2\nProcessed results of %1: %3\n")
+                    .arg(name, logFolders.value(name), resultsPaths.value(name));
         for (const QString &copy : DamagedCopies(resultsPaths.value(name))) {
             if (!damagedBefore.contains(copy))
                 text += QStringLiteral("The unreadable processed results of %1 were kept as %2\n").arg(name, copy);

@@ -21,14 +21,12 @@
 namespace {
 
 // A path, or part of the name of one of the entries.
-template<typename Record>
-bool Names(const QString &request, const QList<Record> &records)
+template <typename Record> bool Names(const QString &request, const QList<Record> &records)
 {
     if (request == QLatin1String("*") || QFileInfo(request).isDir())
         return true;
-    return std::any_of(records.cbegin(), records.cend(), [&](const Record &record) {
-        return record.name.contains(request, Qt::CaseInsensitive);
-    });
+    return std::any_of(records.cbegin(), records.cend(),
+                       [&](const Record &record) { return record.name.contains(request, Qt::CaseInsensitive); });
 }
 
 } // namespace
@@ -67,7 +65,8 @@ bool SetupOptions::Check(const QCommandLineParser &parser, const QString &comman
         QList<Platform> platforms;
         GetProPlatforms(platforms);
         if (!Names(parser.value(platform), platforms))
-            return Fail(command, QStringLiteral("no platform '%1' (see 'harness platforms')").arg(parser.value(platform)));
+            return Fail(command,
+                        QStringLiteral("no platform '%1' (see 'harness platforms')").arg(parser.value(platform)));
     }
     QString error;
     if (parser.isSet(log) && !CheckOutputPath(parser.value(log), &error))
@@ -97,7 +96,8 @@ bool SelectionOptions::Check(const QCommandLineParser &parser, const QString &co
         return Fail(command, QStringLiteral("--subfamily needs --family"));
     if (parser.isSet(features)) {
         if (parser.isSet(family) || !parser.positionalArguments().isEmpty())
-            return Fail(command, QStringLiteral("--features selects on its own: give no patterns and no --family with it"));
+            return Fail(command,
+                        QStringLiteral("--features selects on its own: give no patterns and no --family with it"));
         if (!QFileInfo(parser.value(features)).isFile())
             return Fail(command, QStringLiteral("the feature list %1 does not exist").arg(parser.value(features)));
     }
@@ -111,19 +111,21 @@ bool SelectionOptions::Select(Harness &harness, const QCommandLineParser &parser
     if (parser.isSet(features)) {
         harness.GetTestModules(modules, parser.value(features));
         if (modules.isEmpty())
-            return Fail(command, QStringLiteral("no module of the feature list %1 is in the catalogues").arg(parser.value(features)));
+            return Fail(
+                command,
+                QStringLiteral("no module of the feature list %1 is in the catalogues").arg(parser.value(features)));
         return true;
     }
     const QString wantedFamily = parser.value(family);
     const QString wantedSubFamily = parser.value(subFamily);
     const auto inFamily = [&](const QSharedPointer<_TestModule> &module) {
         return module->family.contains(wantedFamily, Qt::CaseInsensitive)
-               && module->subFamily.contains(wantedSubFamily, Qt::CaseInsensitive);
+            && module->subFamily.contains(wantedSubFamily, Qt::CaseInsensitive);
     };
     QString where;
     if (parser.isSet(family))
         where = QStringLiteral(" in family '%1'").arg(wantedFamily)
-                + (parser.isSet(subFamily) ? QStringLiteral(", sub-family '%1'").arg(wantedSubFamily) : QString());
+            + (parser.isSet(subFamily) ? QStringLiteral(", sub-family '%1'").arg(wantedSubFamily) : QString());
 
     QStringList patterns = givenPatterns ? *givenPatterns : parser.positionalArguments();
     if (patterns.isEmpty())
@@ -131,8 +133,8 @@ bool SelectionOptions::Select(Harness &harness, const QCommandLineParser &parser
     QSet<QString> seen;
     for (const QString &pattern : std::as_const(patterns)) {
         QList<QSharedPointer<_TestModule>> matches;
-        harness.GetTestModules(matches, pattern.isEmpty() ? QStringList() : QStringList{pattern},
-                               wantedFamily, wantedSubFamily);
+        harness.GetTestModules(matches, pattern.isEmpty() ? QStringList() : QStringList{pattern}, wantedFamily,
+                               wantedSubFamily);
         bool any = false;
         for (const QSharedPointer<_TestModule> &module : std::as_const(matches)) {
             if (!inFamily(module))
@@ -145,7 +147,8 @@ bool SelectionOptions::Select(Harness &harness, const QCommandLineParser &parser
             }
         }
         if (!any && !pattern.isEmpty())
-            return Fail(command, QStringLiteral("no module matches '%1'%2 (see 'harness modules')").arg(pattern, where));
+            return Fail(command,
+                        QStringLiteral("no module matches '%1'%2 (see 'harness modules')").arg(pattern, where));
         if (!any && parser.isSet(family))
             return Fail(command, QStringLiteral("no module%1 (see 'harness modules')").arg(where));
     }

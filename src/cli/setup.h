@@ -15,9 +15,16 @@ class _TestModule;
 // Options that configure the Harness, shared by the commands that use one.
 struct SetupOptions
 {
-    QCommandLineOption kit{QStringLiteral("kit"), QStringLiteral("Test kit: a path, or part of an installed kit's name (default: KESTIX_TESTSET)."), QStringLiteral("K")};
-    QCommandLineOption platform{QStringLiteral("platform"), QStringLiteral("Platform: a path, or part of an installed platform's name."), QStringLiteral("P")};
-    QCommandLineOption log{QStringLiteral("log"), QStringLiteral("Write the library's log to FILE (default: harness.log in the data folder)."), QStringLiteral("FILE")};
+    QCommandLineOption kit{
+        QStringLiteral("kit"),
+        QStringLiteral("Test kit: a path, or part of an installed kit's name (default: KESTIX_TESTSET)."),
+        QStringLiteral("K")};
+    QCommandLineOption platform{QStringLiteral("platform"),
+                                QStringLiteral("Platform: a path, or part of an installed platform's name."),
+                                QStringLiteral("P")};
+    QCommandLineOption log{QStringLiteral("log"),
+                           QStringLiteral("Write the library's log to FILE (default: harness.log in the data folder)."),
+                           QStringLiteral("FILE")};
     QCommandLineOption verbose{QStringLiteral("verbose"), QStringLiteral("Echo every log message to the console.")};
 
     void AddTo(QCommandLineParser &parser) const;
@@ -33,9 +40,15 @@ struct SetupOptions
 // The module filters of the commands that select modules.
 struct SelectionOptions
 {
-    QCommandLineOption family{QStringLiteral("family"), QStringLiteral("Select modules whose family contains F."), QStringLiteral("F")};
-    QCommandLineOption subFamily{QStringLiteral("subfamily"), QStringLiteral("With --family: and whose sub-family contains S."), QStringLiteral("S")};
-    QCommandLineOption features{QStringLiteral("features"), QStringLiteral("Select the modules named by a feature list file (not with patterns or --family)."), QStringLiteral("FILE")};
+    QCommandLineOption family{QStringLiteral("family"), QStringLiteral("Select modules whose family contains F."),
+                              QStringLiteral("F")};
+    QCommandLineOption subFamily{QStringLiteral("subfamily"),
+                                 QStringLiteral("With --family: and whose sub-family contains S."),
+                                 QStringLiteral("S")};
+    QCommandLineOption features{
+        QStringLiteral("features"),
+        QStringLiteral("Select the modules named by a feature list file (not with patterns or --family)."),
+        QStringLiteral("FILE")};
 
     void AddTo(QCommandLineParser &parser) const;
     // The filters alone make sense: --subfamily only with --family, a
@@ -58,8 +71,7 @@ struct SelectionOptions
 class EchoToStandardError
 {
 public:
-    explicit EchoToStandardError(bool silent = false)
-        : m_saved(std::cout.rdbuf(silent ? nullptr : std::cerr.rdbuf()))
+    explicit EchoToStandardError(bool silent = false) : m_saved(std::cout.rdbuf(silent ? nullptr : std::cerr.rdbuf()))
     {
     }
     ~EchoToStandardError()

@@ -29,7 +29,7 @@ HARNESS_EXPORT void SetScale(double factor);
 class HARNESS_EXPORT Timer
 {
 public:
-    Timer() : m_start(Now()) {}
+    Timer() : m_start(Now()) { }
     void Restart() { m_start = Now(); }
     qint64 Elapsed() const { return Now() - m_start; }
 

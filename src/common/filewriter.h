@@ -12,7 +12,6 @@ namespace FileWriter {
 // destination and renamed over it only once complete, so a crash or a full
 // disk never leaves a truncated file. Returns false (and fills error when
 // given) when the file cannot be written; an existing file is then unchanged.
-HARNESS_EXPORT bool Write(const QString &path, const QByteArray &bytes, bool atomic = true,
-                          QString *error = nullptr);
+HARNESS_EXPORT bool Write(const QString &path, const QByteArray &bytes, bool atomic = true, QString *error = nullptr);
 
 } // namespace FileWriter

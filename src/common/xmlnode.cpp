@@ -42,25 +42,15 @@ public:
     }
 
 private:
-    static bool IsNameStart(char16_t c)
-    {
-        return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || c == '_';
-    }
-    static bool IsNameChar(char16_t c)
-    {
-        return IsNameStart(c) || (c >= '0' && c <= '9') || c == '.' || c == '-';
-    }
+    static bool IsNameStart(char16_t c) { return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || c == '_'; }
+    static bool IsNameChar(char16_t c) { return IsNameStart(c) || (c >= '0' && c <= '9') || c == '.' || c == '-'; }
     static bool IsSpace(char16_t c) { return c == ' ' || c == '\t' || c == '\n' || c == '\r'; }
     // Characters that may stand as they are; line ends are read as "\n".
-    static bool IsPlainChar(char16_t c)
-    {
-        return c >= 0x20 ? c < 0xFFFE : (c == '\t' || c == '\n' || c == '\r');
-    }
+    static bool IsPlainChar(char16_t c) { return c >= 0x20 ? c < 0xFFFE : (c == '\t' || c == '\n' || c == '\r'); }
 
     bool Starts(std::u16string_view text) const
     {
-        return size_t(m_end - m_at) >= text.size()
-            && std::equal(text.begin(), text.end(), m_at);
+        return size_t(m_end - m_at) >= text.size() && std::equal(text.begin(), text.end(), m_at);
     }
 
     bool SkipSpaces()
@@ -136,8 +126,7 @@ private:
             spaced = SkipSpaces();
         }
         if (spaced && Starts(u"standalone")) {
-            if (!ReadPseudo(u"standalone", value)
-                || (value != QLatin1String("yes") && value != QLatin1String("no")))
+            if (!ReadPseudo(u"standalone", value) || (value != QLatin1String("yes") && value != QLatin1String("no")))
                 return false;
             SkipSpaces();
         }
@@ -245,11 +234,26 @@ private:
             return false;
         const std::u16string_view name(m_at, size_t(semicolon - m_at));
         m_at = semicolon + 1;
-        if (name == u"lt") { out += QLatin1Char('<'); return true; }
-        if (name == u"gt") { out += QLatin1Char('>'); return true; }
-        if (name == u"amp") { out += QLatin1Char('&'); return true; }
-        if (name == u"apos") { out += QLatin1Char('\''); return true; }
-        if (name == u"quot") { out += QLatin1Char('"'); return true; }
+        if (name == u"lt") {
+            out += QLatin1Char('<');
+            return true;
+        }
+        if (name == u"gt") {
+            out += QLatin1Char('>');
+            return true;
+        }
+        if (name == u"amp") {
+            out += QLatin1Char('&');
+            return true;
+        }
+        if (name == u"apos") {
+            out += QLatin1Char('\'');
+            return true;
+        }
+        if (name == u"quot") {
+            out += QLatin1Char('"');
+            return true;
+        }
         if (name.size() < 2 || name[0] != '#')
             return false;
         const bool hex = name[1] == 'x';
@@ -282,8 +286,7 @@ private:
     {
         while (m_at < m_end && *m_at != '<') {
             const char16_t *start = m_at;
-            while (m_at < m_end && *m_at != '<' && *m_at != '&' && *m_at != '>' && *m_at != '\r'
-                   && IsPlainChar(*m_at))
+            while (m_at < m_end && *m_at != '<' && *m_at != '&' && *m_at != '>' && *m_at != '\r' && IsPlainChar(*m_at))
                 ++m_at;
             text.append(reinterpret_cast<const QChar *>(start), m_at - start);
             if (m_at >= m_end || *m_at == '<')
@@ -320,8 +323,7 @@ private:
         const char16_t quote = *m_at++;
         for (bool first = true;; first = false) {
             const char16_t *start = m_at;
-            while (m_at < m_end && *m_at != quote && *m_at >= 0x20 && *m_at != '<' && *m_at != '&'
-                   && *m_at < 0xFFFE)
+            while (m_at < m_end && *m_at != quote && *m_at >= 0x20 && *m_at != '<' && *m_at != '&' && *m_at < 0xFFFE)
                 ++m_at;
             if (first && m_at < m_end && *m_at == quote && m_at - start <= kSharedValueSize) {
                 value = Shared(m_values, QStringView(start, m_at - start));
@@ -474,7 +476,9 @@ private:
 
 } // namespace
 
-XmlNode::XmlNode(const QString &name, Kind kind) : m_kind(kind), m_name(name) {}
+XmlNode::XmlNode(const QString &name, Kind kind) : m_kind(kind), m_name(name)
+{
+}
 
 XmlNode::~XmlNode()
 {
@@ -552,16 +556,15 @@ std::unique_ptr<XmlNode> XmlNode::ParseFully(const QByteArray &bytes, XmlParseEr
             break;
         case QXmlStreamReader::ProcessingInstruction:
             if (!open.empty()) {
-                auto instruction = std::make_unique<XmlNode>(
-                    reader.processingInstructionTarget().toString(), ProcessingInstruction);
+                auto instruction
+                    = std::make_unique<XmlNode>(reader.processingInstructionTarget().toString(), ProcessingInstruction);
                 instruction->m_value = reader.processingInstructionData().toString();
                 open.back()->m_children.push_back(std::move(instruction));
             }
             break;
         case QXmlStreamReader::EntityReference:
             if (!open.empty())
-                open.back()->m_children.push_back(
-                    std::make_unique<XmlNode>(reader.name().toString(), EntityReference));
+                open.back()->m_children.push_back(std::make_unique<XmlNode>(reader.name().toString(), EntityReference));
             break;
         default:
             break;
@@ -710,8 +713,8 @@ XmlNode &XmlNode::AppendChild(std::unique_ptr<XmlNode> child)
 
 void XmlNode::MoveToEnd(const XmlNode *child)
 {
-    const auto found = std::find_if(m_children.begin(), m_children.end(),
-                                    [child](const auto &node) { return node.get() == child; });
+    const auto found
+        = std::find_if(m_children.begin(), m_children.end(), [child](const auto &node) { return node.get() == child; });
     if (found != m_children.end())
         std::rotate(found, found + 1, m_children.end());
 }

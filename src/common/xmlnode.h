@@ -53,14 +53,13 @@ public:
 
     // Parse through QXmlStreamReader alone. Parse gives the same tree faster
     // for plain documents; this is the reference it is held to.
-    static std::unique_ptr<XmlNode> ParseFully(const QByteArray &bytes,
-                                               XmlParseError *error = nullptr);
+    static std::unique_ptr<XmlNode> ParseFully(const QByteArray &bytes, XmlParseError *error = nullptr);
 
     // Whether XML 1.0 can carry the character at all.
     static bool IsXmlChar(char32_t c)
     {
-        return c == 0x9 || c == 0xA || c == 0xD || (c >= 0x20 && c <= 0xD7FF)
-            || (c >= 0xE000 && c <= 0xFFFD) || (c >= 0x10000 && c <= 0x10FFFF);
+        return c == 0x9 || c == 0xA || c == 0xD || (c >= 0x20 && c <= 0xD7FF) || (c >= 0xE000 && c <= 0xFFFD)
+            || (c >= 0x10000 && c <= 0x10FFFF);
     }
 
     Kind NodeKind() const { return m_kind; }
@@ -92,8 +91,7 @@ public:
     XmlNode *FirstChildElement() const;
     // Calls visit with every child element, in document order, without
     // building a list.
-    template <class Visit>
-    void ForEachChildElement(Visit &&visit) const
+    template <class Visit> void ForEachChildElement(Visit &&visit) const
     {
         for (const auto &child : m_children) {
             if (child->IsElement())

@@ -65,18 +65,35 @@ void AppendEscaped(QString &out, const QString &text, bool attribute, bool ascii
             continue;
         }
         switch (c.unicode()) {
-        case '&': out += QLatin1String("&amp;"); continue;
-        case '<': out += QLatin1String("&lt;"); continue;
-        case '>': out += QLatin1String("&gt;"); continue;
+        case '&':
+            out += QLatin1String("&amp;");
+            continue;
+        case '<':
+            out += QLatin1String("&lt;");
+            continue;
+        case '>':
+            out += QLatin1String("&gt;");
+            continue;
         case '"':
-            if (attribute) { out += QLatin1String("&quot;"); continue; }
+            if (attribute) {
+                out += QLatin1String("&quot;");
+                continue;
+            }
             break;
         case '\n':
-            if (attribute) { out += QLatin1String("&#xa;"); continue; }
+            if (attribute) {
+                out += QLatin1String("&#xa;");
+                continue;
+            }
             break;
-        case '\r': out += QLatin1String("&#xd;"); continue;
+        case '\r':
+            out += QLatin1String("&#xd;");
+            continue;
         case '\t':
-            if (attribute) { out += QLatin1String("&#x9;"); continue; }
+            if (attribute) {
+                out += QLatin1String("&#x9;");
+                continue;
+            }
             break;
         default:
             break;
@@ -116,8 +133,7 @@ std::vector<QDomNode> SortedByName(const QDomNamedNodeMap &map)
         const QDomNode node = map.item(i);
         named.emplace_back(node.nodeName(), node);
     }
-    std::sort(named.begin(), named.end(),
-              [](const auto &a, const auto &b) { return a.first < b.first; });
+    std::sort(named.begin(), named.end(), [](const auto &a, const auto &b) { return a.first < b.first; });
     for (auto &entry : named)
         sorted.push_back(std::move(entry.second));
     return sorted;
@@ -133,7 +149,7 @@ bool IsTextLike(const QDomNode &node)
 class Writer
 {
 public:
-    Writer(int indent, bool ascii) : m_indent(indent < 0 ? 0 : indent), m_ascii(ascii) {}
+    Writer(int indent, bool ascii) : m_indent(indent < 0 ? 0 : indent), m_ascii(ascii) { }
 
     void Save(const QDomNode &node, int depth)
     {
@@ -277,10 +293,7 @@ private:
             m_out += QLatin1String("<![CDATA[") + value + QLatin1String("]]>");
     }
 
-    void SaveComment(const QString &value)
-    {
-        m_out += QLatin1String("<!--") + value + QLatin1String("-->");
-    }
+    void SaveComment(const QString &value) { m_out += QLatin1String("<!--") + value + QLatin1String("-->"); }
 
     void SaveProcessingInstruction(const QString &target, const QString &data)
     {
@@ -290,10 +303,7 @@ private:
         m_out += QLatin1String("?>");
     }
 
-    void SaveEntityReference(const QString &name)
-    {
-        m_out += QLatin1Char('&') + name + QLatin1Char(';');
-    }
+    void SaveEntityReference(const QString &name) { m_out += QLatin1Char('&') + name + QLatin1Char(';'); }
 
     static bool IsTextNode(const XmlNode *node) { return node && node->IsTextLike(); }
 
@@ -313,7 +323,9 @@ private:
 
     static SortedAttributes AttributesByName(const XmlNode &element)
     {
-        const auto byName = [](const auto *a, const auto *b) { return a->first < b->first; };
+        const auto byName = [](const auto *a, const auto *b) {
+            return a->first < b->first;
+        };
         SortedAttributes sorted;
         for (const auto &attribute : element.Attributes())
             sorted.append(&attribute);
@@ -444,8 +456,8 @@ private:
                 typePending = false;
         }
         for (QDomNode child = document.firstChild(); !child.isNull(); child = child.nextSibling()) {
-            const bool declaration = child.isProcessingInstruction()
-                && child.toProcessingInstruction().target() == QLatin1String("xml");
+            const bool declaration
+                = child.isProcessingInstruction() && child.toProcessingInstruction().target() == QLatin1String("xml");
             if (typePending && !declaration) {
                 SaveDocumentType(type);
                 typePending = false;
@@ -573,7 +585,7 @@ private:
 
 struct DocumentStream::Private
 {
-    Private(int indent, QIODevice *output) : writer(indent, false), device(output) {}
+    Private(int indent, QIODevice *output) : writer(indent, false), device(output) { }
     Writer writer;
     QIODevice *device;
     bool failed = false;
@@ -608,8 +620,7 @@ struct DocumentStream::Private
     static constexpr qsizetype kDrainSize = 32 * 1024;
 };
 
-DocumentStream::DocumentStream(int indent, QIODevice *device)
-    : d(new Private(indent < 0 ? 0 : indent, device))
+DocumentStream::DocumentStream(int indent, QIODevice *device) : d(new Private(indent < 0 ? 0 : indent, device))
 {
 }
 
@@ -711,14 +722,12 @@ QByteArray Serialize(const XmlNode &node, int indent)
     return ToString(node, indent).toUtf8();
 }
 
-bool WriteDocument(const QDomDocument &document, const QString &path, int indent, bool atomic,
-                   QString *error)
+bool WriteDocument(const QDomDocument &document, const QString &path, int indent, bool atomic, QString *error)
 {
     return FileWriter::Write(path, Serialize(document, indent), atomic, error);
 }
 
-bool WriteDocument(const XmlNode &root, const QString &path, int indent, bool atomic,
-                   QString *error)
+bool WriteDocument(const XmlNode &root, const QString &path, int indent, bool atomic, QString *error)
 {
     return FileWriter::Write(path, Serialize(root, indent), atomic, error);
 }

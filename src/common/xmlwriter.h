@@ -36,10 +36,10 @@ HARNESS_EXPORT QString ToString(const XmlNode &node, int indent = 1);
 HARNESS_EXPORT QByteArray Serialize(const XmlNode &node, int indent = 1);
 
 // Serialize(document) written with FileWriter::Write.
-HARNESS_EXPORT bool WriteDocument(const QDomDocument &document, const QString &path,
-                                  int indent = 1, bool atomic = true, QString *error = nullptr);
-HARNESS_EXPORT bool WriteDocument(const XmlNode &root, const QString &path, int indent = 1,
-                                  bool atomic = true, QString *error = nullptr);
+HARNESS_EXPORT bool WriteDocument(const QDomDocument &document, const QString &path, int indent = 1, bool atomic = true,
+                                  QString *error = nullptr);
+HARNESS_EXPORT bool WriteDocument(const XmlNode &root, const QString &path, int indent = 1, bool atomic = true,
+                                  QString *error = nullptr);
 
 // Writes one large document element by element, exactly as ToString would
 // write the whole tree, so that it never has to be held as one DOM: each

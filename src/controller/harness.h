@@ -149,15 +149,13 @@ public:
     // patterns with "*" wild cards at either end, or else a family and
     // sub-family contained in the module's. The list is not cleared. Returns
     // its count; set-up failures add nothing.
-    unsigned int GetTestModules(QList<QSharedPointer<_TestModule>> &modules,
-                                const QStringList &names, const QString &family,
-                                const QString &subFamily);
+    unsigned int GetTestModules(QList<QSharedPointer<_TestModule>> &modules, const QStringList &names,
+                                const QString &family, const QString &subFamily);
     // Clears the list and fills it with the modules named by the "testModule"
     // attributes of the "feature" elements of a feature list file. A missing
     // or malformed file, a file without features and unknown names are
     // logged. Returns the count.
-    unsigned int GetTestModules(QList<QSharedPointer<_TestModule>> &modules,
-                                const QString &featureFile);
+    unsigned int GetTestModules(QList<QSharedPointer<_TestModule>> &modules, const QString &featureFile);
     // Scans the kit and the platform again and writes their catalogues to
     // outputPath (each to its own cache when outputPath is empty); a file
     // that cannot be opened is written to the home folder under the same
@@ -252,8 +250,8 @@ private:
     bool ConnectionDied();
     // Writes one generated catalogue to outputPath (or its home-folder
     // fall-back, or its cache when outputPath is empty); true when written.
-    bool WriteGeneratedManifest(Manifest &manifest, const QString &setting,
-                                const QString &outputPath, const QString &fallbackName);
+    bool WriteGeneratedManifest(Manifest &manifest, const QString &setting, const QString &outputPath,
+                                const QString &fallbackName);
 
     // Stores a non-empty, changed kit or platform setting under key and
     // clears the environment-ready flag; false when nothing changed.

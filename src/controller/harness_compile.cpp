@@ -77,8 +77,7 @@ QString LineText(QByteArray line)
 // marker, reading standard output line by line until its end or, with
 // firstOnly, until the first such line. Standard error passes through to
 // ours. Nothing is collected when the tool cannot start.
-QStringList RunCompiler(const QString &tool, const QStringList &arguments,
-                        const QByteArray &marker, bool firstOnly)
+QStringList RunCompiler(const QString &tool, const QStringList &arguments, const QByteArray &marker, bool firstOnly)
 {
     QStringList matches;
     QProcess process;
@@ -122,9 +121,7 @@ bool Harness::CompileResource(const QString &source, const QString &output)
     if (source.endsWith(kKsxSuffix, Qt::CaseInsensitive)) {
         const QString car = source.left(source.size() - kKsxSuffix.size()) + kCarSuffix;
         const QStringList converted = RunCompiler(
-            tool,
-            {QStringLiteral("-convert"), QStringLiteral("-infile"), source,
-             QStringLiteral("-outfile"), car},
+            tool, {QStringLiteral("-convert"), QStringLiteral("-infile"), source, QStringLiteral("-outfile"), car},
             kConvertedText, false);
         for (const QString &line : converted)
             LogMessage(line, true);
@@ -135,9 +132,7 @@ bool Harness::CompileResource(const QString &source, const QString &output)
     bool compiled = false;
     if (!input.isEmpty()) {
         const QStringList success = RunCompiler(
-            tool,
-            {QStringLiteral("-compile"), QStringLiteral("-infile"), input,
-             QStringLiteral("-outfile"), output},
+            tool, {QStringLiteral("-compile"), QStringLiteral("-infile"), input, QStringLiteral("-outfile"), output},
             kCompiledText, true);
         if (!success.isEmpty()) {
             LogMessage(success.first(), true);
@@ -157,8 +152,7 @@ bool Harness::AltCompileResource(const QString &source, const QString &output)
     QProcess process;
     process.setProcessChannelMode(QProcess::MergedChannels);
     bool finished = false;
-    if (StartTool(process, tool,
-                  {QStringLiteral("-nh"), QStringLiteral("-o"), output, source})) {
+    if (StartTool(process, tool, {QStringLiteral("-nh"), QStringLiteral("-o"), output, source})) {
         // A compiler killed at the deadline may have left half a file, which
         // must not pass for a compiled device pack.
         finished = FinishTool(process, Clock::Timer(), kAltCompileWaitMs);
@@ -168,9 +162,9 @@ bool Harness::AltCompileResource(const QString &source, const QString &output)
     if (finished && QFileInfo(output).size() > 0)
         return true;
 
-    LogMessage(QStringLiteral("Device Pack Compiliation failed.\n")
-                   + QStringLiteral("\tCommand:\"") + tool + QStringLiteral("\"-nh -o ") + output
-                   + QLatin1Char(' ') + source + QStringLiteral("\n\n") + collected,
+    LogMessage(QStringLiteral("Device Pack Compiliation failed.\n") + QStringLiteral("\tCommand:\"") + tool
+                   + QStringLiteral("\"-nh -o ") + output + QLatin1Char(' ') + source + QStringLiteral("\n\n")
+                   + collected,
                true);
     return false;
 }

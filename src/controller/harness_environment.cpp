@@ -5,8 +5,8 @@
 
 #include "common/stringhash.h"
 #include "controller/environmentkeys.h"
-#include "environment/platforms.h"
 #include "environment/devicexml.h"
+#include "environment/platforms.h"
 #include "environment/testdirectories.h"
 
 #include <QDir>
@@ -19,8 +19,7 @@ namespace {
 const QString kDefault = QStringLiteral("*");
 const QString kPlatformSubdirectory = QStringLiteral("/pvs/platform");
 const QString kTrue = QStringLiteral("true");
-const QString kCompileErrorMessage =
-    QStringLiteral("Resource Compile Error: %1 can not be compiled into %2.\n");
+const QString kCompileErrorMessage = QStringLiteral("Resource Compile Error: %1 can not be compiled into %2.\n");
 
 // The path a source file is known by: absolute against the current
 // directory and cleaned, so relative and absolute spellings agree.
@@ -45,8 +44,7 @@ bool RemoveStale(const QString &cacheFile)
 
 // The first entry, in list order, whose lower-cased name contains the
 // lower-cased request; null when none.
-template<typename Record>
-const Record *FindByName(const QList<Record> &records, const QString &request)
+template <typename Record> const Record *FindByName(const QList<Record> &records, const QString &request)
 {
     const QString wanted = request.toLower();
     for (const Record &record : records) {
@@ -77,8 +75,7 @@ void Harness::SetTestData(const QString &path)
         return;
     }
 
-    const QString cacheFile =
-        TestDirectories::GetTestDataCacheFilePath(StringHashName(SourceIdentity(path)));
+    const QString cacheFile = TestDirectories::GetTestDataCacheFilePath(StringHashName(SourceIdentity(path)));
     m_environment.insert(EnvironmentKey::TestDataCachePath, cacheFile);
     if (!RefreshCache(path, cacheFile, &Harness::CompileResource)) {
         LogMessage(kCompileErrorMessage.arg(path, cacheFile), true);
@@ -123,8 +120,7 @@ bool Harness::SetupEnvironment()
     m_environment.insert(EnvironmentKey::TestRunID, QUuid::createUuid().toString());
     // A kit that an earlier set-up chose only to support the platform stays
     // unselected while it is still the kit in use.
-    m_kitNotSelected =
-        m_kitNotSelected && !m_defaultOnlyKit.isEmpty() && GetTestkit() == m_defaultOnlyKit;
+    m_kitNotSelected = m_kitNotSelected && !m_defaultOnlyKit.isEmpty() && GetTestkit() == m_defaultOnlyKit;
 
     if (GetTestkit().isEmpty() && GetPlatform().isEmpty()) {
         SetTestkit(kDefault);

@@ -11,9 +11,9 @@ QSharedPointer<_TestModule> Harness::FindTestModule(const QString &name, const Q
     if (!Setup())
         return {};
     const QString wanted = source.toUpper();
-    const QSharedPointer<Manifest> catalogue = wanted == QLatin1String("KVK")   ? m_kitManifest
-                                               : wanted == QLatin1String("PVS") ? m_platformManifest
-                                                                                : QSharedPointer<Manifest>();
+    const QSharedPointer<Manifest> catalogue = wanted == QLatin1String("KVK") ? m_kitManifest
+        : wanted == QLatin1String("PVS")                                      ? m_platformManifest
+                                                                              : QSharedPointer<Manifest>();
     return catalogue ? catalogue->FindTestModule(name) : QSharedPointer<_TestModule>();
 }
 

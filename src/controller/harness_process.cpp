@@ -17,7 +17,7 @@ namespace {
 bool IsSkippedFolder(const QString &name)
 {
     return name.compare(QLatin1String("oatRawLogs"), Qt::CaseInsensitive) == 0
-           || name.compare(QLatin1String("ProcessedResults"), Qt::CaseInsensitive) == 0;
+        || name.compare(QLatin1String("ProcessedResults"), Qt::CaseInsensitive) == 0;
 }
 
 } // namespace
@@ -53,8 +53,7 @@ bool Harness::Process(int depth)
     LogMessage(indent + QStringLiteral("   Parsing Logs"), true);
     const QDir folder(logPath);
     const QFileInfoList logs = folder.entryInfoList(
-        {QStringLiteral("*.oat"), QStringLiteral("*.log"), QStringLiteral("*.txt")}, QDir::Files,
-        QDir::Type);
+        {QStringLiteral("*.oat"), QStringLiteral("*.log"), QStringLiteral("*.txt")}, QDir::Files, QDir::Type);
     for (const QFileInfo &log : logs) {
         const QString path = log.absoluteFilePath();
         const QSharedPointer<_TestModule> module = Manifest::CreateTestModuleFromLog(path);
@@ -68,15 +67,13 @@ bool Harness::Process(int depth)
 
     // Sorted, so the same tree always gives the same file; links are not
     // followed, so a link back up the tree cannot make the walk endless.
-    const QFileInfoList folders =
-        folder.entryInfoList(QDir::Dirs | QDir::NoDotAndDotDot | QDir::NoSymLinks,
-                             QDir::Name | QDir::IgnoreCase);
+    const QFileInfoList folders
+        = folder.entryInfoList(QDir::Dirs | QDir::NoDotAndDotDot | QDir::NoSymLinks, QDir::Name | QDir::IgnoreCase);
     for (const QFileInfo &sub : folders) {
         if (IsSkippedFolder(sub.fileName()))
             continue;
         m_environment.insert(EnvironmentKey::LogPath, sub.absoluteFilePath());
-        LogMessage(indent + QStringLiteral("   Processing Sub Directory %1").arg(sub.absoluteFilePath()),
-                   true);
+        LogMessage(indent + QStringLiteral("   Processing Sub Directory %1").arg(sub.absoluteFilePath()), true);
         Process(depth + 3);
         m_environment.insert(EnvironmentKey::LogPath, logPath);
     }

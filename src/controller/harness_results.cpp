@@ -4,10 +4,10 @@
 
 #include "catalogue/manifest.h"
 #include "catalogue/testmodule.h"
-#include "controller/environmentkeys.h"
-#include "controller/resultssession.h"
-#include "controller/processedresults.h"
 #include "catalogue/testresults.h"
+#include "controller/environmentkeys.h"
+#include "controller/processedresults.h"
+#include "controller/resultssession.h"
 
 #include <QDir>
 
@@ -42,8 +42,7 @@ void Harness::EnsureProcessedResultsPath(const QString &folder)
     const QString directory = logPath + QDir::separator() + folder;
     QDir().mkpath(directory);
     m_environment.insert(EnvironmentKey::ProcessedResultsPath,
-                         QDir::cleanPath(directory + QDir::separator()
-                                         + QStringLiteral("ProcessedResults.xml")));
+                         QDir::cleanPath(directory + QDir::separator() + QStringLiteral("ProcessedResults.xml")));
 }
 
 void Harness::UpdateProcessedModulesXML(QSharedPointer<_TestModule> module)
@@ -77,8 +76,7 @@ bool Harness::RecordVerdicts(QSharedPointer<_TestModule> module, TestResults &pa
         known = m_platformManifest->FindTestModule(parsed.manifestName);
 
     if (!known) {
-        LogMessage(QStringLiteral("   Warning: Module Name:%1 not found in the manifests.\n")
-                       .arg(parsed.manifestName),
+        LogMessage(QStringLiteral("   Warning: Module Name:%1 not found in the manifests.\n").arg(parsed.manifestName),
                    true);
     } else {
         module->idHash = known->idHash;
@@ -92,8 +90,8 @@ bool Harness::RecordVerdicts(QSharedPointer<_TestModule> module, TestResults &pa
         if (idHash.isEmpty())
             idHash = parsed.manifestName;
         for (const TestCaseResult &verdict : parsed.caseResults) {
-            results->Record(idHash, parsed.manifestName, module->family, module->subFamily,
-                            verdict.testCase, verdict.result);
+            results->Record(idHash, parsed.manifestName, module->family, module->subFamily, verdict.testCase,
+                            verdict.result);
         }
     }
 

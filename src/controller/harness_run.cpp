@@ -58,7 +58,7 @@ namespace {
 class ListSource : public ModuleSource
 {
 public:
-    explicit ListSource(const QList<QSharedPointer<_TestModule>> &modules) : m_modules(modules) {}
+    explicit ListSource(const QList<QSharedPointer<_TestModule>> &modules) : m_modules(modules) { }
     QSharedPointer<_TestModule> Next() override
     {
         return m_next < m_modules.size() ? m_modules.at(m_next++) : QSharedPointer<_TestModule>();
@@ -248,8 +248,7 @@ bool Harness::RunModules(ModuleSource &source)
             entry.framework->SetLogger(m_logger);
             if (entry.framework->IsLoaded(m_device)) {
                 entry.framework->PostLoad(m_device, m_environment);
-                LogMessage(QStringLiteral("Harness::Run Framework %1 already loaded")
-                               .arg(entry.framework->name),
+                LogMessage(QStringLiteral("Harness::Run Framework %1 already loaded").arg(entry.framework->name),
                            false);
                 entry.wasLoaded = true;
             } else {
@@ -260,8 +259,7 @@ bool Harness::RunModules(ModuleSource &source)
             current = frameworks.size() - 1;
         }
 
-        LogMessage(QStringLiteral("Running %1 test %2 ID:%3\n")
-                       .arg(module->Source(), name, module->ModuleName()),
+        LogMessage(QStringLiteral("Running %1 test %2 ID:%3\n").arg(module->Source(), name, module->ModuleName()),
                    true);
         if (!m_testCases.isEmpty()) {
             module->SetTestCases(m_testCases);
@@ -309,8 +307,7 @@ bool Harness::RunModules(ModuleSource &source)
             LogMessage(QStringLiteral("   No logs found for %1\n").arg(name), true);
             // Logs that could not be fetched from a handset that went away
             // are not the module's fault: it has to run again elsewhere.
-            finish(module, m_device->connectionLost ? ModuleSource::Interrupted
-                                                    : ModuleSource::NoLogs);
+            finish(module, m_device->connectionLost ? ModuleSource::Interrupted : ModuleSource::NoLogs);
             if (ConnectionDied())
                 return false;
             continue;
@@ -356,7 +353,8 @@ bool Harness::Run(QSharedPointer<_TestModule> module)
             first = false;
         }
         bool found = false;
-        const struct {
+        const struct
+        {
             QSharedPointer<Manifest> catalogue;
             const char *message;
         } catalogues[] = {
@@ -366,8 +364,7 @@ bool Harness::Run(QSharedPointer<_TestModule> module)
         for (const auto &entry : catalogues) {
             if (!entry.catalogue)
                 continue;
-            const QSharedPointer<_TestModule> secondary =
-                entry.catalogue->FindTestModule(secondaryName);
+            const QSharedPointer<_TestModule> secondary = entry.catalogue->FindTestModule(secondaryName);
             if (!secondary)
                 continue;
             found = true;
@@ -376,8 +373,7 @@ bool Harness::Run(QSharedPointer<_TestModule> module)
             secondary->InstallTest(m_device);
         }
         if (!found) {
-            LogMessage(QStringLiteral("   Warning: Secondary Module %1 not found.\n").arg(secondaryName),
-                       true);
+            LogMessage(QStringLiteral("   Warning: Secondary Module %1 not found.\n").arg(secondaryName), true);
         }
     }
     return module->Run(m_device, m_environment);

@@ -16,8 +16,7 @@ namespace {
 
 const QString kGenerating = QStringLiteral("Generating manifest for ");
 const QString kNotGenerated = QStringLiteral("Manifest %1 could not be generated.");
-const QString kDefaultDevicePack =
-    QStringLiteral("/testframeworks/oat/tools/reference/deviceref.dso");
+const QString kDefaultDevicePack = QStringLiteral("/testframeworks/oat/tools/reference/deviceref.dso");
 
 // The "testModule" attributes of every "feature" element, at any depth, in
 // document order; features counts the elements. The walk keeps no stack of
@@ -57,8 +56,7 @@ bool Harness::GenerateCatalogue(Manifest &catalogue, bool force, const QString &
     // A scan that found modules serves this run even when its cache cannot
     // be written (a full disk, a cache folder that is not one).
     if (!catalogue.testModules.isEmpty()) {
-        LogMessage(QStringLiteral("Manifest %1 could not be cached; the catalogue just scanned is used.")
-                       .arg(path),
+        LogMessage(QStringLiteral("Manifest %1 could not be cached; the catalogue just scanned is used.").arg(path),
                    true);
         return true;
     }
@@ -108,9 +106,8 @@ bool Harness::SetupManifest()
     return kitReady || platformReady;
 }
 
-unsigned int Harness::GetTestModules(QList<QSharedPointer<_TestModule>> &modules,
-                                     const QStringList &names, const QString &family,
-                                     const QString &subFamily)
+unsigned int Harness::GetTestModules(QList<QSharedPointer<_TestModule>> &modules, const QStringList &names,
+                                     const QString &family, const QString &subFamily)
 {
     if (Setup()) {
         if (m_kitManifest && !m_kitNotSelected)
@@ -121,8 +118,7 @@ unsigned int Harness::GetTestModules(QList<QSharedPointer<_TestModule>> &modules
     return unsigned(modules.size());
 }
 
-unsigned int Harness::GetTestModules(QList<QSharedPointer<_TestModule>> &modules,
-                                     const QString &featureFile)
+unsigned int Harness::GetTestModules(QList<QSharedPointer<_TestModule>> &modules, const QString &featureFile)
 {
     modules.clear();
     QFile file(featureFile);
@@ -166,16 +162,14 @@ unsigned int Harness::GetTestModules(QList<QSharedPointer<_TestModule>> &modules
         found.insert(module->moduleName.toLower());
     for (const QString &name : names) {
         if (!found.contains(name.toLower())) {
-            LogMessage(QStringLiteral("   Warning: Testmodule \"%1\" not found in test manifests.")
-                           .arg(name),
-                       true);
+            LogMessage(QStringLiteral("   Warning: Testmodule \"%1\" not found in test manifests.").arg(name), true);
         }
     }
     return unsigned(modules.size());
 }
 
-bool Harness::WriteGeneratedManifest(Manifest &manifest, const QString &setting,
-                                     const QString &outputPath, const QString &fallbackName)
+bool Harness::WriteGeneratedManifest(Manifest &manifest, const QString &setting, const QString &outputPath,
+                                     const QString &fallbackName)
 {
     if (outputPath.isEmpty()) {
         LogMessage(QStringLiteral("Manifest written to ") + manifest.ManifestFilePath(), true);
@@ -224,8 +218,8 @@ bool Harness::GenerateManifest(const QString &outputPath)
 
     // Scans one catalogue afresh and writes it; a failed scan leaves the
     // Harness without that catalogue.
-    const auto generate = [&](QSharedPointer<Manifest> &catalogue, const QString &setting,
-                              bool isPlatform, const QString &fallbackName) {
+    const auto generate = [&](QSharedPointer<Manifest> &catalogue, const QString &setting, bool isPlatform,
+                              const QString &fallbackName) {
         catalogue.reset(new Manifest(setting, isPlatform));
         catalogue->SetLogger(m_logger);
         LogMessage(kGenerating + setting, true);
@@ -242,7 +236,6 @@ bool Harness::GenerateManifest(const QString &outputPath)
         written = generate(m_kitManifest, kit, false, QStringLiteral("KVKManifest.xml"));
     const QString platform = GetPlatform();
     if (platformGiven && !platform.isEmpty())
-        written = generate(m_platformManifest, platform, true, QStringLiteral("PlatformManifest.xml"))
-                  || written;
+        written = generate(m_platformManifest, platform, true, QStringLiteral("PlatformManifest.xml")) || written;
     return written;
 }

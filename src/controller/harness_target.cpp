@@ -54,7 +54,7 @@ bool Harness::ConnectToTarget(const QString &name)
     ConnectFactory::ListTargets(targets);
     for (const ConnectTarget &target : targets) {
         const bool matches = wanted.isEmpty() || target.description.toLower().contains(wanted)
-                             || target.name.toLower().contains(wanted);
+            || target.name.toLower().contains(wanted);
         if (matches && ConnectToTarget(target)) {
             LogMessage(QStringLiteral("Connected to target: %1").arg(target.name), true);
             return true;
@@ -79,8 +79,7 @@ bool Harness::ConnectToTarget(const ConnectTarget &target)
     if (!m_environment.contains(EnvironmentKey::LogPath))
         m_environment.insert(EnvironmentKey::LogPath, TestDirectories::GetLogDirectory(handset));
     if (!m_environment.contains(EnvironmentKey::ProcessedResultsPath))
-        m_environment.insert(EnvironmentKey::ProcessedResultsPath,
-                             TestDirectories::GetProcessResultsPath(handset));
+        m_environment.insert(EnvironmentKey::ProcessedResultsPath, TestDirectories::GetProcessResultsPath(handset));
 
     QString version;
     if (m_device->GetPlatformVersion(version) == 0 && !version.isEmpty())

@@ -1,7 +1,7 @@
 #pragma once
 
-#include "../common/export.h"
 #include "../catalogue/testresults.h"
+#include "../common/export.h"
 
 #include <QDateTime>
 #include <QSharedPointer>
@@ -18,12 +18,12 @@ class HARNESS_EXPORT ModuleSource
 public:
     // How a module taken by the run loop ended.
     enum Outcome {
-        Recorded,      // its logs were copied, post-processed and recorded
-        NoLogs,        // it ran but no logs were found
-        StartFailed,   // it could not be installed or started
-        NoFramework,   // the kit has no framework for its test type
-        Interrupted,   // the handset was lost before its logs were copied
-        TimedOut,      // it outlived the run's time limit per module and was removed
+        Recorded, // its logs were copied, post-processed and recorded
+        NoLogs, // it ran but no logs were found
+        StartFailed, // it could not be installed or started
+        NoFramework, // the kit has no framework for its test type
+        Interrupted, // the handset was lost before its logs were copied
+        TimedOut, // it outlived the run's time limit per module and was removed
     };
 
     virtual ~ModuleSource();
@@ -44,20 +44,20 @@ public:
 // ended, and the verdicts its logs gave in this run.
 struct HARNESS_EXPORT ModuleRecord
 {
-    QString name;          // the module's name
-    QString source;        // "KVK" or "PVS"
-    QString testType;      // the module's test type word
-    QString handset;       // the connected handset's name
-    QDateTime start;       // UTC, when the loop took the module
+    QString name; // the module's name
+    QString source; // "KVK" or "PVS"
+    QString testType; // the module's test type word
+    QString handset; // the connected handset's name
+    QDateTime start; // UTC, when the loop took the module
     qint64 durationMs = 0; // until the outcome was known, on the library's clock
     qint64 timeLimitMs = 0; // the time limit it outlived (TimedOut)
     // How it ended; Interrupted until the outcome is known.
     ModuleSource::Outcome outcome = ModuleSource::Interrupted;
-    bool parsed = false;   // a log was recognised; results holds its verdicts
+    bool parsed = false; // a log was recognised; results holds its verdicts
     // The verdicts the module's logs gave when they were recorded; empty
     // unless outcome is Recorded and a log was recognised.
     TestResults results;
-    QStringList logs;      // host paths of the logs copied in this run
+    QStringList logs; // host paths of the logs copied in this run
 
     // Why the module did not run or finish, in a few words; empty when it
     // was recorded with verdicts.

@@ -197,9 +197,8 @@ bool ModuleTimings::Save(const QString &path)
                                 {QStringLiteral("source"), module.source},
                                 {QStringLiteral("runs"), runs}});
     }
-    const QJsonObject root{{QStringLiteral("format"), kFormat},
-                           {QStringLiteral("version"), kVersion},
-                           {QStringLiteral("modules"), list}};
+    const QJsonObject root{
+        {QStringLiteral("format"), kFormat}, {QStringLiteral("version"), kVersion}, {QStringLiteral("modules"), list}};
     QString error;
     if (!FileWriter::Write(path, QJsonDocument(root).toJson(QJsonDocument::Indented), true, &error)) {
         m_error = QStringLiteral("cannot write %1: %2").arg(path, error);

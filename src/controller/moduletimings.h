@@ -24,10 +24,10 @@ public:
     // One recorded run of a module.
     struct Run
     {
-        qint64 ms = 0;     // its wall time in milliseconds, on the library's clock
-        QString handset;   // the name of the handset it ran on
-        QString host;      // the name of the host machine that ran it
-        QDateTime at;  // when it ended (UTC)
+        qint64 ms = 0; // its wall time in milliseconds, on the library's clock
+        QString handset; // the name of the handset it ran on
+        QString host; // the name of the host machine that ran it
+        QDateTime at; // when it ended (UTC)
 
         // The same run: equal time, handset, host and end. Such runs are kept once.
         bool operator==(const Run &other) const

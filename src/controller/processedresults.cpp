@@ -82,8 +82,7 @@ struct ProcessedResults::Module
         if (a.size() != b.size())
             return a.size() < b.size();
         return std::char_traits<char16_t>::compare(reinterpret_cast<const char16_t *>(a.constData()),
-                                                   reinterpret_cast<const char16_t *>(b.constData()),
-                                                   size_t(a.size()))
+                                                   reinterpret_cast<const char16_t *>(b.constData()), size_t(a.size()))
             < 0;
     }
 
@@ -147,7 +146,9 @@ struct ProcessedResults::Module
     // moves the rest of the index.
     void RemoveCase(const QString &name, const XmlNode *testCase)
     {
-        const auto same = [testCase](const Case &c) { return c.element == testCase; };
+        const auto same = [testCase](const Case &c) {
+            return c.element == testCase;
+        };
         const auto inTail = std::find_if(tail.begin(), tail.end(), same);
         if (inTail != tail.end()) {
             tail.erase(inTail);
@@ -264,8 +265,8 @@ void ProcessedResults::BuildIndex()
     m_index.clear();
     for (const auto &child : m_root->Children()) {
         XmlNode *element = child.get();
-        if (!element->IsElement() || !IsElement(*element, kModuleElement)
-            || !element->HasAttribute(kName) || !element->HasAttribute(kIdHash)) {
+        if (!element->IsElement() || !IsElement(*element, kModuleElement) || !element->HasAttribute(kName)
+            || !element->HasAttribute(kIdHash)) {
             continue;
         }
         const QString hash = element->Attribute(kIdHash);
@@ -280,9 +281,8 @@ void ProcessedResults::IndexCases(Module &module)
         module.Build();
 }
 
-void ProcessedResults::Record(const QString &idHash, const QString &moduleName,
-                              const QString &family, const QString &subFamily,
-                              const QString &testCase, const QString &result)
+void ProcessedResults::Record(const QString &idHash, const QString &moduleName, const QString &family,
+                              const QString &subFamily, const QString &testCase, const QString &result)
 {
     // The verdicts of one module come one after the other.
     Module *module = nullptr;
@@ -346,8 +346,7 @@ void ProcessedResults::Record(const QString &idHash, const QString &moduleName,
 
 bool ProcessedResults::KeepDamagedFile()
 {
-    const QString stamp =
-        QDateTime::currentDateTimeUtc().toString(QStringLiteral("yyyyMMdd-HHmmss"));
+    const QString stamp = QDateTime::currentDateTimeUtc().toString(QStringLiteral("yyyyMMdd-HHmmss"));
     QString aside = m_path + QStringLiteral(".unreadable-") + stamp;
     for (int n = 1; QFileInfo::exists(aside); ++n)
         aside = m_path + QStringLiteral(".unreadable-%1-%2").arg(stamp).arg(n);
@@ -360,8 +359,7 @@ bool ProcessedResults::KeepDamagedFile()
                        .arg(m_path));
         return false;
     }
-    LogMessage(QStringLiteral("Processed results file %1 could not be read; it is kept as %2.\n")
-                   .arg(m_path, aside));
+    LogMessage(QStringLiteral("Processed results file %1 could not be read; it is kept as %2.\n").arg(m_path, aside));
     return true;
 }
 
@@ -377,10 +375,8 @@ bool ProcessedResults::Save()
 
     const QString folder = QFileInfo(m_path).absolutePath();
     QString error;
-    if (!QDir().mkpath(folder)
-        || !XmlWriter::WriteDocument(*m_root, m_path, 1, true, &error)) {
-        LogMessage(QStringLiteral("Processed results file %1 could not be written. %2\n")
-                       .arg(m_path, error));
+    if (!QDir().mkpath(folder) || !XmlWriter::WriteDocument(*m_root, m_path, 1, true, &error)) {
+        LogMessage(QStringLiteral("Processed results file %1 could not be written. %2\n").arg(m_path, error));
         return false;
     }
     m_modified = false;

@@ -44,8 +44,8 @@ public:
     // moduleName, any letter case); an unknown module gets a new entry with
     // the given family and sub-family. A stored test case whose name is the
     // reported one without a ".1" or "_1" ending takes the reported name.
-    void Record(const QString &idHash, const QString &moduleName, const QString &family,
-                const QString &subFamily, const QString &testCase, const QString &result);
+    void Record(const QString &idHash, const QString &moduleName, const QString &family, const QString &subFamily,
+                const QString &testCase, const QString &result);
 
     // Writes the document when it was modified, atomically, through the
     // deterministic XML writer. A malformed file found by Open is first kept

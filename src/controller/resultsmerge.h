@@ -31,24 +31,24 @@ public:
     // One module of the merged results.
     struct Row
     {
-        QString name;       // the module's name
-        QString source;  // "KVK", "PVS", or empty for a module known only from logs
-        QString family;     // the family the module belongs to; empty when none is given
-        QString subFamily;  // the sub-family within family; empty when none is given
-        QString host;     // where it ran; several joined by ", "
-        QString handset;  // the handset it ran on; several joined by ", "; empty when none
+        QString name; // the module's name
+        QString source; // "KVK", "PVS", or empty for a module known only from logs
+        QString family; // the family the module belongs to; empty when none is given
+        QString subFamily; // the sub-family within family; empty when none is given
+        QString host; // where it ran; several joined by ", "
+        QString handset; // the handset it ran on; several joined by ", "; empty when none
         bool ran = false; // some file shows a verdict other than "unexecuted" for it
-        QList<QPair<QString, QString>> testCases;  // (name, result word), in file order
+        QList<QPair<QString, QString>> testCases; // (name, result word), in file order
     };
 
     // A module the selection holds.
     struct Expected
     {
-        QString name;           // the module's name
-        QString source;         // "KVK" or "PVS"
-        QString family;         // the family the module belongs to
-        QString subFamily;      // the sub-family within family
-        QStringList testCases;  // the names of its test cases, in catalogue order
+        QString name; // the module's name
+        QString source; // "KVK" or "PVS"
+        QString family; // the family the module belongs to
+        QString subFamily; // the sub-family within family
+        QStringList testCases; // the names of its test cases, in catalogue order
     };
 
     // Larger files (in bytes) are not processed-results files: Add refuses them.
@@ -87,9 +87,9 @@ private:
     qsizetype Find(const QString &name, const QString &source) const;
     void Merge(const Row &row);
 
-    QList<Row> m_rows;  // ran somewhere, in first-seen order
-    QHash<QString, qsizetype> m_index;   // by source and lower-cased name
-    QHash<QString, QList<qsizetype>> m_byName;  // by lower-cased name
+    QList<Row> m_rows; // ran somewhere, in first-seen order
+    QHash<QString, qsizetype> m_index; // by source and lower-cased name
+    QHash<QString, QList<qsizetype>> m_byName; // by lower-cased name
     QList<Expected> m_expected;
     ModuleTimings m_timings;
     QString m_kitHash;

@@ -10,8 +10,8 @@
 #include "log/log.h"
 
 #include <QHash>
-#include <QSysInfo>
 #include <QSet>
+#include <QSysInfo>
 
 #include <condition_variable>
 #include <deque>
@@ -62,8 +62,7 @@ public:
 
     // A module that was taken has ended on handset; an interrupted one goes
     // back to the front of the queue.
-    void Done(qsizetype index, const QString &handset, ModuleSource::Outcome outcome,
-              const ModuleRecord &record)
+    void Done(qsizetype index, const QString &handset, ModuleSource::Outcome outcome, const ModuleRecord &record)
     {
         {
             const std::lock_guard<std::mutex> lock(m_mutex);
@@ -112,8 +111,8 @@ public:
     void Prepare(const QList<ModuleResult> &modules)
     {
         for (qsizetype i = 0; i < modules.size(); ++i) {
-            const QSharedPointer<_TestModule> module =
-                m_harness.FindTestModule(modules.at(i).name, modules.at(i).source);
+            const QSharedPointer<_TestModule> module
+                = m_harness.FindTestModule(modules.at(i).name, modules.at(i).source);
             if (module)
                 m_modules.insert(i, module);
             m_names.append(modules.at(i).name);
@@ -193,11 +192,12 @@ public:
         if (record.outcome == ModuleSource::Recorded) {
             const QString path = ModuleTimings::PathBeside(m_harness.GetProcessedResultsPath());
             QString error;
-            if (!ModuleTimings::Record(path, record.name, record.source,
-                                       {record.durationMs, record.handset, QSysInfo::machineHostName(),
-                                        QDateTime::currentDateTimeUtc()},
-                                       &error))
-                m_run.LogMessage(QStringLiteral("Warning: the time of %1 could not be recorded: %2\n").arg(record.name, error));
+            if (!ModuleTimings::Record(
+                    path, record.name, record.source,
+                    {record.durationMs, record.handset, QSysInfo::machineHostName(), QDateTime::currentDateTimeUtc()},
+                    &error))
+                m_run.LogMessage(
+                    QStringLiteral("Warning: the time of %1 could not be recorded: %2\n").arg(record.name, error));
         }
         if (m_run.m_observer)
             m_run.m_observer->ModuleEnded(record);
@@ -245,8 +245,7 @@ private:
         m_result.lostAfterMs = timer.Elapsed();
         m_run.LogMessage(QStringLiteral("Handset %1 dropped out at %2 (%3 ms into the run); %4 left for the "
                                         "other handsets.\n")
-                             .arg(m_result.handset,
-                                  m_result.lostAt.toString(QStringLiteral("yyyy-MM-dd hh:mm:ss.zzz")))
+                             .arg(m_result.handset, m_result.lostAt.toString(QStringLiteral("yyyy-MM-dd hh:mm:ss.zzz")))
                              .arg(m_result.lostAfterMs)
                              .arg(ModuleCount(m_queue.Pending())));
     }
@@ -324,7 +323,8 @@ bool ShardedRun::Run(const QList<QSharedPointer<_TestModule>> &selection)
     }
     LogMessage(QStringLiteral("Running %1 on %2\n")
                    .arg(ModuleCount(m_modules.size()),
-                        m_harnesses.size() == 1 ? QStringLiteral("1 handset") : QStringLiteral("%1 handsets").arg(m_harnesses.size())));
+                        m_harnesses.size() == 1 ? QStringLiteral("1 handset")
+                                                : QStringLiteral("%1 handsets").arg(m_harnesses.size())));
 
     for (Harness *harness : std::as_const(m_harnesses)) {
         HandsetResult handset;

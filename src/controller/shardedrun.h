@@ -43,14 +43,14 @@ public:
     {
         // The module's name.
         QString name;
-        QString source;    // "KVK" or "PVS"
+        QString source; // "KVK" or "PVS"
         // The module's test type word.
         QString testType;
-        QString handset;   // the handset that ran it; empty when none did
-        bool ran = false;  // a handset took it and it ended (any outcome)
+        QString handset; // the handset that ran it; empty when none did
+        bool ran = false; // a handset took it and it ended (any outcome)
         // How it ended; Interrupted when no handset finished it.
         ModuleSource::Outcome outcome = ModuleSource::Interrupted;
-        int attempts = 0;  // how many handsets took it
+        int attempts = 0; // how many handsets took it
         // What the last handset that took it saw: start, duration, copied
         // logs and the verdicts recorded in this run. Empty when no handset
         // took it.
@@ -60,13 +60,13 @@ public:
     // One handset of the run.
     struct HandsetResult
     {
-        QString target;     // the Harness's target setting
-        QString handset;    // the connected handset's name (the target when none)
+        QString target; // the Harness's target setting
+        QString handset; // the connected handset's name (the target when none)
         // The handset connected when the run began.
         bool connected = false;
-        bool lost = false;  // dropped out before the queue was done
-        QDateTime lostAt;   // when it dropped out (local time)
-        qint64 lostAfterMs = 0;  // milliseconds after the run began
+        bool lost = false; // dropped out before the queue was done
+        QDateTime lostAt; // when it dropped out (local time)
+        qint64 lostAfterMs = 0; // milliseconds after the run began
         // How many modules it finished.
         int modulesRun = 0;
     };

@@ -50,8 +50,8 @@ ShardPlan ShardPlan::Make(const QList<Module> &selection, int shardCount)
         entry.name = module.name;
         entry.source = module.source;
         entry.estimated = module.expectedMs < 0;
-        entry.expectedMs = entry.estimated ? qint64(std::llround(estimate * std::max(1, module.testCases)))
-                                           : module.expectedMs;
+        entry.expectedMs
+            = entry.estimated ? qint64(std::llround(estimate * std::max(1, module.testCases))) : module.expectedMs;
         plan.m_entries.append(entry);
     }
 
@@ -75,7 +75,7 @@ ShardPlan ShardPlan::Make(const QList<Module> &selection, int shardCount)
         return x.source < y.source;
     });
 
-    using Load = std::pair<qint64, int>;  // expected time so far, shard index
+    using Load = std::pair<qint64, int>; // expected time so far, shard index
     std::priority_queue<Load, std::vector<Load>, std::greater<Load>> loads;
     for (int shard = 0; shard < plan.m_shardCount; ++shard)
         loads.push({0, shard});

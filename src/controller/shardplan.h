@@ -21,20 +21,20 @@ public:
     // One module of the selection; expectedMs < 0 when nothing is known of it.
     struct Module
     {
-        QString name;            // the module's name
-        QString source;  // "KVK" or "PVS"
-        int testCases = 0;       // how many test cases it has
-        qint64 expectedMs = -1;  // its expected wall time in milliseconds; -1 when unknown
+        QString name; // the module's name
+        QString source; // "KVK" or "PVS"
+        int testCases = 0; // how many test cases it has
+        qint64 expectedMs = -1; // its expected wall time in milliseconds; -1 when unknown
     };
 
     // Where one module goes and the time the split counted for it.
     struct Entry
     {
-        QString name;            // the module's name
-        QString source;          // "KVK" or "PVS"
-        int shard = 0;           // the 0-based index of the shard it goes to
-        qint64 expectedMs = 0;   // the milliseconds the split counted for it
-        bool estimated = false;  // from its test cases, not from recorded runs
+        QString name; // the module's name
+        QString source; // "KVK" or "PVS"
+        int shard = 0; // the 0-based index of the shard it goes to
+        qint64 expectedMs = 0; // the milliseconds the split counted for it
+        bool estimated = false; // from its test cases, not from recorded runs
     };
 
     // Time per test case of a module without history when no module of the

@@ -38,17 +38,14 @@ struct Claim
 {
     QString indexName;
     QString countName;
-    std::optional<int> index;  // 0-based
+    std::optional<int> index; // 0-based
     std::optional<int> count;
 };
 
 class Reader
 {
 public:
-    Reader(const QMap<QString, QString> &environment, QString *error)
-        : m_environment(environment), m_error(error)
-    {
-    }
+    Reader(const QMap<QString, QString> &environment, QString *error) : m_environment(environment), m_error(error) { }
 
     bool Has(const QString &name) const { return !m_environment.value(name).isEmpty(); }
 
@@ -77,8 +74,8 @@ private:
 } // namespace
 
 bool ShardSetting::Resolve(const QString &indexOption, const QString &countOption,
-                           const QMap<QString, QString> &environment, bool indexRequired,
-                           ShardSetting *setting, QString *error)
+                           const QMap<QString, QString> &environment, bool indexRequired, ShardSetting *setting,
+                           QString *error)
 {
     QString ignored;
     if (!error)
@@ -101,8 +98,9 @@ bool ShardSetting::Resolve(const QString &indexOption, const QString &countOptio
         if (!reader.Read(kBazelIndex, bazel.index) || !reader.Read(kBazelTotal, bazel.count))
             return false;
         if (bazel.index.has_value() != bazel.count.has_value())
-            return reader.Fail(QStringLiteral("%1 is set without %2")
-                                   .arg(bazel.index ? kBazelIndex : kBazelTotal, bazel.index ? kBazelTotal : kBazelIndex));
+            return reader.Fail(
+                QStringLiteral("%1 is set without %2")
+                    .arg(bazel.index ? kBazelIndex : kBazelTotal, bazel.index ? kBazelTotal : kBazelIndex));
         if (bazel.index)
             claims.append(bazel);
 
@@ -112,9 +110,9 @@ bool ShardSetting::Resolve(const QString &indexOption, const QString &countOptio
         // GitLab sets CI_NODE_TOTAL=1 on every job that is not parallel.
         if (gitlab.index || gitlab.count.value_or(1) != 1) {
             if (!gitlab.index || !gitlab.count)
-                return reader.Fail(QStringLiteral("%1 is set without %2")
-                                       .arg(gitlab.index ? kGitLabIndex : kGitLabTotal,
-                                            gitlab.index ? kGitLabTotal : kGitLabIndex));
+                return reader.Fail(
+                    QStringLiteral("%1 is set without %2")
+                        .arg(gitlab.index ? kGitLabIndex : kGitLabTotal, gitlab.index ? kGitLabTotal : kGitLabIndex));
             if (*gitlab.index < 1 || *gitlab.index > *gitlab.count)
                 return reader.Fail(QStringLiteral("%1=%2 is outside 1..%3 (%4)")
                                        .arg(kGitLabIndex)
@@ -130,8 +128,8 @@ bool ShardSetting::Resolve(const QString &indexOption, const QString &countOptio
             return false;
         if (kubernetes.index) {
             if (!optionCount)
-                return reader.Fail(QStringLiteral("%1 is set: give the number of shards with %2")
-                                       .arg(kKubernetesIndex, kCountOption));
+                return reader.Fail(
+                    QStringLiteral("%1 is set: give the number of shards with %2").arg(kKubernetesIndex, kCountOption));
             claims.append(kubernetes);
         }
     }

@@ -17,11 +17,11 @@
 // set must name the same shard.
 struct HARNESS_EXPORT ShardSetting
 {
-    bool sharded = false;  // a shard index or count was given at all
-    int index = -1;        // 0-based; -1 when only a count was given
-    int count = 1;         // how many shards; 1 when none was given
-    QString from;          // what gave the index ("--shard-index", "CI_NODE_INDEX", ...)
-    QString statusFile;    // TEST_SHARD_STATUS_FILE, when set
+    bool sharded = false; // a shard index or count was given at all
+    int index = -1; // 0-based; -1 when only a count was given
+    int count = 1; // how many shards; 1 when none was given
+    QString from; // what gave the index ("--shard-index", "CI_NODE_INDEX", ...)
+    QString statusFile; // TEST_SHARD_STATUS_FILE, when set
 
     // indexOption and countOption are the option texts (empty when not
     // given); environment maps variable names to values (an empty value
@@ -31,8 +31,8 @@ struct HARNESS_EXPORT ShardSetting
     // or above the largest plan, an index comes without a count, or two
     // engines disagree.
     static bool Resolve(const QString &indexOption, const QString &countOption,
-                        const QMap<QString, QString> &environment, bool indexRequired,
-                        ShardSetting *setting, QString *error);
+                        const QMap<QString, QString> &environment, bool indexRequired, ShardSetting *setting,
+                        QString *error);
 
     // The variables Resolve reads, taken from the process environment.
     static QMap<QString, QString> ProcessEnvironment();

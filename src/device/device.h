@@ -14,8 +14,7 @@ struct HARNESS_EXPORT ConnectTarget
 {
     ConnectTarget() = default;
     // A handset of that name and descriptive text.
-    ConnectTarget(const QString &name, const QString &description)
-        : name(name), description(description) {}
+    ConnectTarget(const QString &name, const QString &description) : name(name), description(description) { }
 
     // The handset's name.
     QString name;
@@ -67,7 +66,7 @@ public:
     };
 
     // A connection to the handset target; opened by ConnectFactory.
-    explicit IKestoDevice(const ConnectTarget &target) : m_target(target) {}
+    explicit IKestoDevice(const ConnectTarget &target) : m_target(target) { }
     virtual ~IKestoDevice() = default;
     IKestoDevice(const IKestoDevice &) = delete;
     IKestoDevice &operator=(const IKestoDevice &) = delete;
@@ -95,8 +94,7 @@ public:
     // True while the applet runs.
     virtual bool IsAppletRunning(unsigned int classId) = 0;
     // Lists the files of a handset directory into info.
-    virtual unsigned int ListDirectory(const QString &directory,
-                                       QSharedPointer<_DirectoryInfo> &info) = 0;
+    virtual unsigned int ListDirectory(const QString &directory, QSharedPointer<_DirectoryInfo> &info) = 0;
     // Removes a handset directory and what it holds.
     virtual unsigned int RemoveDirectory(const QString &directory) = 0;
     // Removes a handset file.

@@ -15,8 +15,7 @@ unsigned int CodeOfLoneLead(unsigned char lead)
 
 } // namespace
 
-int DecodeEveryByte(QEncoding &encoding, const QByteArray &in, QString &out,
-                    bool (*isLead)(unsigned char))
+int DecodeEveryByte(QEncoding &encoding, const QByteArray &in, QString &out, bool (*isLead)(unsigned char))
 {
     const auto *bytes = reinterpret_cast<const unsigned char *>(in.constData());
     const qsizetype size = in.size();

@@ -12,8 +12,7 @@ namespace doublebyte {
 // with the next byte (a lead byte at the very end forms an unknown code),
 // any other byte is a one-byte code. Codes that do not decode give "?".
 // Appends the units before the first NUL unit to `out`; returns its length.
-int DecodeEveryByte(QEncoding &encoding, const QByteArray &in, QString &out,
-                    bool (*isLead)(unsigned char));
+int DecodeEveryByte(QEncoding &encoding, const QByteArray &in, QString &out, bool (*isLead)(unsigned char));
 
 // Decodes the bytes before the first NUL byte: a byte with the high bit set
 // forms a code with the next byte, any other byte is a one-byte code. Codes

@@ -8,8 +8,7 @@ constexpr std::size_t kKeys = 0x10000;
 
 } // namespace
 
-MappingTable::MappingTable(const quint16 *pairs, std::size_t count)
-    : m_pairs(pairs), m_count(count)
+MappingTable::MappingTable(const quint16 *pairs, std::size_t count) : m_pairs(pairs), m_count(count)
 {
 }
 

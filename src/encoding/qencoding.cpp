@@ -13,7 +13,8 @@
 
 namespace {
 
-struct FormatRow {
+struct FormatRow
+{
     KestoEncodingFormat format;
     const char *name;
     const char *mark;
@@ -22,14 +23,10 @@ struct FormatRow {
 
 // Unicode and "None" share the mark FF FE; KSC5601 and CP949 share FE FE.
 constexpr FormatRow kFormats[] = {
-    {ENCODING_UNICODE, "Unicode", "\xFF\xFE", 2},
-    {ENCODING_ISOLATIN1, "ISOLATIN1", "\x03", 1},
-    {ENCODING_KSC5601, "KSC5601", "\xFE\xFE", 2},
-    {ENCODING_SJIS, "S-JIS", "\xFD\xFE", 2},
-    {ENCODING_GB2312, "GB2312", "\xFC\xFE", 2},
-    {ENCODING_CP949, "CP949", "\xFE\xFE", 2},
-    {ENCODING_UTF8, "UTF-8", "\x02", 1},
-    {ENCODING_NONE, "None", "\xFF\xFE", 0},
+    {ENCODING_UNICODE, "Unicode", "\xFF\xFE", 2}, {ENCODING_ISOLATIN1, "ISOLATIN1", "\x03", 1},
+    {ENCODING_KSC5601, "KSC5601", "\xFE\xFE", 2}, {ENCODING_SJIS, "S-JIS", "\xFD\xFE", 2},
+    {ENCODING_GB2312, "GB2312", "\xFC\xFE", 2},   {ENCODING_CP949, "CP949", "\xFE\xFE", 2},
+    {ENCODING_UTF8, "UTF-8", "\x02", 1},          {ENCODING_NONE, "None", "\xFF\xFE", 0},
 };
 
 const FormatRow *FindRow(KestoEncodingFormat format)
@@ -165,11 +162,10 @@ bool CreateEncoder(const QByteArray &data, QEncoding **encoder, KestoEncodingFor
 
     const auto first = static_cast<unsigned char>(data.at(0));
     KestoEncodingFormat detected = ENCODING_NONE;
-    if (data.size() >= 2 && static_cast<unsigned char>(data.at(1)) == 0xFE
-        && first >= 0xFC) {
+    if (data.size() >= 2 && static_cast<unsigned char>(data.at(1)) == 0xFE && first >= 0xFC) {
         // FE FE is shared by KSC5601 and CP949; CP949 reads both.
-        static constexpr KestoEncodingFormat kByLead[] = {ENCODING_GB2312, ENCODING_SJIS,
-                                                          ENCODING_CP949, ENCODING_UNICODE};
+        static constexpr KestoEncodingFormat kByLead[]
+            = {ENCODING_GB2312, ENCODING_SJIS, ENCODING_CP949, ENCODING_UNICODE};
         detected = kByLead[first - 0xFC];
     } else if (first == 0x03) {
         detected = ENCODING_ISOLATIN1;
@@ -220,7 +216,8 @@ QList<LostCharacter> LostCharacters(const QString &text, KestoEncodingFormat for
     const QByteArray mark = format == ENCODING_ISOLATIN1 ? QEncoding::GetBOM(format) : QByteArray();
     qsizetype position = 0;
     for (qsizetype i = 0; i < text.size(); ++position) {
-        const qsizetype length = text.at(i).isHighSurrogate() && i + 1 < text.size() && text.at(i + 1).isLowSurrogate() ? 2 : 1;
+        const qsizetype length
+            = text.at(i).isHighSurrogate() && i + 1 < text.size() && text.at(i + 1).isLowSurrogate() ? 2 : 1;
         const QString character = text.mid(i, length);
         QByteArray bytes;
         encoder->FromUnicode(character, bytes);

@@ -9,7 +9,7 @@
 // The string encodings of resource files. The numbers are stored in resource
 // files and exchanged with callers, so they never change.
 enum KestoEncodingFormat {
-    ENCODING_UNICODE = 0,   // UTF-16 little-endian, handled by the caller
+    ENCODING_UNICODE = 0, // UTF-16 little-endian, handled by the caller
     ENCODING_ISOLATIN1 = 1,
     ENCODING_KSC5601 = 2,
     ENCODING_SJIS = 3,
@@ -78,8 +78,7 @@ public:
 // the detected format, or null for Unicode (format 0, result true) and for an
 // unknown mark (format 999, result false). An empty block returns false and
 // leaves `format` unchanged.
-HARNESS_EXPORT bool CreateEncoder(const QByteArray &data, QEncoding **encoder,
-                                  KestoEncodingFormat &format);
+HARNESS_EXPORT bool CreateEncoder(const QByteArray &data, QEncoding **encoder, KestoEncodingFormat &format);
 
 // Creates the converter for `format` (1 ... 6), destroys the one `*encoder`
 // held before and stores the new one (null for 0, 999 and unknown values).
@@ -92,8 +91,8 @@ HARNESS_EXPORT void FreeEncoder(QEncoding *encoder);
 // One character of a text that an encoding cannot hold.
 struct HARNESS_EXPORT LostCharacter
 {
-    qsizetype position = 0;  // 1-based, counted in characters (code points)
-    char32_t codePoint = 0;  // the character's Unicode code point
+    qsizetype position = 0; // 1-based, counted in characters (code points)
+    char32_t codePoint = 0; // the character's Unicode code point
 
     // "character 7 U+30C6 'テ'"
     QString Describe() const;

@@ -12,8 +12,7 @@ int QEncodingCP949::ToUnicode(const QByteArray &in, QString &out)
 bool QEncodingCP949::CharToUnicode(unsigned int code, quint16 *unit)
 {
     quint16 decoded = ' ';
-    const bool mapped = QEncodingKSC5601::KsToUnicode(code, &decoded)
-                        || encodingtables::kCp949.ToUnit(code, &decoded);
+    const bool mapped = QEncodingKSC5601::KsToUnicode(code, &decoded) || encodingtables::kCp949.ToUnit(code, &decoded);
     if (unit)
         *unit = mapped ? decoded : quint16(' ');
     return mapped;

@@ -12,7 +12,9 @@ bool IsLeadByte(unsigned char byte)
 
 } // namespace
 
-QEncodingGB2312::QEncodingGB2312() : m_table(&encodingtables::kGB2312) {}
+QEncodingGB2312::QEncodingGB2312() : m_table(&encodingtables::kGB2312)
+{
+}
 
 int QEncodingGB2312::ToUnicode(const QByteArray &in, QString &out)
 {

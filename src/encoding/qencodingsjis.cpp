@@ -21,7 +21,9 @@ bool IsLeadByte(unsigned char byte)
 
 } // namespace
 
-QEncodingSJIS::QEncodingSJIS() : m_table(&encodingtables::kShiftJis) {}
+QEncodingSJIS::QEncodingSJIS() : m_table(&encodingtables::kShiftJis)
+{
+}
 
 int QEncodingSJIS::ToUnicode(const QByteArray &in, QString &out)
 {
@@ -32,8 +34,8 @@ bool QEncodingSJIS::CharToUnicode(unsigned int code, quint16 *unit)
 {
     const unsigned int lead = code >> 8;
     const unsigned int trail = code & 0xFF;
-    if (code <= 0xFFFF && lead >= kUserFirstLead && trail >= kFirstTrail
-        && trail <= kLastTrail && trail != kSkippedTrail) {
+    if (code <= 0xFFFF && lead >= kUserFirstLead && trail >= kFirstTrail && trail <= kLastTrail
+        && trail != kSkippedTrail) {
         const unsigned int column = trail - (trail > kSkippedTrail ? kFirstTrail + 1 : kFirstTrail);
         if (unit)
             *unit = quint16(kUserFirstUnit + (lead - kUserFirstLead) * kUserTrailsPerLead + column);
@@ -49,8 +51,8 @@ bool QEncodingSJIS::UnicodeToChar(unsigned int unit, char *bytes)
     if (unit >= kUserFirstUnit && unit <= kUserLastUnit) {
         const unsigned int row = (unit - kUserFirstUnit) / kUserTrailsPerLead;
         const unsigned int column = (unit - kUserFirstUnit) % kUserTrailsPerLead;
-        const unsigned int trail = column < kSkippedTrail - kFirstTrail ? kFirstTrail + column
-                                                                       : kFirstTrail + 1 + column;
+        const unsigned int trail
+            = column < kSkippedTrail - kFirstTrail ? kFirstTrail + column : kFirstTrail + 1 + column;
         doublebyte::WriteCode(quint16((kUserFirstLead + row) << 8 | trail), bytes);
         return true;
     }

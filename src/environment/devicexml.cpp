@@ -30,9 +30,9 @@ constexpr qsizetype kDeclarationWindow = 1024;
 struct Expansion
 {
     QDomDocument document;
-    QString sourcePath;        // the resolved device pack, for relative includes
+    QString sourcePath; // the resolved device pack, for relative includes
     QString placeholderTarget; // processing-instruction target standing for a reference
-    bool unresolved = false;   // some reference could not be replaced by its file
+    bool unresolved = false; // some reference could not be replaced by its file
 };
 
 bool IsRegularFile(const QString &path)
@@ -69,10 +69,9 @@ std::optional<QString> DecodeXml(const QByteArray &bytes)
         const QByteArray head = bytes.left(kDeclarationWindow);
         if (head.startsWith("<?xml")) {
             const qsizetype end = head.indexOf("?>");
-            static const QRegularExpression encoding(
-                QStringLiteral("encoding\\s*=\\s*[\"']([A-Za-z0-9._:-]+)[\"']"));
-            const QRegularExpressionMatch match =
-                encoding.match(QString::fromLatin1(head.left(end < 0 ? head.size() : end)));
+            static const QRegularExpression encoding(QStringLiteral("encoding\\s*=\\s*[\"']([A-Za-z0-9._:-]+)[\"']"));
+            const QRegularExpressionMatch match
+                = encoding.match(QString::fromLatin1(head.left(end < 0 ? head.size() : end)));
             if (match.hasMatch())
                 name = match.captured(1).toLatin1();
         }
@@ -162,8 +161,7 @@ bool EndsReferenceName(QChar c)
 // each reference "&name;" to one of the given entities in character data by
 // "<?target name?>". Markup, comments, sections and instructions are copied
 // untouched (references cannot stand in attribute values anyway).
-QString MarkReferences(const QString &text, qsizetype from, const QSet<QString> &entities,
-                       const QString &target)
+QString MarkReferences(const QString &text, qsizetype from, const QSet<QString> &entities, const QString &target)
 {
     const qsizetype n = text.size();
     QString out;
@@ -224,8 +222,7 @@ QSet<QString> ExternalEntities(const QDomDocument &document)
     const QDomNamedNodeMap entities = document.doctype().entities();
     for (int i = 0; i < entities.count(); ++i) {
         const QDomEntity entity = entities.item(i).toEntity();
-        if ((!entity.systemId().isEmpty() || !entity.publicId().isEmpty())
-            && entity.notationName().isEmpty())
+        if ((!entity.systemId().isEmpty() || !entity.publicId().isEmpty()) && entity.notationName().isEmpty())
             names.insert(entity.nodeName());
     }
     return names;
@@ -252,8 +249,7 @@ bool ParseDevicePack(const QByteArray &bytes, Expansion &expansion)
     if (body < 0)
         return true;
 
-    expansion.placeholderTarget =
-        QStringLiteral("harness-entity-") + QUuid::createUuid().toString(QUuid::Id128);
+    expansion.placeholderTarget = QStringLiteral("harness-entity-") + QUuid::createUuid().toString(QUuid::Id128);
     QDomDocument marked;
     if (marked.setContent(MarkReferences(*text, body, entities, expansion.placeholderTarget), false))
         expansion.document = marked;

@@ -63,9 +63,12 @@ TestKit::~TestKit() = default;
 QString TestKit::TypeToName(KitType type)
 {
     switch (type) {
-    case USER_KIT: return QStringLiteral("User Kit");
-    case TEST_KIT: return QStringLiteral("Test Kit");
-    case PVS_KIT: return QStringLiteral("Pvs Kit");
+    case USER_KIT:
+        return QStringLiteral("User Kit");
+    case TEST_KIT:
+        return QStringLiteral("Test Kit");
+    case PVS_KIT:
+        return QStringLiteral("Pvs Kit");
     }
     return QStringLiteral("unknown");
 }
@@ -96,8 +99,7 @@ QString GetTestSetsRoot()
     if (!root.isEmpty())
         return root;
     const QString separator = QDir::separator();
-    return QDir::cleanPath(GetPlatformsRoot() + separator + QStringLiteral("..") + separator
-                           + QStringLiteral("Tests"));
+    return QDir::cleanPath(GetPlatformsRoot() + separator + QStringLiteral("..") + separator + QStringLiteral("Tests"));
 }
 
 bool GetDefaultPlatform(QString &out)
@@ -128,8 +130,7 @@ unsigned int GetPlatforms(QList<Platform> &out)
         platform.path = root + QDir::separator() + entry;
         platform.isPro = entry.contains(QLatin1String("pro"), Qt::CaseInsensitive);
         platform.name = StripProWord(entry);
-        platform.isDefault =
-            !defaultUpper.isEmpty() && QDir::cleanPath(platform.path).toUpper() == defaultUpper;
+        platform.isDefault = !defaultUpper.isEmpty() && QDir::cleanPath(platform.path).toUpper() == defaultUpper;
         out.append(platform);
     }
     return static_cast<unsigned int>(out.size());

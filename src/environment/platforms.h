@@ -20,9 +20,9 @@ public:
     Platform(const Platform &other);
     Platform &operator=(const Platform &other);
 
-    QString name;           // directory name without its " pro" edition word
-    QString path;           // platforms root + separator + directory name as on disk
-    bool isPro = false;     // the directory name contains "pro" (any case)
+    QString name; // directory name without its " pro" edition word
+    QString path; // platforms root + separator + directory name as on disk
+    bool isPro = false; // the directory name contains "pro" (any case)
     bool isDefault = false; // path names the platform of KESTIX_PLATFORM (case-insensitive)
 };
 
@@ -42,8 +42,8 @@ public:
     // "User Kit", "Test Kit", "Pvs Kit", or "unknown" for any other value.
     static QString TypeToName(KitType type);
 
-    QString name;             // the kit directory's name
-    QString path;             // the cleaned path of the kit directory
+    QString name; // the kit directory's name
+    QString path; // the cleaned path of the kit directory
     // The kit's kind.
     KitType type = USER_KIT;
     // Not used by the library; always false.
@@ -81,14 +81,13 @@ HARNESS_EXPORT QString GetDefaultTestKitName();
 // "my_mod", "RVCT22arm9" and "Release": ".kestix" is removed (any case), the
 // last two "_"-separated parts become middle and last and the rest, joined by
 // "_", first. False, with the outputs untouched, for fewer than three parts.
-HARNESS_EXPORT bool BreakPackageName(const QString &package, QString &first, QString &middle,
-                                     QString &last);
+HARNESS_EXPORT bool BreakPackageName(const QString &package, QString &first, QString &middle, QString &last);
 
 // The environment variables, as set.
-HARNESS_EXPORT QString GetToolsetSetting();  // KESTIX_TOOLSET
-HARNESS_EXPORT QString GetPlatformsRoot();   // KESTIX_PLATFORMS_ALL
+HARNESS_EXPORT QString GetToolsetSetting(); // KESTIX_TOOLSET
+HARNESS_EXPORT QString GetPlatformsRoot(); // KESTIX_PLATFORMS_ALL
 HARNESS_EXPORT QString GetPlatformSetting(); // KESTIX_PLATFORM
-HARNESS_EXPORT QString GetTestSetSetting();  // KESTIX_TESTSET
+HARNESS_EXPORT QString GetTestSetSetting(); // KESTIX_TESTSET
 // KESTIX_TESTSETS_ALL, or when empty the "Tests" directory beside the
 // platforms root.
 HARNESS_EXPORT QString GetTestSetsRoot();

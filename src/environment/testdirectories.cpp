@@ -79,8 +79,8 @@ QString FindOnPath(const QString &program)
 // looked up on PATH, a path is taken when it is an executable file.
 QString InterpreterOfShebang(const QByteArray &line)
 {
-    const QStringList words = QString::fromLocal8Bit(line.mid(2)).simplified().split(
-        QLatin1Char(' '), Qt::SkipEmptyParts);
+    const QStringList words
+        = QString::fromLocal8Bit(line.mid(2)).simplified().split(QLatin1Char(' '), Qt::SkipEmptyParts);
     if (words.isEmpty())
         return QString();
     QString program = words.first();
@@ -103,8 +103,7 @@ QString InterpreterOfShebang(const QByteArray &line)
     if (!program.contains(QLatin1Char('/')))
         return FindOnPath(program);
     const QFileInfo info(program);
-    return info.isFile() && info.isExecutable() ? QDir::cleanPath(info.absoluteFilePath())
-                                                 : QString();
+    return info.isFile() && info.isExecutable() ? QDir::cleanPath(info.absoluteFilePath()) : QString();
 }
 
 } // namespace
@@ -157,8 +156,8 @@ QString TestDirectories::GetOatPerlScripts()
         return scripts;
 
     const QDir source(QDir::cleanPath(GetTestSetSetting() + QString::fromLatin1(kOatToolsFolder)));
-    const QStringList files = source.entryList(
-        QDir::Files | QDir::NoSymLinks | QDir::Readable | QDir::NoDotAndDotDot, QDir::Unsorted);
+    const QStringList files
+        = source.entryList(QDir::Files | QDir::NoSymLinks | QDir::Readable | QDir::NoDotAndDotDot, QDir::Unsorted);
     for (const QString &file : files)
         QFile::copy(source.filePath(file), Join(scripts, file));
     return scripts;
@@ -186,8 +185,8 @@ QString ResolveXmlPath(const QString &path, const QString &referenceFile)
         return path;
 
     const QString separator = QDir::separator();
-    for (const QString &candidate : {path, QDir::currentPath() + separator + path,
-                                     QDir::homePath() + separator + path}) {
+    for (const QString &candidate :
+         {path, QDir::currentPath() + separator + path, QDir::homePath() + separator + path}) {
         const QString found = CanonicalIfFile(candidate);
         if (!found.isEmpty())
             return found;
@@ -198,8 +197,7 @@ QString ResolveXmlPath(const QString &path, const QString &referenceFile)
     // Beside the reference file: the relative path as written, then its bare
     // file name.
     const QString folder = QFileInfo(referenceFile).absolutePath();
-    for (const QString &candidate : {folder + separator + path,
-                                     folder + separator + QFileInfo(path).fileName()}) {
+    for (const QString &candidate : {folder + separator + path, folder + separator + QFileInfo(path).fileName()}) {
         const QString found = CanonicalIfFile(candidate);
         if (!found.isEmpty())
             return found;

@@ -33,8 +33,8 @@ QString HandsetsFolder()
 // name must be one plain folder name.
 QString HandsetFolder(const QString &name)
 {
-    if (name.isEmpty() || name == QLatin1String(".") || name == QLatin1String("..")
-        || name.contains(QLatin1Char('/')) || name.contains(QChar(0)))
+    if (name.isEmpty() || name == QLatin1String(".") || name == QLatin1String("..") || name.contains(QLatin1Char('/'))
+        || name.contains(QChar(0)))
         return QString();
     const QString folder = HandsetsFolder() + QLatin1Char('/') + name;
     if (!QFileInfo(EmulatedHandset::SettingsPath(folder)).isFile())
@@ -63,8 +63,8 @@ unsigned int ConnectFactory::ListTargets(QList<ConnectTarget> &targets)
 {
     targets.clear();
     const QDir handsets(HandsetsFolder());
-    const QStringList names = handsets.entryList(QDir::Dirs | QDir::NoDotAndDotDot | QDir::Hidden,
-                                                 QDir::Name | QDir::IgnoreCase);
+    const QStringList names
+        = handsets.entryList(QDir::Dirs | QDir::NoDotAndDotDot | QDir::Hidden, QDir::Name | QDir::IgnoreCase);
     for (const QString &name : names) {
         const QString folder = HandsetFolder(name);
         if (folder.isEmpty())

@@ -93,8 +93,7 @@ bool EmulatedHandset::IsReachable()
         connectionLost = true;
         return false;
     }
-    if (!QFileInfo(m_folder).isDir()
-        || QFileInfo::exists(m_folder + QStringLiteral("/offline")))
+    if (!QFileInfo(m_folder).isDir() || QFileInfo::exists(m_folder + QStringLiteral("/offline")))
         connectionLost = true;
     return !connectionLost;
 }
@@ -168,8 +167,7 @@ QList<EmulatedHandset::Module> EmulatedHandset::InstalledModules() const
         // A module information file directly in usermods names no module
         // folder of its own; taking usermods as its folder would let
         // removing that module remove every module.
-        if (path.endsWith(QLatin1String(".mif"), Qt::CaseInsensitive)
-            && QFileInfo(path).absolutePath() != root)
+        if (path.endsWith(QLatin1String(".mif"), Qt::CaseInsensitive) && QFileInfo(path).absolutePath() != root)
             mifs.append(path);
     }
     std::sort(mifs.begin(), mifs.end());
@@ -287,8 +285,9 @@ unsigned int EmulatedHandset::StartProgram(const QString &program, const QString
     const QList<Module> modules = InstalledModules();
     for (const Module &module : modules) {
         if (module.programs.contains(program)) {
-            return RunBehaviour(module, QStringList{QStringLiteral("program"), program}
-                                            + arguments.split(QLatin1Char(' '), Qt::SkipEmptyParts));
+            return RunBehaviour(module,
+                                QStringList{QStringLiteral("program"), program}
+                                    + arguments.split(QLatin1Char(' '), Qt::SkipEmptyParts));
         }
     }
     return Fail(HANDSET_ERROR_NOT_FOUND);
@@ -306,9 +305,10 @@ unsigned int EmulatedHandset::StartApplet(unsigned int classId, const QString &a
     Module module;
     if (!FindModuleByClass(classId, module))
         return Fail(HANDSET_ERROR_NOT_FOUND);
-    return RunBehaviour(module, QStringList{QStringLiteral("applet"),
-                                            QStringLiteral("0x%1").arg(classId, 8, 16, QLatin1Char('0'))}
-                                    + arguments.split(QLatin1Char(' '), Qt::SkipEmptyParts));
+    return RunBehaviour(
+        module,
+        QStringList{QStringLiteral("applet"), QStringLiteral("0x%1").arg(classId, 8, 16, QLatin1Char('0'))}
+            + arguments.split(QLatin1Char(' '), Qt::SkipEmptyParts));
 }
 
 bool EmulatedHandset::IsAppletRunning(unsigned int)
@@ -316,8 +316,7 @@ bool EmulatedHandset::IsAppletRunning(unsigned int)
     return CheckNothingRuns();
 }
 
-unsigned int EmulatedHandset::ListDirectory(const QString &directory,
-                                            QSharedPointer<_DirectoryInfo> &info)
+unsigned int EmulatedHandset::ListDirectory(const QString &directory, QSharedPointer<_DirectoryInfo> &info)
 {
     info.reset(new _DirectoryInfo);
     info->directory = directory;
@@ -326,8 +325,8 @@ unsigned int EmulatedHandset::ListDirectory(const QString &directory,
         return lastError;
     if (!QFileInfo(host).isDir())
         return Fail(HANDSET_ERROR_NOT_FOUND);
-    const QFileInfoList entries = QDir(host).entryInfoList(QDir::Files | QDir::Hidden | QDir::NoSymLinks,
-                                                           QDir::Name | QDir::IgnoreCase);
+    const QFileInfoList entries
+        = QDir(host).entryInfoList(QDir::Files | QDir::Hidden | QDir::NoSymLinks, QDir::Name | QDir::IgnoreCase);
     for (const QFileInfo &entry : entries) {
         _FileInfo file;
         file.fileName = HandsetPath::FromHost(m_folder, entry.filePath());
@@ -408,7 +407,8 @@ unsigned int EmulatedHandset::InstallPackage(const QString &hostPath)
                 return Fail(HANDSET_ERROR_BAD_PACKAGE);
             continue; // "./" names the package root
         }
-        const QString host = HandsetPath::ToHost(m_folder, QLatin1String(kUserModules) + segments.join(QLatin1Char('/')));
+        const QString host
+            = HandsetPath::ToHost(m_folder, QLatin1String(kUserModules) + segments.join(QLatin1Char('/')));
         if (host.isEmpty())
             return Fail(HANDSET_ERROR_BAD_PACKAGE);
         haveFile = haveFile || isFile;

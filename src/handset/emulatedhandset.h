@@ -100,8 +100,7 @@ public:
     // Lists the plain files (no links, no folders) of a directory, sorted by
     // name; each entry's fileName is its full handset path. On failure info
     // holds an empty listing.
-    unsigned int ListDirectory(const QString &directory,
-                               QSharedPointer<_DirectoryInfo> &info) override;
+    unsigned int ListDirectory(const QString &directory, QSharedPointer<_DirectoryInfo> &info) override;
     // Removes a directory and everything below it.
     unsigned int RemoveDirectory(const QString &directory) override;
     // Removes a file of the handset.

@@ -60,8 +60,7 @@ bool CtfAppletTestModule::Run(IKestoDevice *device, const QMap<QString, QString>
     if (!InstallTest(device))
         return false;
     if (device->StartApplet(classId, QString()) != 0) {
-        LogMessage(QStringLiteral("CtfAppletTestModule::Run error: ") + DeviceErrorText(device->lastError),
-                   false);
+        LogMessage(QStringLiteral("CtfAppletTestModule::Run error: ") + DeviceErrorText(device->lastError), false);
         return false;
     }
     return WaitWhileRunning([&] { return device->IsAppletRunning(classId); }, true);

@@ -208,8 +208,7 @@ bool CtfTestModule::RemoveTest(IKestoDevice *device)
     if (device && GetLogFilePaths(device, paths)) {
         for (const QString &path : std::as_const(paths)) {
             if (device->DeleteFile(path) != 0)
-                LogMessage(QStringLiteral("   CtfTestModule::RemoveTest error deleting log file %1\n").arg(path),
-                           true);
+                LogMessage(QStringLiteral("   CtfTestModule::RemoveTest error deleting log file %1\n").arg(path), true);
         }
         Clock::Sleep(kRemovePauseMs);
     }

@@ -64,5 +64,4 @@ private:
 // Parses a copied CTF-format log into results. The applet kind takes only
 // the first word of a test name and drops a trailing "_k" from a suite name
 // when the log names no manifest. moduleName is set from the log when empty.
-HARNESS_EXPORT bool ParseCtfLog(const QString &hostPath, TestResults &results, QString &moduleName,
-                                bool appletRules);
+HARNESS_EXPORT bool ParseCtfLog(const QString &hostPath, TestResults &results, QString &moduleName, bool appletRules);

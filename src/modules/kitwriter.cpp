@@ -37,8 +37,7 @@ KitMembers KitPackage::Members() const
     return members;
 }
 
-KitWriter::KitWriter(const QString &root)
-    : m_root(QDir::cleanPath(QDir::current().absoluteFilePath(root)))
+KitWriter::KitWriter(const QString &root) : m_root(QDir::cleanPath(QDir::current().absoluteFilePath(root)))
 {
     if (!QDir().mkpath(m_root))
         Fail(QStringLiteral("cannot create %1").arg(m_root));
@@ -104,8 +103,7 @@ QString KitWriter::AddFile(const QString &relative, const QByteArray &bytes, boo
     if (!QDir().mkpath(QFileInfo(path).absolutePath()))
         return Fail(QStringLiteral("cannot create the folder of %1").arg(path));
     QFile file(path);
-    if (!file.open(QIODevice::WriteOnly | QIODevice::Truncate)
-        || file.write(bytes) != bytes.size() || !file.flush())
+    if (!file.open(QIODevice::WriteOnly | QIODevice::Truncate) || file.write(bytes) != bytes.size() || !file.flush())
         return Fail(QStringLiteral("cannot write %1").arg(path));
     file.close();
     if (executable
@@ -123,8 +121,7 @@ QString KitWriter::AddDescription(const QString &folder, const KitModule &module
     return AddFile(folder + QLatin1Char('/') + fileName, Description(module));
 }
 
-QString KitWriter::AddPackage(const QString &folder, const QString &baseName,
-                              const KitMembers &members)
+QString KitWriter::AddPackage(const QString &folder, const QString &baseName, const KitMembers &members)
 {
     if (AddDirectory(folder).isEmpty())
         return QString();
@@ -151,8 +148,7 @@ QString KitWriter::AddSourceModule(const QString &folder, const KitModule &modul
 {
     const QString description = AddDescription(folder, module);
     if (description.isEmpty()
-        || AddFile(folder + QStringLiteral("/src/") + module.name + QStringLiteral(".c"),
-                   module.source).isEmpty()
+        || AddFile(folder + QStringLiteral("/src/") + module.name + QStringLiteral(".c"), module.source).isEmpty()
         || AddModulePackages(folder + QStringLiteral("/package"), module).isEmpty())
         return QString();
     return description;
@@ -167,9 +163,8 @@ QString KitWriter::AddPrebuiltModule(const QString &folder, const KitModule &mod
     return description;
 }
 
-QString KitWriter::AddFrameworkPackage(const QString &testframeworks, const QString &name,
-                                       const QString &toolChain, const QString &build,
-                                       const KitPackage *layout)
+QString KitWriter::AddFrameworkPackage(const QString &testframeworks, const QString &name, const QString &toolChain,
+                                       const QString &build, const KitPackage *layout)
 {
     KitPackage records;
     if (layout) {
@@ -181,6 +176,5 @@ QString KitWriter::AddFrameworkPackage(const QString &testframeworks, const QStr
             records.classIds = {kind->frameworkClassId};
     }
     return AddPackage(testframeworks + QStringLiteral("/run"),
-                      name + QLatin1Char('_') + toolChain + QLatin1Char('_') + build,
-                      records.Members());
+                      name + QLatin1Char('_') + toolChain + QLatin1Char('_') + build, records.Members());
 }

@@ -33,7 +33,7 @@
 // information file.
 struct HARNESS_EXPORT KitProgram
 {
-    QString name;      // the key the program is started by
+    QString name; // the key the program is started by
     QString arguments; // stored as "Arguments" when not empty
     unsigned int type = 0x0102FAF7;
 };
@@ -72,10 +72,10 @@ struct HARNESS_EXPORT KitModule
     // The module kind's type word; it selects the description file name.
     QString kind = QStringLiteral("ctf");
     QString name;
-    QString family;            // written only when not empty
-    QString subFamily;         // written only when not empty
-    QStringList testCases;     // "testcase" elements with TYPE "auto"
-    QString minKestoVersion;   // "minkestover", when not empty
+    QString family; // written only when not empty
+    QString subFamily; // written only when not empty
+    QStringList testCases; // "testcase" elements with TYPE "auto"
+    QString minKestoVersion; // "minkestover", when not empty
     QStringList secondaryModules; // one "secondary_modules" element each
     // Packages, one per "<tool-chain>_<build>" pair, named
     // "<name>_<tool-chain>_<build>.kestix".
@@ -112,8 +112,7 @@ public:
     // The first failure, empty when there is none.
     QString ErrorString() const { return m_errors.value(0); }
 
-    QString AddFile(const QString &relative, const QByteArray &bytes = QByteArray(),
-                    bool executable = false);
+    QString AddFile(const QString &relative, const QByteArray &bytes = QByteArray(), bool executable = false);
     QString AddDirectory(const QString &relative);
 
     // Writes the module's description file into folder.
@@ -137,9 +136,8 @@ public:
     // A framework package <testframeworks>/run/<name>_<toolChain>_<build>.kestix
     // holding layout (by default "<name>/<name>.mif" listing the class ID of
     // the framework of that name, when it is a known one).
-    QString AddFrameworkPackage(const QString &testframeworks, const QString &name,
-                                const QString &toolChain, const QString &build,
-                                const KitPackage *layout = nullptr);
+    QString AddFrameworkPackage(const QString &testframeworks, const QString &name, const QString &toolChain,
+                                const QString &build, const KitPackage *layout = nullptr);
 
 private:
     QString Fail(const QString &message);

@@ -11,8 +11,7 @@
 
 namespace {
 
-template <class Kind>
-QSharedPointer<_TestModule> Create()
+template <class Kind> QSharedPointer<_TestModule> Create()
 {
     return QSharedPointer<_TestModule>(new Kind);
 }

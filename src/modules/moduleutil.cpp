@@ -1,9 +1,9 @@
 #include "modules/moduleutil.h"
 
+#include "catalogue/testresults.h"
 #include "common/clock.h"
 #include "device/device.h"
 #include "log/log.h"
-#include "catalogue/testresults.h"
 
 #include <QDateTime>
 #include <QDir>
@@ -127,8 +127,8 @@ bool FetchDeviceFile(IKestoDevice *device, const QString &devicePath, QByteArray
     return true;
 }
 
-bool WaitForLogMarker(IKestoDevice *device, const QString &devicePath, const QByteArray &marker,
-                      Log *logger, WaitProgress progress)
+bool WaitForLogMarker(IKestoDevice *device, const QString &devicePath, const QByteArray &marker, Log *logger,
+                      WaitProgress progress)
 {
     qint64 delay = kFirstLogDelayMs;
     qint64 waited = 0;

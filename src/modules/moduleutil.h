@@ -58,7 +58,7 @@ HARNESS_EXPORT bool FetchDeviceFile(IKestoDevice *device, const QString &deviceP
 // How a log wait shows progress on the console.
 enum class WaitProgress {
     None,
-    Dots,          // a dot whenever the log has grown
+    Dots, // a dot whenever the log has grown
     DotsAndDashes, // a dot when it has grown, a dash when it has not
 };
 
@@ -66,8 +66,8 @@ enum class WaitProgress {
 // a delay from 100 ms growing by 100 ms up to 2000 ms. False once the delays
 // add up to more than kLogWaitLimitMs without the marker, or when this
 // thread's WaitWatch says to stop.
-HARNESS_EXPORT bool WaitForLogMarker(IKestoDevice *device, const QString &devicePath,
-                                     const QByteArray &marker, Log *logger, WaitProgress progress);
+HARNESS_EXPORT bool WaitForLogMarker(IKestoDevice *device, const QString &devicePath, const QByteArray &marker,
+                                     Log *logger, WaitProgress progress);
 
 // Lets a caller watch the waits of its own thread: while a WaitWatch is
 // alive, WaitWhileRunning and WaitForLogMarker call it after every poll, and

@@ -46,7 +46,8 @@ bool _OatFramework::Load(IKestoDevice *device, QMap<QString, QString> &env)
     env.insert(kDevicePackFlag, QStringLiteral("true"));
     env.insert(kTestDataFlag, QStringLiteral("true"));
     PostLoad(device, env);
-    for (const auto &[key, value] : {std::pair{kDevicePackFlag, devicePackFlag}, std::pair{kTestDataFlag, testDataFlag}}) {
+    for (const auto &[key, value] :
+         {std::pair{kDevicePackFlag, devicePackFlag}, std::pair{kTestDataFlag, testDataFlag}}) {
         if (value.isEmpty())
             env.remove(key);
         else
@@ -89,8 +90,9 @@ void _OatFramework::PostProcess(QMap<QString, QString> &env)
 {
     const bool added = !env.contains(kRawLogKey);
     if (added)
-        env.insert(kRawLogKey, QDir::cleanPath(env.value(QStringLiteral("LogPath")) + QStringLiteral("/")
-                                               + QStringLiteral("oatRawLogs")));
+        env.insert(
+            kRawLogKey,
+            QDir::cleanPath(env.value(QStringLiteral("LogPath")) + QStringLiteral("/") + QStringLiteral("oatRawLogs")));
     OatTestModule module;
     module.SetLogger(logger);
     module.PostProcess(env);

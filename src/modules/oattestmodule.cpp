@@ -94,8 +94,8 @@ SysResource OatTestModule::GetProgram()
 
 QString OatTestModule::HandsetDirectoryName() const
 {
-    const QString name = StartsWithNoCase(moduleName, QStringLiteral("oat")) ? moduleName
-                                                                              : QStringLiteral("oat") + moduleName;
+    const QString name
+        = StartsWithNoCase(moduleName, QStringLiteral("oat")) ? moduleName : QStringLiteral("oat") + moduleName;
     return name.toLower();
 }
 
@@ -231,8 +231,8 @@ bool OatTestModule::ParseLog(const QString &hostPath, TestResults &results)
 
 bool OatTestModule::CopyLog(IKestoDevice *device, QMap<QString, QString> &env)
 {
-    const QString rawDirectory =
-        QDir::cleanPath(env.value(QStringLiteral("LogPath")) + QStringLiteral("/") + QStringLiteral("oatRawLogs"));
+    const QString rawDirectory
+        = QDir::cleanPath(env.value(QStringLiteral("LogPath")) + QStringLiteral("/") + QStringLiteral("oatRawLogs"));
     desktopLogFiles.clear();
     if (!QDir().mkpath(rawDirectory))
         LogMessage(QStringLiteral("   Folder %1 cannot be created\n").arg(rawDirectory), true);

@@ -51,8 +51,8 @@ void WriteToManifest(XmlNode &element, QList<SysResource> &programs)
 bool ReadFromPackage(const QString &directory, const QString &moduleName, const QString &prefix,
                      unsigned int programType, QList<SysResource> &programs, QString *mifName)
 {
-    static const char *const kSuffixes[] = {"_Win32_Debug.kestix", "_Win32_Release.kestix",
-                                            "RVCT22arm9_Release.kestix"};
+    static const char *const kSuffixes[]
+        = {"_Win32_Debug.kestix", "_Win32_Release.kestix", "RVCT22arm9_Release.kestix"};
     QString package;
     for (const QString &lead : {QStringLiteral("/"), QStringLiteral("/") + prefix}) {
         for (const char *suffix : kSuffixes) {

@@ -31,8 +31,7 @@ HARNESS_EXPORT void WriteToManifest(XmlNode &element, QList<SysResource> &progra
 // module name. mifName, when given, receives the file name of the module
 // information member. False when no package or member was found, or the
 // package is a damaged archive (nothing is read from it then).
-HARNESS_EXPORT bool ReadFromPackage(const QString &directory, const QString &moduleName,
-                                    const QString &prefix, unsigned int programType,
-                                    QList<SysResource> &programs, QString *mifName);
+HARNESS_EXPORT bool ReadFromPackage(const QString &directory, const QString &moduleName, const QString &prefix,
+                                    unsigned int programType, QList<SysResource> &programs, QString *mifName);
 
 } // namespace Programs

@@ -75,7 +75,8 @@ void UTTestModule::SetupConfigData(IKestoDevice *device)
         copyPath = reserve.fileName();
     }
     // The copy is only the way to the handset: it never stays behind.
-    const struct RemoveCopy {
+    const struct RemoveCopy
+    {
         QString path;
         ~RemoveCopy() { QFile::remove(path); }
     } removeCopy{copyPath};
@@ -84,14 +85,15 @@ void UTTestModule::SetupConfigData(IKestoDevice *device)
     QFile copy(copyPath);
     if (!copy.open(QIODevice::WriteOnly | QIODevice::Append))
         return;
-    const QByteArray section = QByteArrayLiteral("\n[TestFramework]\nSkipIfNoGolden=1\nLogSkippedGoldens=0\nSkipKnown=1\n")
+    const QByteArray section
+        = QByteArrayLiteral("\n[TestFramework]\nSkipIfNoGolden=1\nLogSkippedGoldens=0\nSkipKnown=1\n")
         + "Allow=" + selectedTestCases.join(QLatin1Char(',')).toUtf8() + "\n";
     const bool written = copy.write(section) == section.size();
     copy.close();
     if (!written)
         return;
-    device->CopyFileToDevice(copyPath, QStringLiteral("fs:/mod/ut") + moduleName.toLower()
-                                           + QStringLiteral("/utconfig.dat"));
+    device->CopyFileToDevice(copyPath,
+                             QStringLiteral("fs:/mod/ut") + moduleName.toLower() + QStringLiteral("/utconfig.dat"));
 }
 
 bool UTTestModule::Run(IKestoDevice *device, const QMap<QString, QString> &)
@@ -189,8 +191,8 @@ bool UTTestModule::ParseLog(const QString &hostPath, TestResults &results)
         if (line.startsWith(QLatin1String("----"))) {
             inTable = true;
         } else if (StartsWithNoCase(line, QStringLiteral("SuiteName:"))) {
-            const QStringList words =
-                PrefixValue(line, QStringLiteral("SuiteName:")).split(QLatin1Char(' '), Qt::SkipEmptyParts);
+            const QStringList words
+                = PrefixValue(line, QStringLiteral("SuiteName:")).split(QLatin1Char(' '), Qt::SkipEmptyParts);
             if (!words.isEmpty() && results.manifestName.isEmpty())
                 results.manifestName = words.at(0);
             if (words.size() >= 3) {

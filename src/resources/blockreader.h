@@ -10,7 +10,7 @@
 class BlockReader
 {
 public:
-    explicit BlockReader(const QByteArray &block) : m_block(block) {}
+    explicit BlockReader(const QByteArray &block) : m_block(block) { }
 
     qint64 Remaining() const { return m_block.size() - m_pos; }
     qint64 Position() const { return m_pos; }
@@ -32,8 +32,7 @@ public:
     void Skip(qint64 count) { m_pos += std::clamp<qint64>(count, 0, Remaining()); }
 
 private:
-    template <typename T>
-    T Value()
+    template <typename T> T Value()
     {
         if (Remaining() < qint64(sizeof(T))) {
             m_pos = m_block.size();

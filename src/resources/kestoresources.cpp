@@ -33,7 +33,9 @@ constexpr int kMaxMimeTypeLength = 128;
 
 } // namespace
 
-KestoResources::KestoResources() : m_stream(std::make_unique<ResourceStream>()) {}
+KestoResources::KestoResources() : m_stream(std::make_unique<ResourceStream>())
+{
+}
 
 KestoResources::~KestoResources() = default;
 
@@ -290,10 +292,9 @@ unsigned int KestoResources::GenerateLocalClassID()
     return unsigned(std::floor(value / 32767.0 * 16777216.0));
 }
 
-bool KestoResources::ResourceHeader(quint8 &fileType, quint16 &version, quint16 &oldestCodeVersion,
-                                    quint16 &mapEntries, quint32 &offsetToMap, quint32 &lengthOfMap,
-                                    quint32 &offsetToEntries, quint32 &resourceCount,
-                                    quint32 &offsetToResources, quint32 &lengthOfResources)
+bool KestoResources::ResourceHeader(quint8 &fileType, quint16 &version, quint16 &oldestCodeVersion, quint16 &mapEntries,
+                                    quint32 &offsetToMap, quint32 &lengthOfMap, quint32 &offsetToEntries,
+                                    quint32 &resourceCount, quint32 &offsetToResources, quint32 &lengthOfResources)
 {
     if (!m_stream)
         return false;

@@ -87,8 +87,8 @@ public:
     unsigned int GenerateLocalClassID();
 
     bool ResourceHeader(quint8 &fileType, quint16 &version, quint16 &oldestCodeVersion, quint16 &mapEntries,
-                        quint32 &offsetToMap, quint32 &lengthOfMap, quint32 &offsetToEntries,
-                        quint32 &resourceCount, quint32 &offsetToResources, quint32 &lengthOfResources);
+                        quint32 &offsetToMap, quint32 &lengthOfMap, quint32 &offsetToEntries, quint32 &resourceCount,
+                        quint32 &offsetToResources, quint32 &lengthOfResources);
     QString Dump();
 
     // Module information (type 0x5000, IDs 0 ... 5). Each clears its output

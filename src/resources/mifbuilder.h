@@ -22,8 +22,7 @@ public:
     void AddClass(unsigned int classId);
     void AddApplet(unsigned int classId, quint16 appletType = 1, quint16 baseId = 1000);
     // A program record started by name (type 0x0102FAF7 or 0x0102C305).
-    void AddProgram(const QString &name, const QString &arguments = QString(),
-                    unsigned int type = 0x0102FAF7);
+    void AddProgram(const QString &name, const QString &arguments = QString(), unsigned int type = 0x0102FAF7);
     // A program record of the OAT framework: its key is
     // "<vendor>:<suite>:<program name>" and holds the program name.
     void AddSuiteProgram(const QString &key);

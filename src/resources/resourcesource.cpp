@@ -14,14 +14,15 @@ namespace {
 
 constexpr quint16 kWholeDocumentType = 0x7000;
 
-bool ReadNumber(const QDomElement &element, const char *attribute, quint16 fallback, bool required,
-                quint16 &value, QString *error)
+bool ReadNumber(const QDomElement &element, const char *attribute, quint16 fallback, bool required, quint16 &value,
+                QString *error)
 {
     const QString text = element.attribute(QLatin1String(attribute)).trimmed();
     if (text.isEmpty()) {
         if (required) {
-            *error = QStringLiteral("line %1: <%2> needs %3").arg(element.lineNumber()).arg(element.tagName(),
-                                                                                            QLatin1String(attribute));
+            *error = QStringLiteral("line %1: <%2> needs %3")
+                         .arg(element.lineNumber())
+                         .arg(element.tagName(), QLatin1String(attribute));
             return false;
         }
         value = fallback;
@@ -29,7 +30,7 @@ bool ReadNumber(const QDomElement &element, const char *attribute, quint16 fallb
     }
     bool ok = false;
     const uint number = text.startsWith(QLatin1String("0x"), Qt::CaseInsensitive) ? text.mid(2).toUInt(&ok, 16)
-                                                                                 : text.toUInt(&ok, 10);
+                                                                                  : text.toUInt(&ok, 10);
     if (!ok || number > 0xFFFF) {
         *error = QStringLiteral("line %1: bad %2 \"%3\"").arg(element.lineNumber()).arg(QLatin1String(attribute), text);
         return false;
@@ -83,8 +84,9 @@ bool CompileElement(KestoResources &resources, const QDomElement &element, const
             return false;
         if (lost) {
             for (const LostCharacter &character : LostCharacters(element.text(), KestoEncodingFormat(format)))
-                lost->append(QStringLiteral("line %1, string %2: %3")
-                                 .arg(QString::number(element.lineNumber()), QString::number(id), character.Describe()));
+                lost->append(
+                    QStringLiteral("line %1, string %2: %3")
+                        .arg(QString::number(element.lineNumber()), QString::number(id), character.Describe()));
         }
         return resources.AddString(type, id, format, element.text());
     }
@@ -168,7 +170,8 @@ bool CompileResourceSource(const QString &source, const QString &output, QString
     QByteArray compiled;
     QString reason;
     if (!resources.SaveTo(compiled) || !FileWriter::Write(output, compiled, true, &reason)) {
-        *error = QStringLiteral("cannot write %1 (%2)").arg(output, reason.isEmpty() ? QStringLiteral("the resources could not be serialised") : reason);
+        *error = QStringLiteral("cannot write %1 (%2)")
+                     .arg(output, reason.isEmpty() ? QStringLiteral("the resources could not be serialised") : reason);
         return false;
     }
     return true;

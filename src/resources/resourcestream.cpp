@@ -193,9 +193,9 @@ bool ResourceStream::ProcessStructures()
     for (auto type = m_table.constBegin(); type != m_table.constEnd(); ++type) {
         for (auto id = type->constBegin(); id != type->constEnd(); ++id) {
             const QByteArray &data = id.value();
-            ordered.push_back(Pair{type.key(), id.key(), &data,
-                                   std::hash<std::string_view>()(
-                                       std::string_view(data.constData(), size_t(data.size())))});
+            ordered.push_back(
+                Pair{type.key(), id.key(), &data,
+                     std::hash<std::string_view>()(std::string_view(data.constData(), size_t(data.size())))});
         }
     }
 
@@ -223,8 +223,7 @@ bool ResourceStream::ProcessStructures()
         const QByteArray &data = *pair.data;
         const quint16 tag = quint16(pair.hash >> 48);
         size_t at = pair.hash & mask;
-        while (seen[at].index != kFreeSlot
-               && (seen[at].tag != tag || _resources.at(seen[at].index) != data))
+        while (seen[at].index != kFreeSlot && (seen[at].tag != tag || _resources.at(seen[at].index) != data))
             at = (at + 1) & mask;
         int index = seen[at].index;
         if (index == kFreeSlot) {
@@ -247,8 +246,7 @@ bool ResourceStream::ProcessStructures()
     }
 
     const quint32 count = quint32(pairs);
-    const quint64 offsetToResources = kHeaderSize + quint64(kMapEntrySize) * count
-                                      + quint64(kOffsetSize) * (count + 1);
+    const quint64 offsetToResources = kHeaderSize + quint64(kMapEntrySize) * count + quint64(kOffsetSize) * (count + 1);
     if (offsetToResources + end > 0xFFFFFFFFu)
         return false;
     m_header.mapEntries = quint16(_fileMap.size());
@@ -269,8 +267,8 @@ bool ResourceStream::ProcessStructures()
 
 QByteArray ResourceStream::Serialize() const
 {
-    qsizetype size = kHeaderSize + qsizetype(kMapEntrySize) * _fileMap.size()
-                     + qsizetype(kOffsetSize) * _offsetTable.size();
+    qsizetype size
+        = kHeaderSize + qsizetype(kMapEntrySize) * _fileMap.size() + qsizetype(kOffsetSize) * _offsetTable.size();
     for (const QByteArray &block : _resources)
         size += block.size();
     // Everything is written through one cursor into a buffer of the final

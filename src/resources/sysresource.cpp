@@ -22,7 +22,9 @@ QByteArray UpToNul(const QByteArray &bytes)
 
 } // namespace
 
-SysResource::SysResource() : properties(std::make_unique<QObject>()) {}
+SysResource::SysResource() : properties(std::make_unique<QObject>())
+{
+}
 
 SysResource::~SysResource() = default;
 
@@ -80,8 +82,8 @@ void SysResource::Decode()
     switch (type) {
     case kTypeProgram:
     case kTypeProgramAlt: {
-        for (const char *name : {"version", "main id", "flags", "priority", "stack size", "max services",
-                                 "max memory", "Privildedge Index"})
+        for (const char *name : {"version", "main id", "flags", "priority", "stack size", "max services", "max memory",
+                                 "Privildedge Index"})
             SetProperty(name, uint(in.U32()));
         const quint32 argLength = in.U32();
         SetProperty("arg len", uint(argLength));
@@ -99,8 +101,7 @@ void SysResource::Decode()
     }
     case kTypeService:
         for (const char *name : {"Version", "transport id", "max invokes", "max handles", "stack size router",
-                                 "stack size worker", "priority router", "priority worker",
-                                 "Privildedge Index"})
+                                 "stack size worker", "priority router", "priority worker", "Privildedge Index"})
             SetProperty(name, uint(in.U32()));
         break;
     case kTypeServer: {

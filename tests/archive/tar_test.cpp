@@ -65,7 +65,10 @@ QByteArray Header(const QByteArray &name, const QByteArray &size, char type = '0
     std::memcpy(block.data() + 100, "0000644", 7);
     std::memcpy(block.data() + 124, size.constData(), size_t(std::min<qsizetype>(size.size(), 12)));
     block[156] = type;
-    std::memcpy(block.data() + 257, "ustar\0" "00", 8);
+    std::memcpy(block.data() + 257,
+                "ustar\0"
+                "00",
+                8);
     std::memset(block.data() + 148, ' ', 8);
     unsigned int sum = 0;
     for (const char c : block)
@@ -172,10 +175,10 @@ protected:
                          QFile::encodeName(root + u"/pkg/hard"_s).constData()),
                   0);
         const int maxName = GetParam().maxName;
-        const QString over100 = u"pkg/"_s + QString(60, QLatin1Char('d')) + QLatin1Char('/')
-                                + QString(50, QLatin1Char('f'));
-        const QString over255 = u"pkg/"_s + QString(150, QLatin1Char('e')) + QLatin1Char('/')
-                                + QString(130, QLatin1Char('g'));
+        const QString over100
+            = u"pkg/"_s + QString(60, QLatin1Char('d')) + QLatin1Char('/') + QString(50, QLatin1Char('f'));
+        const QString over255
+            = u"pkg/"_s + QString(150, QLatin1Char('e')) + QLatin1Char('/') + QString(130, QLatin1Char('g'));
         for (const QString &name : {over100, over255}) {
             if (maxName == 0 || name.size() + 2 <= maxName)
                 WriteFile(root + QLatin1Char('/') + name, Bytes(700, 'L'));
@@ -206,16 +209,14 @@ TEST_P(ForeignArchive, ReadsEveryMemberAsGnuTarExtractsIt)
     QByteArray output;
     if (writer.options.first().startsWith(QLatin1String("python:"))) {
         const QString script = u"import sys, tarfile\n"
-            "with tarfile.open(sys.argv[1], 'w', format=getattr(tarfile, sys.argv[2])) as t:\n"
-            "    t.add(sys.argv[3], arcname='.')\n"_s;
-        ASSERT_EQ(RunProgram(u"python3"_s,
-                             {u"-c"_s, script, archive, writer.options.first().mid(7), source}, &output),
+                               "with tarfile.open(sys.argv[1], 'w', format=getattr(tarfile, sys.argv[2])) as t:\n"
+                               "    t.add(sys.argv[3], arcname='.')\n"_s;
+        ASSERT_EQ(RunProgram(u"python3"_s, {u"-c"_s, script, archive, writer.options.first().mid(7), source}, &output),
                   0)
             << output.constData();
     } else {
         ASSERT_EQ(RunProgram(u"tar"_s,
-                             writer.options + QStringList{u"--sort=name"_s, u"-cf"_s, archive,
-                                                          u"-C"_s, source, u"."_s},
+                             writer.options + QStringList{u"--sort=name"_s, u"-cf"_s, archive, u"-C"_s, source, u"."_s},
                              &output),
                   0)
             << output.constData();
@@ -260,11 +261,9 @@ TEST_P(ForeignArchive, ReadsEveryMemberAsGnuTarExtractsIt)
 
 INSTANTIATE_TEST_SUITE_P(
     Tar, ForeignArchive,
-    ::testing::Values(Writer{"Gnu", {u"--format=gnu"_s}, 0, false},
-                      Writer{"OldGnu", {u"--format=oldgnu"_s}, 0, false},
+    ::testing::Values(Writer{"Gnu", {u"--format=gnu"_s}, 0, false}, Writer{"OldGnu", {u"--format=oldgnu"_s}, 0, false},
                       Writer{"Posix", {u"--format=posix"_s}, 0, false},
-                      Writer{"Ustar", {u"--format=ustar"_s}, 256, false},
-                      Writer{"V7", {u"--format=v7"_s}, 99, false},
+                      Writer{"Ustar", {u"--format=ustar"_s}, 256, false}, Writer{"V7", {u"--format=v7"_s}, 99, false},
                       Writer{"GnuSparse", {u"--format=gnu"_s, u"--sparse"_s}, 0, true},
                       Writer{"OldGnuSparse", {u"--format=oldgnu"_s, u"--sparse"_s}, 0, true},
                       Writer{"PaxSparse00", {u"--format=posix"_s, u"--sparse"_s, u"--sparse-version=0.0"_s}, 0, true},
@@ -321,22 +320,37 @@ INSTANTIATE_TEST_SUITE_P(
     ::testing::Values(
         Crafted{"SizeWithLeadingBlanks",
                 [] { return Header("a", "         5 ") + Padded("hello") + Member("b", "x") + kEnd; },
-                {"a", "b"}, "hello", ""},
+                {"a", "b"},
+                "hello",
+                ""},
         Crafted{"SizeWithLeadingNulsAndNoTerminator",
                 [] { return Header("a", QByteArray(7, '\0') + "00005") + Padded("hello") + kEnd; },
-                {"a"}, "hello", ""},
+                {"a"},
+                "hello",
+                ""},
         Crafted{"Base256Size", [] { return Header("a", Base256(5)) + Padded("hello") + kEnd; }, {"a"}, "hello", ""},
-        Crafted{"Base256SizeOver4GiB", [] { return Member("a", "x") + Header("big", Base256(quint64(1) << 32)); },
-                {"a"}, "x", "member big at offset 1024 is larger than 4 GiB - 1 bytes: not supported"},
-        Crafted{"OctalSizeOver4GiB", [] { return Header("huge", "77777777777") + Padded("hello"); }, {}, "",
+        Crafted{"Base256SizeOver4GiB",
+                [] { return Member("a", "x") + Header("big", Base256(quint64(1) << 32)); },
+                {"a"},
+                "x",
+                "member big at offset 1024 is larger than 4 GiB - 1 bytes: not supported"},
+        Crafted{"OctalSizeOver4GiB",
+                [] { return Header("huge", "77777777777") + Padded("hello"); },
+                {},
+                "",
                 "member huge at offset 0 is larger than 4 GiB - 1 bytes: not supported"},
         Crafted{"NegativeBase256Size",
                 [] {
                     QByteArray field(12, char(0xFF));
                     return Member("a", "x") + Header("neg", field) + kEnd;
                 },
-                {"a"}, "x", "invalid size field at offset 1024"},
-        Crafted{"DigitsEightAndNine", [] { return Member("a", "x") + Header("b", "00000000089") + kEnd; }, {"a"}, "x",
+                {"a"},
+                "x",
+                "invalid size field at offset 1024"},
+        Crafted{"DigitsEightAndNine",
+                [] { return Member("a", "x") + Header("b", "00000000089") + kEnd; },
+                {"a"},
+                "x",
                 "invalid size field at offset 1024"},
         Crafted{"BadChecksum",
                 [] {
@@ -344,7 +358,9 @@ INSTANTIATE_TEST_SUITE_P(
                     second[0] = 'c';
                     return Member("a", "x") + second + kEnd;
                 },
-                {"a"}, "x", "checksum error at offset 1024"},
+                {"a"},
+                "x",
+                "checksum error at offset 1024"},
         Crafted{"SignedChecksumIsAccepted",
                 [] {
                     // A name byte of 0xE9 adds 233 unsigned but -23 signed.
@@ -356,12 +372,23 @@ INSTANTIATE_TEST_SUITE_P(
                     std::memcpy(block.data() + 148, QByteArray::number(sum, 8).rightJustified(6, '0').constData(), 6);
                     return block + Padded("s") + kEnd;
                 },
-                {"\\351t\\303\\251"}, "s", ""},
-        Crafted{"TruncatedMember", [] { return Member("a", "x") + Header("b", Octal(3000)) + Bytes(1000, 'b'); },
-                {"a"}, "x", "unexpected end of archive at offset 2536"},
-        Crafted{"PaddingCutShort", [] { return Member("a", "x").left(600); }, {"a"}, "x",
+                {"\\351t\\303\\251"},
+                "s",
+                ""},
+        Crafted{"TruncatedMember",
+                [] { return Member("a", "x") + Header("b", Octal(3000)) + Bytes(1000, 'b'); },
+                {"a"},
+                "x",
+                "unexpected end of archive at offset 2536"},
+        Crafted{"PaddingCutShort",
+                [] { return Member("a", "x").left(600); },
+                {"a"},
+                "x",
                 "unexpected end of archive at offset 600"},
-        Crafted{"TruncatedHeader", [] { return Member("a", "x") + QByteArray(100, 'h'); }, {"a"}, "x",
+        Crafted{"TruncatedHeader",
+                [] { return Member("a", "x") + QByteArray(100, 'h'); },
+                {"a"},
+                "x",
                 "unexpected end of archive at offset 1124"},
         Crafted{"RandomBytes",
                 [] {
@@ -371,60 +398,85 @@ INSTANTIATE_TEST_SUITE_P(
                         c = char(random.bounded(256));
                     return bytes;
                 },
-                {}, "", "does not look like a tar archive"},
+                {},
+                "",
+                "does not look like a tar archive"},
         Crafted{"TextFile",
                 [] { return QByteArray("Package archives are tar files.\n").repeated(40); },
-                {}, "", "does not look like a tar archive"},
-        Crafted{"ShortTextFile", [] { return QByteArray("not an archive\n"); }, {}, "",
+                {},
+                "",
                 "does not look like a tar archive"},
+        Crafted{
+            "ShortTextFile", [] { return QByteArray("not an archive\n"); }, {}, "", "does not look like a tar archive"},
         Crafted{"EmptyFile", [] { return QByteArray(); }, {}, "", ""},
         Crafted{"NothingAfterTheEndBlocksIsListed",
-                [] { return Member("a", "x") + kEnd + Member("late", "y") + kEnd; }, {"a"}, "x", ""},
+                [] { return Member("a", "x") + kEnd + Member("late", "y") + kEnd; },
+                {"a"},
+                "x",
+                ""},
         Crafted{"DanglingLongNameNeverNamesTheEndBlocks",
-                [] { return Member("././@LongLink", QByteArray("evil\0", 5), 'L') + kEnd; }, {}, "", ""},
+                [] { return Member("././@LongLink", QByteArray("evil\0", 5), 'L') + kEnd; },
+                {},
+                "",
+                ""},
         Crafted{"VendorRecordsAreNotMembers",
                 [] {
                     return Member("acl", "user::rw-\n", 'A') + Member("sol", PaxRecord("mtime", "1"), 'X')
-                           + Member("glob", PaxRecord("comment", "hi"), 'g') + Member("a", "x") + kEnd;
+                        + Member("glob", PaxRecord("comment", "hi"), 'g') + Member("a", "x") + kEnd;
                 },
-                {"a"}, "x", ""},
+                {"a"},
+                "x",
+                ""},
         Crafted{"PaxPathSizeAndGlobalPath",
                 [] {
                     const QByteArray longName = QByteArray(300, 'p') + "/name.mif";
                     return Member("g", PaxRecord("path", "global/x"), 'g')
-                           + Member("x", PaxRecord("path", longName) + PaxRecord("size", "3"), 'x')
-                           + Header("short", Octal(999)) + Padded("abc") + Member("plain", "q") + kEnd;
+                        + Member("x", PaxRecord("path", longName) + PaxRecord("size", "3"), 'x')
+                        + Header("short", Octal(999)) + Padded("abc") + Member("plain", "q") + kEnd;
                 },
-                {QString(300, QLatin1Char('p')) + u"/name.mif"_s, "global/x"}, "abc", ""},
+                {QString(300, QLatin1Char('p')) + u"/name.mif"_s, "global/x"},
+                "abc",
+                ""},
         Crafted{"SparseMemberThatIsAllHole",
                 [] {
                     return Member("x", PaxRecord("GNU.sparse.size", "1000") + PaxRecord("GNU.sparse.map", ""), 'x')
-                           + Header("hole", Octal(0)) + Member("after", "zzz") + kEnd;
+                        + Header("hole", Octal(0)) + Member("after", "zzz") + kEnd;
                 },
-                {"hole", "after"}, QByteArray(1000, '\0'), ""},
+                {"hole", "after"},
+                QByteArray(1000, '\0'),
+                ""},
         Crafted{"SparseRunPastTheMember",
                 [] {
                     return Member("x", PaxRecord("GNU.sparse.size", "10") + PaxRecord("GNU.sparse.map", "8,4"), 'x')
-                           + Member("bad", "abcd") + kEnd;
+                        + Member("bad", "abcd") + kEnd;
                 },
-                {}, "", "invalid sparse map at offset 1024"},
+                {},
+                "",
+                "invalid sparse map at offset 1024"},
         Crafted{"PaxRecordWithoutNewline",
                 [] { return Member("x", PaxRecord("path", "a").chopped(1) + " ", 'x') + Member("a", "x") + kEnd; },
-                {}, "", "malformed extended header at offset 0"},
-        Crafted{"PaxRecordLongerThanItsHeader",
-                [] { return Member("x", "99 path=a\n", 'x') + Member("a", "x") + kEnd; }, {}, "",
+                {},
+                "",
                 "malformed extended header at offset 0"},
-        Crafted{"OversizedPaxHeader", [] { return Header("x", Octal(8 << 20), 'x') + kEnd; }, {}, "",
+        Crafted{"PaxRecordLongerThanItsHeader",
+                [] { return Member("x", "99 path=a\n", 'x') + Member("a", "x") + kEnd; },
+                {},
+                "",
+                "malformed extended header at offset 0"},
+        Crafted{"OversizedPaxHeader",
+                [] { return Header("x", Octal(8 << 20), 'x') + kEnd; },
+                {},
+                "",
                 "extended header too large at offset 0"},
-        Crafted{"NameThatIsNotUtf8",
-                [] { return Member("caf\xe9.mif", "x") + kEnd; }, {"caf\\351.mif"}, "x", ""}),
+        Crafted{"NameThatIsNotUtf8", [] { return Member("caf\xe9.mif", "x") + kEnd; }, {"caf\\351.mif"}, "x", ""}),
     [](const auto &info) { return std::string(info.param.label); });
 
 TEST_F(TarTest, HardLinkAndNonUtf8NameKeepTheirDetails)
 {
     // The link names "./a/", the latest member of that name.
-    WriteFile(Path("links.tar"), Member("a\xff", "one") + Member("a", "one") + Member("a", "two")
-                                     + Header("b", Octal(0), '1', "./a/") + Header("c", Octal(0), '1', "none") + kEnd);
+    WriteFile(Path("links.tar"),
+              Member("a\xff", "one") + Member("a", "one") + Member("a", "two") + Header("b", Octal(0), '1', "./a/")
+                  + Header("c", Octal(0), '1', "none") + kEnd);
     Tar tar;
     ASSERT_TRUE(tar.Open(QIODevice::ReadOnly, Path("links.tar")));
     ASSERT_FALSE(tar.IsDamaged()) << tar.ErrorString().toStdString();
@@ -448,11 +500,16 @@ TEST(TarNumbers, ReadLikeGnuTar)
         bool ok;
         quint64 value;
     } rows[] = {
-        {"00000000012", true, 10},     {QByteArray("00000000012\0", 12), true, 10},
-        {"      12345", true, 012345}, {"17 \0", true, 15},
-        {"000000000010", true, 010},   {"12 34", true, 012},
-        {QByteArray(12, '\0'), true, 0}, {"0000000009", false, 0},
-        {"12x", false, 0},             {Base256(quint64(5) << 40), true, quint64(5) << 40},
+        {"00000000012", true, 10},
+        {QByteArray("00000000012\0", 12), true, 10},
+        {"      12345", true, 012345},
+        {"17 \0", true, 15},
+        {"000000000010", true, 010},
+        {"12 34", true, 012},
+        {QByteArray(12, '\0'), true, 0},
+        {"0000000009", false, 0},
+        {"12x", false, 0},
+        {Base256(quint64(5) << 40), true, quint64(5) << 40},
         {QByteArray(12, char(0xFF)), false, 0},
     };
     for (const auto &row : rows) {

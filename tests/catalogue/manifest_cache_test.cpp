@@ -53,10 +53,7 @@ protected:
     }
 
     // A cache file of the manifest's kit with the given root and entries.
-    void WriteCache(const Manifest &manifest, const QByteArray &text)
-    {
-        testutil::WriteFile(manifest.cacheFile, text);
-    }
+    void WriteCache(const Manifest &manifest, const QByteArray &text) { testutil::WriteFile(manifest.cacheFile, text); }
 };
 
 TEST_F(ManifestCacheTest, CacheLivesInTheFolderNamedByTheCleanedKitPath)
@@ -99,8 +96,7 @@ INSTANTIATE_TEST_SUITE_P(Caches, ManifestVersionTest,
                                            VersionCase{"<testkit version='-7'/>", false},
                                            VersionCase{"<testkit version='99999999999'/>", false},
                                            VersionCase{"<manifest version='5'/>", false},
-                                           VersionCase{"<testkit version='5'>", false},
-                                           VersionCase{"", false}));
+                                           VersionCase{"<testkit version='5'>", false}, VersionCase{"", false}));
 
 TEST_F(ManifestCacheTest, MissingCacheIsNotCurrentAndCannotBeRead)
 {
@@ -113,7 +109,8 @@ TEST_F(ManifestCacheTest, StaleOrBrokenCacheIsReplacedByAScan)
 {
     kit->AddSourceModule(u"tests/a"_s, MakeModule(u"ctf"_s, u"Scanned"_s));
     for (const QByteArray &stale :
-         {QByteArray("<testkit version='4'><testmodules><testmodule testtype='ctf' moduleName='Old'/></testmodules></testkit>"),
+         {QByteArray("<testkit version='4'><testmodules><testmodule testtype='ctf' "
+                     "moduleName='Old'/></testmodules></testkit>"),
           QByteArray("<testkit version='5'><testmodules><testmodule testtype='ctf' moduleName='Cut'/>")}) {
         Manifest manifest(kit->Root(), false);
         WriteCache(manifest, stale);
@@ -156,11 +153,13 @@ TEST_F(ManifestCacheTest, ReadingKeepsKnownKindsAndNamedFrameworksOnly)
 TEST_F(ManifestCacheTest, ReadingReplacesModulesButKeepsFrameworks)
 {
     Manifest manifest(kit->Root(), false);
-    WriteCache(manifest, "<testkit version='5'><testmodules><testmodule testtype='ctf' moduleName='A'/></testmodules>"
-                         "<frameworks><framework name='ctf'/></frameworks></testkit>");
+    WriteCache(manifest,
+               "<testkit version='5'><testmodules><testmodule testtype='ctf' moduleName='A'/></testmodules>"
+               "<frameworks><framework name='ctf'/></frameworks></testkit>");
     ASSERT_TRUE(manifest.ReadManifest());
-    WriteCache(manifest, "<testkit version='5'><testmodules><testmodule testtype='ctf' moduleName='B'/></testmodules>"
-                         "<frameworks><framework name='oat'/></frameworks></testkit>");
+    WriteCache(manifest,
+               "<testkit version='5'><testmodules><testmodule testtype='ctf' moduleName='B'/></testmodules>"
+               "<frameworks><framework name='oat'/></frameworks></testkit>");
     ASSERT_TRUE(manifest.ReadManifest());
     EXPECT_EQ(manifest.testModules.keys(), QStringList{"b"});
     EXPECT_EQ(manifest.frameworks.keys(), (QStringList{"ctf", "oat"}));

@@ -4,8 +4,8 @@
 
 #include "catalogue/manifest.h"
 #include "catalogue/testmodule.h"
-#include "support/kitbuilder.h"
 #include "log/log.h"
+#include "support/kitbuilder.h"
 #include "support/testutil.h"
 
 #include <QDir>
@@ -62,10 +62,7 @@ protected:
         return names;
     }
 
-    QString LogText() const
-    {
-        return QString::fromLatin1(testutil::ReadFile(m_dir.path() + u"/log.txt"_s));
-    }
+    QString LogText() const { return QString::fromLatin1(testutil::ReadFile(m_dir.path() + u"/log.txt"_s)); }
 
     QTemporaryDir m_dir;
     testutil::EnvGuard m_env;

@@ -212,9 +212,9 @@ TEST_P(ManifestKindTest, LastClassifyingEntryDecides)
 }
 
 INSTANTIATE_TEST_SUITE_P(Entries, ManifestKindTest,
-                         ::testing::Values(KindCase{"src", true, true},         // "src" after "m.MOD"
-                                           KindCase{"a.c", false, false},       // before it
-                                           KindCase{"Include", true, false},    // "include" < "m.mod"
+                         ::testing::Values(KindCase{"src", true, true}, // "src" after "m.MOD"
+                                           KindCase{"a.c", false, false}, // before it
+                                           KindCase{"Include", true, false}, // "include" < "m.mod"
                                            KindCase{"z_inc", true, true}));
 
 TEST_F(ManifestScanTest, OatModulesFindTheirBaseLineFile)
@@ -293,8 +293,8 @@ TEST_F(ManifestScanTest, ModuleInformationComesFromTheFirstMatchingMemberThatLoa
     EXPECT_EQ(found->classids, QVector<unsigned int>{0x0101});
     EXPECT_EQ(found->targets.keys(), QStringList{u"Mif_Win32_Debug"_s});
     const QString log = LogText();
-    EXPECT_TRUE(log.contains(u"Manifest::ProcessPackageDir refused %1: does not look like a tar archive\n"_s
-                                 .arg(kit->Path(u"tests/mif/package/Mif_armgcc_Release.kestix"_s))))
+    EXPECT_TRUE(log.contains(u"Manifest::ProcessPackageDir refused %1: does not look like a tar archive\n"_s.arg(
+        kit->Path(u"tests/mif/package/Mif_armgcc_Release.kestix"_s))))
         << log.toStdString();
     EXPECT_TRUE(log.contains(u"Mif_Win32_Release.kestix: unexpected end of archive at offset 1500\n"_s))
         << log.toStdString();
@@ -371,13 +371,9 @@ TEST_P(ManifestLogKindTest, ModuleKindFollowsTheLogName)
 }
 
 INSTANTIATE_TEST_SUITE_P(Names, ManifestLogKindTest,
-                         ::testing::Values(LogCase{"Run-CTF-1.LOG", "ctf"},
-                                           LogCase{"/logs/Timer-ctf-2026.log", "ctf"},
-                                           LogCase{"run.log", "ctfapplet"},
-                                           LogCase{"result.TXT", "uitf"},
-                                           LogCase{"/a/b.xml", "uitf"},
-                                           LogCase{"module.oat", "oat"},
-                                           LogCase{"x.bin", ""},
-                                           LogCase{"noextension", ""}));
+                         ::testing::Values(LogCase{"Run-CTF-1.LOG", "ctf"}, LogCase{"/logs/Timer-ctf-2026.log", "ctf"},
+                                           LogCase{"run.log", "ctfapplet"}, LogCase{"result.TXT", "uitf"},
+                                           LogCase{"/a/b.xml", "uitf"}, LogCase{"module.oat", "oat"},
+                                           LogCase{"x.bin", ""}, LogCase{"noextension", ""}));
 
 } // namespace

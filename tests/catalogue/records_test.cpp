@@ -38,9 +38,10 @@ QSharedPointer<_CompilerVariant> Variant(const QString &name, IKestoDevice::Plat
 TEST(CompilerVariant, ReadsFilesListInAnyCaseAndSkipsEntriesWithoutPath)
 {
     QDomDocument document;
-    const QDomElement element = Parse(document, u"<variant name='w' variant='Win32' binpath='/b' arch='WIN32' build='Debug'>"
-        "<FILES><File path='/b/a.dll'/><other/><x path='/b/c.dll'/></FILES>"
-        "<files><File path='/b/d.dll'/></files></variant>"_s);
+    const QDomElement element = Parse(document,
+                                      u"<variant name='w' variant='Win32' binpath='/b' arch='WIN32' build='Debug'>"
+                                      "<FILES><File path='/b/a.dll'/><other/><x path='/b/c.dll'/></FILES>"
+                                      "<files><File path='/b/d.dll'/></files></variant>"_s);
     _CompilerVariant variant;
     ASSERT_TRUE(variant.ReadFromXML(element));
     EXPECT_EQ(variant.files, QStringList({"/b/a.dll", "/b/c.dll", "/b/d.dll"}));
@@ -72,8 +73,8 @@ TEST(CompilerVariant, WritesEveryAttributeAndReadsBackTheSame)
     variant.WriteToXML(element);
     EXPECT_EQ(XmlWriter::ToString(document, 0),
               u"<target arch=\"arm\" binpath=\"\" build=\"\" name=\"m_RVCT22arm9_Release\" "
-                             "packagepath=\"\" variant=\"\">\n<files>\n<File path=\"/x/1\"/>\n"
-                             "<File path=\"/x/2\"/>\n</files>\n</target>\n"_s);
+              "packagepath=\"\" variant=\"\">\n<files>\n<File path=\"/x/1\"/>\n"
+              "<File path=\"/x/2\"/>\n</files>\n</target>\n"_s);
     _CompilerVariant back;
     ASSERT_TRUE(back.ReadFromXML(element));
     EXPECT_EQ(back.name, variant.name);
@@ -107,8 +108,10 @@ TEST(Framework, KeepsTheLastVariantOfANameAndReadsClassId)
 {
     QDomDocument document;
     _Framework framework;
-    ASSERT_TRUE(framework.ReadFromManifest(Parse(document, u"<framework name='ctf'><variant name='v' build='first'/><VARIANT name='v' build='second'/>"
-        "<variant build='nameless'/><ClassId value='268435457'/></framework>"_s)));
+    ASSERT_TRUE(framework.ReadFromManifest(
+        Parse(document,
+              u"<framework name='ctf'><variant name='v' build='first'/><VARIANT name='v' build='second'/>"
+              "<variant build='nameless'/><ClassId value='268435457'/></framework>"_s)));
     ASSERT_EQ(framework.variants.size(), 1);
     EXPECT_EQ(framework.variants.value(u"v"_s)->build, u"second"_s);
     EXPECT_EQ(framework.classId, 268435457u);
@@ -163,7 +166,8 @@ TEST(Framework, IsLoadedAsksTheModuleThenTheClassDirectory)
     EXPECT_TRUE(framework.IsLoaded(&device));
 
     EXPECT_CALL(device, ListDirectory(u"fs:/~0x00000abc"_s, _))
-        .WillOnce(ListingOf({u"fs:/~0x00000abc/a.mif"_s})) .WillOnce(ListingOf({}));
+        .WillOnce(ListingOf({u"fs:/~0x00000abc/a.mif"_s}))
+        .WillOnce(ListingOf({}));
     EXPECT_TRUE(framework.IsLoaded(&device));
     EXPECT_FALSE(framework.IsLoaded(&device));
 }
@@ -190,7 +194,8 @@ TEST(Framework, UnloadFallsBackToTheNamedDirectory)
     framework.name = u"ctf"_s;
     framework.classId = 5;
     EXPECT_CALL(device, FindModule(5u, _))
-        .WillOnce(DoAll(SetArgReferee<1>(u"fs:/usermods/ctfx/"_s), Return(0u))) .WillOnce(Return(3u));
+        .WillOnce(DoAll(SetArgReferee<1>(u"fs:/usermods/ctfx/"_s), Return(0u)))
+        .WillOnce(Return(3u));
     EXPECT_CALL(device, RemoveDirectory(u"fs:/usermods/ctfx/"_s)).WillOnce(Return(0u));
     EXPECT_CALL(device, RemoveDirectory(u"fs:/usermods/ctf"_s)).WillOnce(Return(0u));
     framework.Unload(&device, env);

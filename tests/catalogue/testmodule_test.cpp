@@ -22,7 +22,7 @@ public:
     bool IsLogComplete(IKestoDevice *) override { return true; }
     using _TestModule::ParseLog;
     bool ParseLog(const QString &, TestResults &) override { return false; }
-    void PostProcess(QMap<QString, QString> &) override {}
+    void PostProcess(QMap<QString, QString> &) override { }
     QString ModuleName() override { return moduleName; }
     QString ModuleXMLName() override { return u"record.xml"_s; }
     bool ProcessModuleMIF(const QString &) override { return false; }
@@ -57,15 +57,15 @@ protected:
 
 TEST_F(ModuleXml, ReadsUpperCaseAttributesBeforeLowerCaseOnes)
 {
-    ASSERT_TRUE(module.ProcessModuleXML(Write(
-        "<kit><SUITE NAME='Upper' name='lower' family='fam' SUBFAMILY='Sub' subfamily='sub'>"
-        "<MinKestoVer>3.1</MinKestoVer><secondary_modules>helper</secondary_modules>"
-        "<DDFUSAGE/><device_classids/>"
-        "<TESTCASE NAME='a' TYPE='manual' type='auto'/>"
-        "<testcase name='b'/>"
-        "<testcase name='c' type=''/>"
-        "<testcase type='auto'/>"
-        "</SUITE></kit>")));
+    ASSERT_TRUE(module.ProcessModuleXML(
+        Write("<kit><SUITE NAME='Upper' name='lower' family='fam' SUBFAMILY='Sub' subfamily='sub'>"
+              "<MinKestoVer>3.1</MinKestoVer><secondary_modules>helper</secondary_modules>"
+              "<DDFUSAGE/><device_classids/>"
+              "<TESTCASE NAME='a' TYPE='manual' type='auto'/>"
+              "<testcase name='b'/>"
+              "<testcase name='c' type=''/>"
+              "<testcase type='auto'/>"
+              "</SUITE></kit>")));
     EXPECT_EQ(module.moduleName, u"Upper"_s);
     EXPECT_EQ(module.family, u"fam"_s);
     EXPECT_EQ(module.subFamily, u"Sub"_s);
@@ -181,7 +181,8 @@ TEST(TestModuleRecord, ManifestEntryRoundTrips)
 TEST(TestModuleRecord, ManifestReadingDropsMalformedEntriesAndKeepsTheRest)
 {
     QDomDocument document;
-    ASSERT_TRUE(document.setContent(u"<testmodule source='KVK'>"
+    ASSERT_TRUE(document.setContent(
+        u"<testmodule source='KVK'>"
         "<targets><target name='a' arch='arm'/><target arch='arm'/><other name='b'/></targets>"
         "<applets><applet appletid='x'/><applet hostid='3'/><applet appletid='55' baseid='' flags='z'/></applets>"
         "<classids><classid value='0'/><classid value='nope'/><classid value='12'/></classids>"

@@ -31,7 +31,8 @@ protected:
 
 TEST_F(DemoInit, PrintsTheVariablesThatPointAtIt)
 {
-    EXPECT_TRUE(env.contains(QStringLiteral("export KESTIX_TESTSET='%1/kits/DemoKit'\n").arg(root))) << env.toStdString();
+    EXPECT_TRUE(env.contains(QStringLiteral("export KESTIX_TESTSET='%1/kits/DemoKit'\n").arg(root)))
+        << env.toStdString();
     EXPECT_TRUE(env.contains(QStringLiteral("export KESTIX_PLATFORM='%1/platforms/Kesto5 Pro/'\n").arg(root)));
     EXPECT_EQ(testutil::ReadFile(root + QStringLiteral("/env.sh")), env.toUtf8());
     // A second init into the same folder is refused rather than mixed in.
@@ -70,7 +71,7 @@ TEST_F(DemoInit, PackagesAreTarArchivesWithReadableModuleInformation)
         }
         EXPECT_TRUE(haveMif) << path.toStdString();
     }
-    EXPECT_EQ(packages, 4 + 6 + 1);  // frameworks; the kit's modules, a secondary one among them; the platform's module
+    EXPECT_EQ(packages, 4 + 6 + 1); // frameworks; the kit's modules, a secondary one among them; the platform's module
 }
 
 TEST_F(DemoInit, ScriptsAreValidShellAndPerlAndDescriptionsValidXml)
@@ -94,10 +95,12 @@ TEST_F(DemoInit, ScriptsAreValidShellAndPerlAndDescriptionsValidXml)
     }
     if (testutil::HaveProgram(QStringLiteral("perl"))) {
         QByteArray out;
-        EXPECT_EQ(testutil::RunProgram(QStringLiteral("perl"),
-                                       {QStringLiteral("-c"), root + QStringLiteral("/kits/DemoKit/testframeworks/oat/tools/bin/PostProcess3.pl")},
-                                       &out),
-                  0)
+        EXPECT_EQ(
+            testutil::RunProgram(QStringLiteral("perl"),
+                                 {QStringLiteral("-c"),
+                                  root + QStringLiteral("/kits/DemoKit/testframeworks/oat/tools/bin/PostProcess3.pl")},
+                                 &out),
+            0)
             << out.constData();
     }
 }
@@ -110,14 +113,14 @@ TEST_F(DemoInit, StandInCompilersProduceRealResourceFiles)
     const QString dso = dir.filePath(QStringLiteral("device.kar"));
     QByteArray out;
     ASSERT_EQ(testutil::RunProgram(tools + QStringLiteral("/kestormc.exe"),
-                                   {QStringLiteral("-convert"), QStringLiteral("-infile"), root + QStringLiteral("/testdata/demo.ksx"),
-                                    QStringLiteral("-outfile"), car},
+                                   {QStringLiteral("-convert"), QStringLiteral("-infile"),
+                                    root + QStringLiteral("/testdata/demo.ksx"), QStringLiteral("-outfile"), car},
                                    &out),
               0);
     EXPECT_TRUE(out.contains("Successfully converted file")) << out.constData();
-    ASSERT_EQ(testutil::RunProgram(tools + QStringLiteral("/kestormc.exe"),
-                                   {QStringLiteral("-compile"), QStringLiteral("-infile"), car, QStringLiteral("-outfile"), kar},
-                                   &out),
+    ASSERT_EQ(testutil::RunProgram(
+                  tools + QStringLiteral("/kestormc.exe"),
+                  {QStringLiteral("-compile"), QStringLiteral("-infile"), car, QStringLiteral("-outfile"), kar}, &out),
               0);
     EXPECT_TRUE(out.contains("Successfully compiled")) << out.constData();
     KestoResources data;
@@ -127,10 +130,13 @@ TEST_F(DemoInit, StandInCompilersProduceRealResourceFiles)
     ASSERT_TRUE(data.GetString(KestoResources::kTypeStrings, 2, &format, text));
     EXPECT_EQ(text, QStringLiteral("\u30c6\u30b9\u30c8"));
 
-    ASSERT_EQ(testutil::RunProgram(tools + QStringLiteral("/deprecated/ResourceEditor/kestorc.exe"),
-                                   {QStringLiteral("-nh"), QStringLiteral("-o"), dso,
-                                    root + QStringLiteral("/platforms/Kesto5 Pro/pvs/platform/testframeworks/oat/tools/reference/deviceref.dso")},
-                                   &out),
+    ASSERT_EQ(testutil::RunProgram(
+                  tools + QStringLiteral("/deprecated/ResourceEditor/kestorc.exe"),
+                  {QStringLiteral("-nh"), QStringLiteral("-o"), dso,
+                   root
+                       + QStringLiteral(
+                           "/platforms/Kesto5 Pro/pvs/platform/testframeworks/oat/tools/reference/deviceref.dso")},
+                  &out),
               0)
         << out.constData();
     KestoResources pack;

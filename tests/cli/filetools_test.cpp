@@ -25,14 +25,17 @@ TEST_F(InspectTool, CompiledSourceListsDecodedStringsObjectsAndClassIds)
 {
     WriteFile(Path(QStringLiteral("src.xml")),
               "<resources>\n"
-              " <string id=\"1\" format=\"UTF-8\">Gr\xc3\xbc\xc3\x9f""e</string>\n"
+              " <string id=\"1\" format=\"UTF-8\">Gr\xc3\xbc\xc3\x9f"
+              "e</string>\n"
               " <string id=\"7\" format=\"GB2312\">\xe4\xb8\xad\xe6\x96\x87</string>\n"
               " <object id=\"2\" mime=\"text/plain\">abc</object>\n"
-              " <binary type=\"0x5000\" id=\"0\" hex=\"" + QByteArray(80, '0') + "\"/>\n"
-              " <binary type=\"0x5000\" id=\"1\" hex=\"78563412 efbeadde 00000000 11111111\"/>\n"
-              "</resources>\n");
-    const ToolResult compiled = RunTool({QStringLiteral("res"), QStringLiteral("compile"), Path(QStringLiteral("src.xml")),
-                                         Path(QStringLiteral("out.kar"))});
+              " <binary type=\"0x5000\" id=\"0\" hex=\""
+                  + QByteArray(80, '0')
+                  + "\"/>\n"
+                    " <binary type=\"0x5000\" id=\"1\" hex=\"78563412 efbeadde 00000000 11111111\"/>\n"
+                    "</resources>\n");
+    const ToolResult compiled = RunTool({QStringLiteral("res"), QStringLiteral("compile"),
+                                         Path(QStringLiteral("src.xml")), Path(QStringLiteral("out.kar"))});
     ASSERT_EQ(compiled.status, 0) << compiled.err.constData();
 
     const ToolResult list = RunTool({QStringLiteral("res"), QStringLiteral("list"), Path(QStringLiteral("out.kar"))});
@@ -64,20 +67,22 @@ TEST_F(InspectTool, BadSourcesAndForeignFilesAreUsageErrors)
     EXPECT_TRUE(bad.err.contains("bad id")) << bad.err.constData();
     EXPECT_FALSE(QFile::exists(Path(QStringLiteral("o.kar"))));
     // The second of two resources with one type and ID would silently replace the first.
-    WriteFile(Path(QStringLiteral("twice.xml")), "<resources><string id=\"3\">a</string><object id=\"4\">b</object>\n"
-                                                 "<string id=\"3\">c</string></resources>");
-    const ToolResult twice = RunTool({QStringLiteral("res"), QStringLiteral("compile"), Path(QStringLiteral("twice.xml")),
-                                      Path(QStringLiteral("o.kar"))});
+    WriteFile(Path(QStringLiteral("twice.xml")),
+              "<resources><string id=\"3\">a</string><object id=\"4\">b</object>\n"
+              "<string id=\"3\">c</string></resources>");
+    const ToolResult twice = RunTool({QStringLiteral("res"), QStringLiteral("compile"),
+                                      Path(QStringLiteral("twice.xml")), Path(QStringLiteral("o.kar"))});
     EXPECT_EQ(twice.status, 2);
     EXPECT_TRUE(twice.err.contains("line 2: duplicate resource ID 3 of type 0x1")) << twice.err.constData();
-    const ToolResult nowhere = RunTool({QStringLiteral("res"), QStringLiteral("compile"), Path(QStringLiteral("src.xml")),
-                                        Path(QStringLiteral("missing/o.kar"))});
+    const ToolResult nowhere = RunTool({QStringLiteral("res"), QStringLiteral("compile"),
+                                        Path(QStringLiteral("src.xml")), Path(QStringLiteral("missing/o.kar"))});
     EXPECT_EQ(nowhere.status, 2);
     EXPECT_FALSE(nowhere.err.contains("()")) << nowhere.err.constData();
     EXPECT_FALSE(QFile::exists(Path(QStringLiteral("o.kar"))));
     EXPECT_EQ(RunTool({QStringLiteral("res"), QStringLiteral("list"), Path(QStringLiteral("junk.kar"))}).status, 2);
     EXPECT_EQ(RunTool({QStringLiteral("mif"), Path(QStringLiteral("missing.mif"))}).status, 2);
-    EXPECT_EQ(RunTool({QStringLiteral("res"), QStringLiteral("frobnicate"), Path(QStringLiteral("junk.kar"))}).status, 2);
+    EXPECT_EQ(RunTool({QStringLiteral("res"), QStringLiteral("frobnicate"), Path(QStringLiteral("junk.kar"))}).status,
+              2);
 }
 
 TEST_F(InspectTool, TarListAndCatReadAnArchiveMadeByGnuTar)
@@ -90,9 +95,10 @@ TEST_F(InspectTool, TarListAndCatReadAnArchiveMadeByGnuTar)
     ASSERT_TRUE(QFile::link(QStringLiteral("a.txt"), Path(QStringLiteral("pkg/mod/link"))));
     WriteFile(Path(QStringLiteral("pkg/late")), "late");
     const auto makeTar = [this](const QString &name, const QStringList &members) {
-        return testutil::RunProgram(QStringLiteral("tar"), QStringList{QStringLiteral("--sort=name"), QStringLiteral("-cf"),
-                                                                       Path(name), QStringLiteral("-C"),
-                                                                       Path(QStringLiteral("pkg"))} + members);
+        return testutil::RunProgram(QStringLiteral("tar"),
+                                    QStringList{QStringLiteral("--sort=name"), QStringLiteral("-cf"), Path(name),
+                                                QStringLiteral("-C"), Path(QStringLiteral("pkg"))}
+                                        + members);
     };
     ASSERT_EQ(makeTar(QStringLiteral("p.tar"), {QStringLiteral("mod")}), 0);
     ASSERT_EQ(makeTar(QStringLiteral("late.tar"), {QStringLiteral("late")}), 0);
@@ -101,11 +107,12 @@ TEST_F(InspectTool, TarListAndCatReadAnArchiveMadeByGnuTar)
     WriteFile(Path(QStringLiteral("both.tar")), archive + ReadFile(Path(QStringLiteral("late.tar"))));
     const ToolResult list = RunTool({QStringLiteral("tar"), QStringLiteral("list"), Path(QStringLiteral("both.tar"))});
     ASSERT_EQ(list.status, 0) << list.err.constData();
-    EXPECT_EQ(list.out, QByteArray("d\t0\tmod/\n"
-                                   "-\t6\tmod/a.txt\n"
-                                   "-\t0\tmod/empty\n"
-                                   "l\t0\tmod/link -> a.txt\n"
-                                   "-\t1\tmod/red\\033[31m\\n\n"));
+    EXPECT_EQ(list.out,
+              QByteArray("d\t0\tmod/\n"
+                         "-\t6\tmod/a.txt\n"
+                         "-\t0\tmod/empty\n"
+                         "l\t0\tmod/link -> a.txt\n"
+                         "-\t1\tmod/red\\033[31m\\n\n"));
 
     const auto cat = [this](const QString &file, const QString &member) {
         return RunTool({QStringLiteral("tar"), QStringLiteral("cat"), Path(file), member});
@@ -152,14 +159,16 @@ TEST_F(InspectTool, EncodeMatchesIconvAfterTheMarkAndDecodeReadsItBack)
         const char *iconvName;
         QByteArray mark;
     };
-    const QString text = QStringLiteral("\u4e2d\u6587 A");  // 中文 A
+    const QString text = QStringLiteral("\u4e2d\u6587 A"); // 中文 A
     WriteFile(Path(QStringLiteral("text.txt")), text.toUtf8());
-    for (const Case &c : {Case{"S-JIS", "SHIFT_JIS", QByteArray("\xfd\xfe")}, Case{"GB2312", "GB2312", QByteArray("\xfc\xfe")},
-                          Case{"UTF-8", "UTF-8", QByteArray("\x02")}}) {
+    for (const Case &c :
+         {Case{"S-JIS", "SHIFT_JIS", QByteArray("\xfd\xfe")}, Case{"GB2312", "GB2312", QByteArray("\xfc\xfe")},
+          Case{"UTF-8", "UTF-8", QByteArray("\x02")}}) {
         QByteArray expected;
         ASSERT_EQ(testutil::RunProgram(QStringLiteral("sh"),
-                                       {QStringLiteral("-c"), QStringLiteral("iconv -f UTF-8 -t %1 '%2'")
-                                                                  .arg(QLatin1String(c.iconvName), Path(QStringLiteral("text.txt")))},
+                                       {QStringLiteral("-c"),
+                                        QStringLiteral("iconv -f UTF-8 -t %1 '%2'")
+                                            .arg(QLatin1String(c.iconvName), Path(QStringLiteral("text.txt")))},
                                        &expected),
                   0);
         const ToolResult encoded = RunTool({QStringLiteral("encode"), QLatin1String(c.format), text});
@@ -170,7 +179,8 @@ TEST_F(InspectTool, EncodeMatchesIconvAfterTheMarkAndDecodeReadsItBack)
 
         const ToolResult decoded = RunTool({QStringLiteral("decode"), QString::fromLatin1(encoded.out.trimmed())});
         ASSERT_EQ(decoded.status, 0) << c.format;
-        EXPECT_EQ(QString::fromUtf8(decoded.out), QLatin1String(c.format) + QLatin1Char('\t') + text + QLatin1Char('\n'));
+        EXPECT_EQ(QString::fromUtf8(decoded.out),
+                  QLatin1String(c.format) + QLatin1Char('\t') + text + QLatin1Char('\n'));
     }
     EXPECT_EQ(RunTool({QStringLiteral("encode"), QStringLiteral("EBCDIC"), QStringLiteral("x")}).status, 2);
     EXPECT_EQ(RunTool({QStringLiteral("decode"), QStringLiteral("0g")}).status, 2);
@@ -178,10 +188,11 @@ TEST_F(InspectTool, EncodeMatchesIconvAfterTheMarkAndDecodeReadsItBack)
 
 TEST_F(InspectTool, TextAnEncodingCannotHoldIsNamedAndNothingIsStored)
 {
-    const struct {
+    const struct
+    {
         const char *format;
         QString text;
-        QByteArray lost;  // the lines on standard error, empty when every character is held
+        QByteArray lost; // the lines on standard error, empty when every character is held
     } rows[] = {
         {"1", QStringLiteral("H\u00e9llo \u30c6"), "character 7 U+30C6 '\xe3\x83\x86'"},
         {"ISOLATIN1", QStringLiteral("H\u00e9llo"), {}},
@@ -197,9 +208,10 @@ TEST_F(InspectTool, TextAnEncodingCannotHoldIsNamedAndNothingIsStored)
         EXPECT_TRUE(r.err.contains(row.lost)) << r.err.constData();
     }
 
-    WriteFile(Path(QStringLiteral("lossy.xml")), "<resources>\n<string id=\"1\" format=\"1\">\xe3\x83\x86\xe3\x82\xb9\xe3\x83\x88</string>\n</resources>");
-    const ToolResult compiled = RunTool({QStringLiteral("res"), QStringLiteral("compile"), Path(QStringLiteral("lossy.xml")),
-                                         Path(QStringLiteral("out.kar"))});
+    WriteFile(Path(QStringLiteral("lossy.xml")),
+              "<resources>\n<string id=\"1\" format=\"1\">\xe3\x83\x86\xe3\x82\xb9\xe3\x83\x88</string>\n</resources>");
+    const ToolResult compiled = RunTool({QStringLiteral("res"), QStringLiteral("compile"),
+                                         Path(QStringLiteral("lossy.xml")), Path(QStringLiteral("out.kar"))});
     EXPECT_EQ(compiled.status, 1);
     EXPECT_EQ(compiled.err.count('\n'), 3) << compiled.err.constData();
     EXPECT_TRUE(compiled.err.contains("line 2, string 1: character 3 U+30C8")) << compiled.err.constData();

@@ -13,8 +13,8 @@ TEST(ListingTool, KitsPlatformsAndTargetsComeFromTheEnvironment)
 {
     QTemporaryDir dir;
     const QString root = dir.path();
-    for (const char *folder : {"platforms/Alpha Pro/pvs/platform", "platforms/Beta", "platforms/Gamma pro",
-                               "tests/kit1", "tests/kit2"})
+    for (const char *folder :
+         {"platforms/Alpha Pro/pvs/platform", "platforms/Beta", "platforms/Gamma pro", "tests/kit1", "tests/kit2"})
         QDir().mkpath(root + QLatin1Char('/') + QLatin1String(folder));
     testutil::WriteFile(root + QStringLiteral("/handsets/zeta/handset.ini"), "[General]\ndescription=Second phone\n");
     testutil::WriteFile(root + QStringLiteral("/handsets/alpha/handset.ini"), "[General]\nplatform=arm\n");
@@ -29,8 +29,7 @@ TEST(ListingTool, KitsPlatformsAndTargetsComeFromTheEnvironment)
 
     const ToolResult kits = RunTool({QStringLiteral("kits")}, env);
     ASSERT_EQ(kits.status, 0) << kits.err.constData();
-    EXPECT_EQ(QString::fromUtf8(kits.out),
-              QStringLiteral("  kit1\t%1/tests/kit1\n* kit2\t%1/tests/kit2\n").arg(root));
+    EXPECT_EQ(QString::fromUtf8(kits.out), QStringLiteral("  kit1\t%1/tests/kit1\n* kit2\t%1/tests/kit2\n").arg(root));
 
     const ToolResult platforms = RunTool({QStringLiteral("platforms")}, env);
     ASSERT_EQ(platforms.status, 0);

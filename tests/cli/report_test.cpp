@@ -13,18 +13,17 @@
 
 namespace {
 
-const char kResults[] =
-    "<testmodules kvkHash=\"#1\" platformHash=\"\">\n"
-    " <module family=\"media\" id_hash=\"#5\" name=\"audio\" source=\"KVK\" subfamily=\"mp3\">\n"
-    "  <testcase name=\"play\" result=\"pass\"/>\n"
-    "  <testcase name=\"seek\" result=\"fail\"/>\n"
-    "  <testcase name=\"loop &amp; stop\" result=\"unsupported\"/>\n"
-    "  <testcase name=\"eject\" result=\"unexecuted\"/>\n"
-    " </module>\n"
-    " <module family=\"net\" id_hash=\"#6\" name=\"socket\" source=\"PVS\" subfamily=\"\">\n"
-    "  <testcase name=\"open\" result=\"unexecuted\"/>\n"
-    " </module>\n"
-    "</testmodules>\n";
+const char kResults[] = "<testmodules kvkHash=\"#1\" platformHash=\"\">\n"
+                        " <module family=\"media\" id_hash=\"#5\" name=\"audio\" source=\"KVK\" subfamily=\"mp3\">\n"
+                        "  <testcase name=\"play\" result=\"pass\"/>\n"
+                        "  <testcase name=\"seek\" result=\"fail\"/>\n"
+                        "  <testcase name=\"loop &amp; stop\" result=\"unsupported\"/>\n"
+                        "  <testcase name=\"eject\" result=\"unexecuted\"/>\n"
+                        " </module>\n"
+                        " <module family=\"net\" id_hash=\"#6\" name=\"socket\" source=\"PVS\" subfamily=\"\">\n"
+                        "  <testcase name=\"open\" result=\"unexecuted\"/>\n"
+                        " </module>\n"
+                        "</testmodules>\n";
 
 class ReportTool : public ::testing::Test
 {
@@ -44,8 +43,7 @@ TEST_F(ReportTool, SummarisesExecutedModulesAndFailsWhenATestCaseFailed)
     const ToolResult r = RunTool({QStringLiteral("report"), results});
     EXPECT_EQ(r.status, 1) << r.err.constData();
     const QString out = QString::fromUtf8(r.out);
-    EXPECT_TRUE(out.contains(QRegularExpression(QStringLiteral("audio\\s+1\\s+1\\s+1\\s+1\\n"))))
-        << r.out.constData();
+    EXPECT_TRUE(out.contains(QRegularExpression(QStringLiteral("audio\\s+1\\s+1\\s+1\\s+1\\n")))) << r.out.constData();
     EXPECT_FALSE(out.contains(QLatin1String("socket")));
     EXPECT_TRUE(out.contains(QRegularExpression(QStringLiteral("Total \\(1 module\\)\\s+1\\s+1\\s+1\\s+1"))));
 
@@ -56,7 +54,8 @@ TEST_F(ReportTool, SummarisesExecutedModulesAndFailsWhenATestCaseFailed)
 TEST_F(ReportTool, JUnitReportReadsBackAndIsWellFormed)
 {
     const QString junit = dir.filePath(QStringLiteral("junit.xml"));
-    const ToolResult r = RunTool({QStringLiteral("report"), QStringLiteral("--all"), QStringLiteral("--junit"), junit, results});
+    const ToolResult r
+        = RunTool({QStringLiteral("report"), QStringLiteral("--all"), QStringLiteral("--junit"), junit, results});
     ASSERT_EQ(r.status, 1) << r.err.constData();
 
     QDomDocument doc;
@@ -101,7 +100,8 @@ TEST_F(ReportTool, UnreadableOrForeignFilesAreUsageErrors)
 {
     testutil::WriteFile(dir.filePath(QStringLiteral("cut.xml")), QByteArray(kResults).left(100));
     testutil::WriteFile(dir.filePath(QStringLiteral("other.xml")), "<manifest/>");
-    for (const QString &name : {QStringLiteral("cut.xml"), QStringLiteral("other.xml"), QStringLiteral("missing.xml")}) {
+    for (const QString &name :
+         {QStringLiteral("cut.xml"), QStringLiteral("other.xml"), QStringLiteral("missing.xml")}) {
         const ToolResult r = RunTool({QStringLiteral("report"), dir.filePath(name)});
         EXPECT_EQ(r.status, 2) << name.toStdString();
         EXPECT_TRUE(r.err.startsWith("harness report: ")) << r.err.constData();

@@ -13,9 +13,9 @@
 #include <QProcess>
 #include <QRegularExpression>
 #include <QSet>
+#include <QStandardPaths>
 #include <QTemporaryDir>
 #include <QThread>
-#include <QStandardPaths>
 #include <QUrl>
 
 #include <gtest/gtest.h>
@@ -76,12 +76,15 @@ protected:
     static QMap<QString, QString> Rows(const QByteArray &out)
     {
         QMap<QString, QString> rows;
-        static const QRegularExpression row(QStringLiteral("^(\\w+)\\s+([\\w-]*)\\s+(\\d+)\\s+(\\d+)\\s+(\\d+)\\s+(\\d+)$"));
+        static const QRegularExpression row(
+            QStringLiteral("^(\\w+)\\s+([\\w-]*)\\s+(\\d+)\\s+(\\d+)\\s+(\\d+)\\s+(\\d+)$"));
         for (const QString &text : QString::fromUtf8(out).split(QLatin1Char('\n'))) {
             const QRegularExpressionMatch m = row.match(text);
             if (m.hasMatch())
-                rows.insert(m.captured(1), QStringList{m.captured(2), m.captured(3), m.captured(4), m.captured(5), m.captured(6)}
-                                               .join(QLatin1Char(' ')).trimmed());
+                rows.insert(m.captured(1),
+                            QStringList{m.captured(2), m.captured(3), m.captured(4), m.captured(5), m.captured(6)}
+                                .join(QLatin1Char(' '))
+                                .trimmed());
         }
         return rows;
     }
@@ -94,7 +97,9 @@ protected:
         QByteArray lint;
         EXPECT_EQ(testutil::RunProgram(QStringLiteral("xmllint"),
                                        {QStringLiteral("--noout"), QStringLiteral("--schema"),
-                                        testutil::DataPath(QStringLiteral("junit/junit.xsd")), path}, &lint), 0)
+                                        testutil::DataPath(QStringLiteral("junit/junit.xsd")), path},
+                                       &lint),
+                  0)
             << lint.constData();
     }
 
@@ -129,7 +134,7 @@ TEST_F(DemoRun, ReportsEveryModuleOfThisRunWithItsHandsetTimesAndLogs)
     const QString json = dir.filePath(QStringLiteral("summary.json"));
     const ToolResult r = Tool({QStringLiteral("run"), QStringLiteral("--test-data"), testData,
                                QStringLiteral("--junit"), junit, QStringLiteral("--json"), json});
-    EXPECT_EQ(r.status, 1) << r.err.constData();  // some demo test cases fail on purpose
+    EXPECT_EQ(r.status, 1) << r.err.constData(); // some demo test cases fail on purpose
     const QMap<QString, QString> rows = Rows(r.out);
     EXPECT_EQ(rows.value(QStringLiteral("ITimer")), QStringLiteral("demo-phone 3 1 1 0")) << r.out.constData();
     EXPECT_EQ(rows.value(QStringLiteral("IClock")), QStringLiteral("demo-phone 3 0 0 0"));
@@ -148,12 +153,14 @@ TEST_F(DemoRun, ReportsEveryModuleOfThisRunWithItsHandsetTimesAndLogs)
     EXPECT_EQ(timer.attribute(QStringLiteral("name")), QStringLiteral("ITimer"));
     EXPECT_EQ(timer.attribute(QStringLiteral("hostname")), QStringLiteral("demo-phone"));
     EXPECT_FALSE(timer.attribute(QStringLiteral("timestamp")).isEmpty());
-    const QString message = timer.elementsByTagName(QStringLiteral("failure")).at(0).toElement().attribute(QStringLiteral("message"));
+    const QString message
+        = timer.elementsByTagName(QStringLiteral("failure")).at(0).toElement().attribute(QStringLiteral("message"));
     EXPECT_TRUE(message.contains(QLatin1String("Test: Expiry / Result: FAIL"))) << message.toStdString();
     EXPECT_TRUE(message.contains(QLatin1String("/Logs/ITimer-"))) << message.toStdString();
     // The unit test log gives each test case's time.
     const QDomElement sockets = suites.elementsByTagName(QStringLiteral("testsuite")).at(5).toElement();
-    EXPECT_EQ(sockets.firstChildElement(QStringLiteral("testcase")).attribute(QStringLiteral("time")), QStringLiteral("0.007"));
+    EXPECT_EQ(sockets.firstChildElement(QStringLiteral("testcase")).attribute(QStringLiteral("time")),
+              QStringLiteral("0.007"));
 
     const QJsonObject summary = QJsonDocument::fromJson(testutil::ReadFile(json)).object();
     EXPECT_FALSE(summary.value(QStringLiteral("start")).toString().isEmpty());
@@ -163,16 +170,23 @@ TEST_F(DemoRun, ReportsEveryModuleOfThisRunWithItsHandsetTimesAndLogs)
     EXPECT_GE(first.value(QStringLiteral("durationMs")).toInteger(-1), 0);
 
     // "-" is standard output, and the summary then goes to standard error.
-    const ToolResult toOutput = Tool({QStringLiteral("run"), QStringLiteral("IClock"), QStringLiteral("--json"), QStringLiteral("-")});
+    const ToolResult toOutput
+        = Tool({QStringLiteral("run"), QStringLiteral("IClock"), QStringLiteral("--json"), QStringLiteral("-")});
     EXPECT_EQ(toOutput.status, 0) << toOutput.err.constData();
-    EXPECT_EQ(QJsonDocument::fromJson(toOutput.out).object().value(QStringLiteral("totals")).toObject().value(QStringLiteral("passed")).toInt(), 3)
+    EXPECT_EQ(QJsonDocument::fromJson(toOutput.out)
+                  .object()
+                  .value(QStringLiteral("totals"))
+                  .toObject()
+                  .value(QStringLiteral("passed"))
+                  .toInt(),
+              3)
         << toOutput.out.constData();
     EXPECT_FALSE(QFile::exists(dir.filePath(QStringLiteral("-"))));
 }
 
 TEST_F(DemoRun, AHandsetLostMidRunReportsErrorsNotAnEarlierRunsVerdicts)
 {
-    ASSERT_EQ(Tool({QStringLiteral("run")}).status, 1);  // a history where every module ran
+    ASSERT_EQ(Tool({QStringLiteral("run")}).status, 1); // a history where every module ran
     AddToIni(QStringLiteral("demo-phone"), "offlineAfter=12\n");
     const QString junit = dir.filePath(QStringLiteral("junit.xml"));
     const ToolResult lost = Tool({QStringLiteral("run"), QStringLiteral("--junit"), junit});
@@ -193,7 +207,7 @@ TEST_F(DemoRun, AHandsetLostMidRunReportsErrorsNotAnEarlierRunsVerdicts)
 TEST_F(DemoRun, AnInterruptedRunEndsTheModuleInHandAndReportsTheRest)
 {
     const QString junit = dir.filePath(QStringLiteral("junit.xml"));
-    env.insert(QStringLiteral("KESTIX_TIME_SCALE"), QStringLiteral("0.2"));  // time to stop it mid-run
+    env.insert(QStringLiteral("KESTIX_TIME_SCALE"), QStringLiteral("0.2")); // time to stop it mid-run
     for (const int stops : {1, 2}) {
         SCOPED_TRACE(stops);
         QProcess tool;
@@ -230,7 +244,8 @@ TEST_F(DemoRun, AnInterruptedRunEndsTheModuleInHandAndReportsTheRest)
             continue;
         }
         EXPECT_TRUE(out.contains("interrupted before it ran")) << out.constData() << err.constData();
-        EXPECT_TRUE(QString::fromUtf8(out).contains(QRegularExpression(QStringLiteral("\nIClock +demo-phone +3 +0 +0 +0\n"))));
+        EXPECT_TRUE(
+            QString::fromUtf8(out).contains(QRegularExpression(QStringLiteral("\nIClock +demo-phone +3 +0 +0 +0\n"))));
         EXPECT_EQ(Installed(QStringLiteral("demo-phone")), QStringList());
         ExpectValidJUnit(junit);
         EXPECT_GT(ReadXml(junit).attribute(QStringLiteral("errors")).toInt(), 0);
@@ -245,13 +260,15 @@ TEST_F(DemoRun, OneRunAtATimeOnAHandsetUnlessAskedToWait)
     ASSERT_TRUE(held.tryLock(0));
     const ToolResult busy = Tool({QStringLiteral("run"), QStringLiteral("IClock")});
     EXPECT_EQ(busy.status, 2);
-    EXPECT_TRUE(busy.err.contains(QStringLiteral("handset demo-phone is in use by process %1").arg(QCoreApplication::applicationPid()).toUtf8()))
+    EXPECT_TRUE(busy.err.contains(
+        QStringLiteral("handset demo-phone is in use by process %1").arg(QCoreApplication::applicationPid()).toUtf8()))
         << busy.err.constData();
     EXPECT_FALSE(busy.out.contains("Total"));
 
     QProcess waiting;
     waiting.setProcessEnvironment(env);
-    waiting.start(QStringLiteral(HARNESS_BINARY_DIR "/harness"), WithLog({QStringLiteral("run"), QStringLiteral("--wait"), QStringLiteral("IClock")}));
+    waiting.start(QStringLiteral(HARNESS_BINARY_DIR "/harness"),
+                  WithLog({QStringLiteral("run"), QStringLiteral("--wait"), QStringLiteral("IClock")}));
     waiting.setReadChannel(QProcess::StandardError);
     ASSERT_TRUE(waiting.waitForStarted());
     QByteArray err;
@@ -267,19 +284,24 @@ TEST_F(DemoRun, OneRunAtATimeOnAHandsetUnlessAskedToWait)
 TEST_F(DemoRun, TheNamedHandsetIsTheOneUsed)
 {
     AddHandset(QStringLiteral("demo-phone2"));
-    const ToolResult exact = Tool({QStringLiteral("run"), QStringLiteral("--target"), QStringLiteral("demo-phone"), QStringLiteral("IClock")});
+    const ToolResult exact = Tool(
+        {QStringLiteral("run"), QStringLiteral("--target"), QStringLiteral("demo-phone"), QStringLiteral("IClock")});
     EXPECT_EQ(exact.status, 0) << exact.err.constData();
     EXPECT_EQ(Rows(exact.out).value(QStringLiteral("IClock")), QStringLiteral("demo-phone 3 0 0 0"));
 
-    const ToolResult several = Tool({QStringLiteral("run"), QStringLiteral("--target"), QStringLiteral("phone"), QStringLiteral("IClock")});
+    const ToolResult several
+        = Tool({QStringLiteral("run"), QStringLiteral("--target"), QStringLiteral("phone"), QStringLiteral("IClock")});
     EXPECT_EQ(several.status, 2);
-    EXPECT_TRUE(several.err.contains("'phone' matches several handsets: demo-phone, demo-phone2")) << several.err.constData();
+    EXPECT_TRUE(several.err.contains("'phone' matches several handsets: demo-phone, demo-phone2"))
+        << several.err.constData();
 
     testutil::WriteFile(handsets + QStringLiteral("/demo-phone/offline"), "");
-    const ToolResult offline = Tool({QStringLiteral("run"), QStringLiteral("--target"), QStringLiteral("demo-phone"), QStringLiteral("IClock")});
+    const ToolResult offline = Tool(
+        {QStringLiteral("run"), QStringLiteral("--target"), QStringLiteral("demo-phone"), QStringLiteral("IClock")});
     EXPECT_EQ(offline.status, 2);
     EXPECT_TRUE(offline.err.contains("handset demo-phone is offline")) << offline.err.constData();
-    EXPECT_FALSE(QFileInfo::exists(targets + QStringLiteral("/demo-phone2/Logs/ProcessedResults/ProcessedResults.xml")));
+    EXPECT_FALSE(
+        QFileInfo::exists(targets + QStringLiteral("/demo-phone2/Logs/ProcessedResults/ProcessedResults.xml")));
 }
 
 TEST_F(DemoRun, AnUnreadableHistoryIsSaidOutLoud)
@@ -288,11 +310,13 @@ TEST_F(DemoRun, AnUnreadableHistoryIsSaidOutLoud)
     testutil::WriteFile(results, testutil::ReadFile(results).left(60));
     const ToolResult retry = Tool({QStringLiteral("run"), QStringLiteral("--retry")});
     EXPECT_EQ(retry.status, 2);
-    EXPECT_TRUE(retry.err.contains("cannot retry: the processed results of demo-phone are unreadable")) << retry.err.constData();
+    EXPECT_TRUE(retry.err.contains("cannot retry: the processed results of demo-phone are unreadable"))
+        << retry.err.constData();
 
     const ToolResult run = Tool({QStringLiteral("run"), QStringLiteral("IClock")});
     EXPECT_EQ(run.status, 0) << run.err.constData();
-    const QRegularExpressionMatch kept = QRegularExpression(QStringLiteral("were kept as (\\S+)")).match(QString::fromUtf8(run.out));
+    const QRegularExpressionMatch kept
+        = QRegularExpression(QStringLiteral("were kept as (\\S+)")).match(QString::fromUtf8(run.out));
     ASSERT_TRUE(kept.hasMatch()) << run.out.constData();
     EXPECT_EQ(testutil::ReadFile(kept.captured(1)).size(), 60);
 }
@@ -302,7 +326,8 @@ TEST_F(DemoRun, SetUpFailuresAndBadFiltersAreRefusedBeforeAnythingRuns)
     const QString missing = dir.filePath(QStringLiteral("missing/file"));
     testutil::WriteFile(dir.filePath(QStringLiteral("a-file")), "x");
     QDir().mkpath(dir.filePath(QStringLiteral("empty")));
-    const struct {
+    const struct
+    {
         QStringList arguments;
         const char *variable;
         QString value;
@@ -311,21 +336,46 @@ TEST_F(DemoRun, SetUpFailuresAndBadFiltersAreRefusedBeforeAnythingRuns)
         {{QStringLiteral("run"), QStringLiteral("--test-data"), missing}, nullptr, {}, "--test-data: "},
         {{QStringLiteral("run"), QStringLiteral("--dpk"), missing}, nullptr, {}, "--dpk: "},
         {{QStringLiteral("run")}, "KESTIX_TOOLSET", missing, "tool set"},
-        {{QStringLiteral("run"), QStringLiteral("--run-option"), QStringLiteral("bogus")}, nullptr, {}, "unknown --run-option 'bogus'"},
+        {{QStringLiteral("run"), QStringLiteral("--run-option"), QStringLiteral("bogus")},
+         nullptr,
+         {},
+         "unknown --run-option 'bogus'"},
         {{QStringLiteral("run"), QStringLiteral("--features"), missing}, nullptr, {}, "feature list"},
         {{QStringLiteral("run")}, "KESTIX_DATA_ROOT", dir.filePath(QStringLiteral("a-file")), "is not a folder"},
         {{QStringLiteral("run"), QStringLiteral("--junit"), missing}, nullptr, {}, "cannot write --junit"},
         {{QStringLiteral("run"), QStringLiteral("--json"), missing}, nullptr, {}, "cannot write --json"},
         {{QStringLiteral("run"), QStringLiteral("--copy-delay"), QStringLiteral("soon")}, nullptr, {}, "--copy-delay"},
-        {{QStringLiteral("modules"), QStringLiteral("--kit"), QStringLiteral("nowhere")}, nullptr, {}, "no test kit 'nowhere'"},
-        {{QStringLiteral("run"), QStringLiteral("IClock"), QStringLiteral("Nope")}, nullptr, {}, "no module matches 'Nope'"},
-        {{QStringLiteral("run"), QStringLiteral("--family"), QStringLiteral("media"), QStringLiteral("I*")}, nullptr, {}, "no module matches 'I*' in family 'media'"},
-        {{QStringLiteral("run"), QStringLiteral("--subfamily"), QStringLiteral("timer")}, nullptr, {}, "--subfamily needs --family"},
-        {{QStringLiteral("run"), QStringLiteral("--test-cases"), QStringLiteral("Nope,ReadClock"), QStringLiteral("IClock")}, nullptr, {}, "has no test case 'Nope'"},
-        {{QStringLiteral("run"), QStringLiteral("--target"), QStringLiteral("no-such-phone")}, nullptr, {}, "no handset matching 'no-such-phone'"},
+        {{QStringLiteral("modules"), QStringLiteral("--kit"), QStringLiteral("nowhere")},
+         nullptr,
+         {},
+         "no test kit 'nowhere'"},
+        {{QStringLiteral("run"), QStringLiteral("IClock"), QStringLiteral("Nope")},
+         nullptr,
+         {},
+         "no module matches 'Nope'"},
+        {{QStringLiteral("run"), QStringLiteral("--family"), QStringLiteral("media"), QStringLiteral("I*")},
+         nullptr,
+         {},
+         "no module matches 'I*' in family 'media'"},
+        {{QStringLiteral("run"), QStringLiteral("--subfamily"), QStringLiteral("timer")},
+         nullptr,
+         {},
+         "--subfamily needs --family"},
+        {{QStringLiteral("run"), QStringLiteral("--test-cases"), QStringLiteral("Nope,ReadClock"),
+          QStringLiteral("IClock")},
+         nullptr,
+         {},
+         "has no test case 'Nope'"},
+        {{QStringLiteral("run"), QStringLiteral("--target"), QStringLiteral("no-such-phone")},
+         nullptr,
+         {},
+         "no handset matching 'no-such-phone'"},
         {{QStringLiteral("run")}, "KESTIX_HANDSETS", dir.filePath(QStringLiteral("empty")), "no handset attached"},
         {{QStringLiteral("process")}, nullptr, {}, "--log-dir"},
-        {{QStringLiteral("process"), QStringLiteral("--log-dir"), dir.filePath(QStringLiteral("empty"))}, nullptr, {}, "no logs"},
+        {{QStringLiteral("process"), QStringLiteral("--log-dir"), dir.filePath(QStringLiteral("empty"))},
+         nullptr,
+         {},
+         "no logs"},
     };
     for (const auto &row : rows) {
         const QString trace = row.arguments.join(QLatin1Char(' ')) + QLatin1Char(' ') + QLatin1String(row.variable);
@@ -337,7 +387,7 @@ TEST_F(DemoRun, SetUpFailuresAndBadFiltersAreRefusedBeforeAnythingRuns)
         env = saved;
         EXPECT_EQ(r.status, 2) << r.out.constData();
         EXPECT_TRUE(r.err.contains(row.error)) << r.err.constData();
-        EXPECT_EQ(r.err.count('\n'), 1) << r.err.constData();  // one line, nothing else
+        EXPECT_EQ(r.err.count('\n'), 1) << r.err.constData(); // one line, nothing else
     }
     EXPECT_FALSE(QFileInfo::exists(targets + QStringLiteral("/demo-phone/Logs/ProcessedResults/ProcessedResults.xml")));
     EXPECT_EQ(Installed(QStringLiteral("demo-phone")), QStringList());
@@ -353,13 +403,15 @@ TEST_F(DemoRun, FiltersSelectWhatTheyName)
     ASSERT_EQ(modules.status, 0) << modules.err.constData();
     EXPECT_TRUE(modules.out.contains("ITimer\tctf\tsystem\ttimer\tKVK\t5\n")) << modules.out.constData();
     EXPECT_TRUE(modules.out.contains("PlatformVersion\tctf\tcore\tversion\tPVS\t2\n"));
-    EXPECT_FALSE(modules.out.contains("Helper"));  // secondary modules are never offered
+    EXPECT_FALSE(modules.out.contains("Helper")); // secondary modules are never offered
 
     const ToolResult family = Tool({QStringLiteral("run"), QStringLiteral("--family"), QStringLiteral("SYSTEM"),
                                     QStringLiteral("--subfamily"), QStringLiteral("timer"), QStringLiteral("I*")});
-    EXPECT_EQ(Rows(family.out).keys(), QStringList{QStringLiteral("ITimer")}) << family.out.constData() << family.err.constData();
+    EXPECT_EQ(Rows(family.out).keys(), QStringList{QStringLiteral("ITimer")})
+        << family.out.constData() << family.err.constData();
 
-    const ToolResult cases = Tool({QStringLiteral("run"), QStringLiteral("--test-cases"), QStringLiteral("ReadClock"), QStringLiteral("*clock")});
+    const ToolResult cases = Tool(
+        {QStringLiteral("run"), QStringLiteral("--test-cases"), QStringLiteral("ReadClock"), QStringLiteral("*clock")});
     EXPECT_EQ(cases.status, 0) << cases.err.constData();
 }
 
@@ -374,15 +426,18 @@ TEST_F(DemoRun, RetryAndProcessWorkFromTheHistory)
     const ToolResult retry = Tool({QStringLiteral("run"), QStringLiteral("--retry")});
     EXPECT_EQ(retry.status, 1);
     const QMap<QString, QString> rows = Rows(retry.out);
-    EXPECT_EQ(QStringList(rows.keys()), (QStringList{QStringLiteral("ITimer"), QStringLiteral("OatAudio"),
-                                                    QStringLiteral("Sockets"), QStringLiteral("Widgets")}))
+    EXPECT_EQ(QStringList(rows.keys()),
+              (QStringList{QStringLiteral("ITimer"), QStringLiteral("OatAudio"), QStringLiteral("Sockets"),
+                           QStringLiteral("Widgets")}))
         << retry.out.constData();
 
     const QString again = dir.filePath(QStringLiteral("again.xml"));
-    const ToolResult process = Tool({QStringLiteral("process"), QStringLiteral("--log-dir"), targets + QStringLiteral("/demo-phone/Logs"),
-                                     QStringLiteral("--results"), again});
-    EXPECT_EQ(process.status, 1) << process.err.constData() << process.out.constData();  // as report: a test case failed
-    EXPECT_TRUE(QString::fromUtf8(process.out).contains(QRegularExpression(QStringLiteral("ITimer\\s+3\\s+1\\s+1\\s+0\\n")))) << process.out.constData();
+    const ToolResult process = Tool({QStringLiteral("process"), QStringLiteral("--log-dir"),
+                                     targets + QStringLiteral("/demo-phone/Logs"), QStringLiteral("--results"), again});
+    EXPECT_EQ(process.status, 1) << process.err.constData() << process.out.constData(); // as report: a test case failed
+    EXPECT_TRUE(
+        QString::fromUtf8(process.out).contains(QRegularExpression(QStringLiteral("ITimer\\s+3\\s+1\\s+1\\s+0\\n"))))
+        << process.out.constData();
     EXPECT_TRUE(QFile::exists(again));
 }
 
@@ -396,20 +451,25 @@ TEST_F(DemoRun, ManifestKeepsBothCatalogues)
     EXPECT_TRUE(testutil::ReadFile(folder + QStringLiteral("/KVKManifest.xml")).contains("ITimer"));
     EXPECT_TRUE(testutil::ReadFile(folder + QStringLiteral("/PlatformManifest.xml")).contains("PlatformVersion"));
 
-    const ToolResult file = Tool({QStringLiteral("manifest"), QStringLiteral("-o"), dir.filePath(QStringLiteral("harness.log"))});
+    const ToolResult file
+        = Tool({QStringLiteral("manifest"), QStringLiteral("-o"), dir.filePath(QStringLiteral("harness.log"))});
     EXPECT_EQ(file.status, 2);
 }
 
 TEST_F(DemoRun, SharedRunsNameTheHandsetOfEachModule)
 {
-    AddHandset(QStringLiteral("demo-phone2"), "offlineAfter=1\n");  // lost with a module in hand
+    AddHandset(QStringLiteral("demo-phone2"), "offlineAfter=1\n"); // lost with a module in hand
     AddHandset(QStringLiteral("demo-phone3"));
     testutil::WriteFile(handsets + QStringLiteral("/demo-phone3/offline"), "");
-    const ToolResult r = Tool({QStringLiteral("run"), QStringLiteral("--verbose"), QStringLiteral("--all-targets"), QStringLiteral("--test-data"), testData});
+    const ToolResult r = Tool({QStringLiteral("run"), QStringLiteral("--verbose"), QStringLiteral("--all-targets"),
+                               QStringLiteral("--test-data"), testData});
     EXPECT_EQ(r.status, 1) << r.err.constData() << r.out.constData();
     // Every progress line and every library line names its handset.
     const QString out = QString::fromUtf8(r.out);
-    EXPECT_EQ(out.count(QRegularExpression(QStringLiteral("^\\[[1-6]/6\\] demo-phone  "), QRegularExpression::MultilineOption)), 6) << r.out.constData();
+    EXPECT_EQ(out.count(QRegularExpression(QStringLiteral("^\\[[1-6]/6\\] demo-phone  "),
+                                           QRegularExpression::MultilineOption)),
+              6)
+        << r.out.constData();
     EXPECT_TRUE(out.contains(QStringLiteral("handset lost; the module goes back to the queue"))) << r.out.constData();
     EXPECT_TRUE(r.err.contains("\ndemo-phone: Running KVK test ITimer")) << r.err.constData();
     EXPECT_TRUE(r.err.contains("\ndemo-phone2: Running ")) << r.err.constData();
@@ -437,7 +497,8 @@ TEST_F(DemoRun, ShardsOfOneSelectionMergeIntoTheVerdictsOfOneRun)
     bazel.insert(u"TEST_SHARD_INDEX"_s, u"0"_s);
     bazel.insert(u"TEST_TOTAL_SHARDS"_s, u"2"_s);
     bazel.insert(u"TEST_SHARD_STATUS_FILE"_s, status);
-    const ToolResult first = RunTool(WithLog({u"run"_s, u"--target"_s, u"demo-phone"_s, u"--test-data"_s, testData}), bazel, dir.path());
+    const ToolResult first
+        = RunTool(WithLog({u"run"_s, u"--target"_s, u"demo-phone"_s, u"--test-data"_s, testData}), bazel, dir.path());
     EXPECT_LE(first.status, 1) << first.err.constData();
     EXPECT_TRUE(QFile::exists(status));
     const ToolResult second = Tool({u"run"_s, u"--target"_s, u"other-phone"_s, u"--test-data"_s, testData,
@@ -447,9 +508,9 @@ TEST_F(DemoRun, ShardsOfOneSelectionMergeIntoTheVerdictsOfOneRun)
 
     const QString otherResults = targets + u"/other-phone/Logs/ProcessedResults/ProcessedResults.xml"_s;
     const QString timings = dir.filePath(u"timings.json"_s);
-    const ToolResult merged = Tool({u"report"_s, u"--merge"_s, results, otherResults, u"--expect-all"_s,
-                                    u"--save-timings"_s, timings});
-    EXPECT_EQ(merged.status, 1) << merged.err.constData();  // the demo's failures
+    const ToolResult merged
+        = Tool({u"report"_s, u"--merge"_s, results, otherResults, u"--expect-all"_s, u"--save-timings"_s, timings});
+    EXPECT_EQ(merged.status, 1) << merged.err.constData(); // the demo's failures
     const QMap<QString, QString> rows = Rows(merged.out);
     EXPECT_EQ(rows.size(), 6) << merged.out.constData();
     EXPECT_EQ(rows.value(u"ITimer"_s).section(u' ', 1), u"3 1 1 0"_s);
@@ -481,8 +542,9 @@ QByteArray OnTerminal(const QStringList &arguments, const QProcessEnvironment &e
     QProcess tool;
     tool.setProcessEnvironment(env);
     tool.setWorkingDirectory(folder);
-    tool.start(QStringLiteral("script"), {QStringLiteral("-q"), QStringLiteral("-e"), QStringLiteral("-c"),
-                                           quoted.join(QLatin1Char(' ')), QStringLiteral("/dev/null")});
+    tool.start(QStringLiteral("script"),
+               {QStringLiteral("-q"), QStringLiteral("-e"), QStringLiteral("-c"), quoted.join(QLatin1Char(' ')),
+                QStringLiteral("/dev/null")});
     tool.closeWriteChannel();
     if (!tool.waitForFinished(120000))
         return {};
@@ -497,12 +559,16 @@ void HangITimer(const QString &root)
     const QString package = folder + QStringLiteral("/ITimer_Win32_Release.kestix");
     const QString work = folder + QStringLiteral("/unpacked");
     ASSERT_TRUE(QDir().mkpath(work));
-    ASSERT_EQ(testutil::RunProgram(QStringLiteral("tar"), {QStringLiteral("-xf"), package, QStringLiteral("-C"), work}), 0);
+    ASSERT_EQ(testutil::RunProgram(QStringLiteral("tar"), {QStringLiteral("-xf"), package, QStringLiteral("-C"), work}),
+              0);
     const QString behaviour = work + QStringLiteral("/itimer/behaviour");
     QByteArray script = testutil::ReadFile(behaviour);
     ASSERT_TRUE(script.contains("echo '[/VERBOSE]'\n"));
     testutil::WriteFile(behaviour, script.replace("echo '[/VERBOSE]'\n", ""));
-    ASSERT_EQ(testutil::RunProgram(QStringLiteral("tar"), {QStringLiteral("-cf"), package, QStringLiteral("-C"), work, QStringLiteral("itimer")}), 0);
+    ASSERT_EQ(
+        testutil::RunProgram(QStringLiteral("tar"),
+                             {QStringLiteral("-cf"), package, QStringLiteral("-C"), work, QStringLiteral("itimer")}),
+        0);
     QDir(work).removeRecursively();
 }
 
@@ -511,10 +577,14 @@ TEST_F(DemoRun, ProgressShowsOneLinePerModuleAndColourOnlyOnATerminal)
     const ToolResult r = Tool({QStringLiteral("run"), QStringLiteral("--test-data"), testData});
     EXPECT_EQ(r.status, 1) << r.err.constData();
     const QString out = QString::fromUtf8(r.out);
-    static const QRegularExpression timer(QStringLiteral("\n\\[[1-6]/6\\] demo-phone  ITimer +3 passed 1 failed 1 unsupported  \\d+\\.\\d s\n"));
+    static const QRegularExpression timer(
+        QStringLiteral("\n\\[[1-6]/6\\] demo-phone  ITimer +3 passed 1 failed 1 unsupported  \\d+\\.\\d s\n"));
     EXPECT_TRUE(out.contains(timer)) << r.out.constData();
-    EXPECT_EQ(out.count(QRegularExpression(QStringLiteral("^\\[[1-6]/6\\] demo-phone  "), QRegularExpression::MultilineOption)), 6);
-    EXPECT_TRUE(out.contains(QRegularExpression(QStringLiteral("Total \\(6 modules\\).*\nElapsed: \\d+\\.\\d s\nSlowest: \\w+ \\d"))));
+    EXPECT_EQ(out.count(QRegularExpression(QStringLiteral("^\\[[1-6]/6\\] demo-phone  "),
+                                           QRegularExpression::MultilineOption)),
+              6);
+    EXPECT_TRUE(out.contains(
+        QRegularExpression(QStringLiteral("Total \\(6 modules\\).*\nElapsed: \\d+\\.\\d s\nSlowest: \\w+ \\d"))));
     EXPECT_FALSE(r.out.contains('\033'));
     // The library's own messages stay in its log unless asked for.
     EXPECT_FALSE(r.out.contains("Running KVK test") || r.err.contains("Running KVK test")) << r.err.constData();
@@ -540,24 +610,31 @@ TEST_F(DemoRun, AModulePastItsTimeoutIsStoppedRemovedAndReportedWhileTheRunGoesO
     HangITimer(root);
     const QString junit = dir.filePath(QStringLiteral("junit.xml"));
     // 150 s on the library's clock: instant at time scale 0.
-    const QStringList arguments{QStringLiteral("run"), QStringLiteral("--timeout"), QStringLiteral("150"),
-                                QStringLiteral("--junit"), junit, QStringLiteral("ITimer"), QStringLiteral("IClock")};
+    const QStringList arguments{
+        QStringLiteral("run"),    QStringLiteral("--timeout"), QStringLiteral("150"), QStringLiteral("--junit"), junit,
+        QStringLiteral("ITimer"), QStringLiteral("IClock")};
     const ToolResult r = Tool(arguments);
     EXPECT_EQ(r.status, 1) << r.err.constData();
-    EXPECT_TRUE(r.out.contains("Not finished: ITimer on demo-phone: stopped after its time limit of 150 s")) << r.out.constData();
+    EXPECT_TRUE(r.out.contains("Not finished: ITimer on demo-phone: stopped after its time limit of 150 s"))
+        << r.out.constData();
     EXPECT_EQ(Rows(r.out).value(QStringLiteral("IClock")), QStringLiteral("demo-phone 3 0 0 0"));
     // Off a terminal, a long module shows it is alive once a minute.
     const QString out = QString::fromUtf8(r.out);
-    EXPECT_EQ(out.count(QRegularExpression(QStringLiteral(R"(\n\[\.\.\.\] demo-phone  ITimer  still running: waiting for its log, [12] min \d+ s\n)"))), 2)
+    EXPECT_EQ(out.count(QRegularExpression(QStringLiteral(
+                  R"(\n\[\.\.\.\] demo-phone  ITimer  still running: waiting for its log, [12] min \d+ s\n)"))),
+              2)
         << r.out.constData();
     EXPECT_EQ(Installed(QStringLiteral("demo-phone")), QStringList());
     ExpectValidJUnit(junit);
     EXPECT_EQ(ReadXml(junit).attribute(QStringLiteral("errors")), QStringLiteral("5"));
 
     // On a terminal the same wait is a status line rewritten in place.
-    const QByteArray terminal = OnTerminal(WithLog({QStringLiteral("run"), QStringLiteral("--timeout"), QStringLiteral("20"), QStringLiteral("ITimer")}), env, dir.path());
+    const QByteArray terminal = OnTerminal(
+        WithLog({QStringLiteral("run"), QStringLiteral("--timeout"), QStringLiteral("20"), QStringLiteral("ITimer")}),
+        env, dir.path());
     if (testutil::HaveProgram(QStringLiteral("script"))) {
-        EXPECT_TRUE(QString::fromUtf8(terminal).contains(QRegularExpression(QStringLiteral("\r\033\\[KITimer on demo-phone: waiting for its log, 1\\d s"))))
+        EXPECT_TRUE(QString::fromUtf8(terminal).contains(
+            QRegularExpression(QStringLiteral("\r\033\\[KITimer on demo-phone: waiting for its log, 1\\d s"))))
             << terminal.constData();
         EXPECT_FALSE(terminal.contains("still running"));
     }
@@ -576,12 +653,15 @@ TEST_F(DemoRun, ADryRunSaysWhatWouldRunWhereAndInWhichOrderAndTouchesNothing)
     AddHandset(QStringLiteral("demo-phone2"));
     // Not even an offline handset is a reason to stop: nothing is connected.
     testutil::WriteFile(handsets + QStringLiteral("/demo-phone2/offline"), "");
-    const ToolResult r = Tool({QStringLiteral("run"), QStringLiteral("--dry-run"), QStringLiteral("--retry"), QStringLiteral("--timeout"), QStringLiteral("90"),
-                               QStringLiteral("--target"), QStringLiteral("demo-phone"), QStringLiteral("--target"), QStringLiteral("demo-phone2")});
+    const ToolResult r
+        = Tool({QStringLiteral("run"), QStringLiteral("--dry-run"), QStringLiteral("--retry"),
+                QStringLiteral("--timeout"), QStringLiteral("90"), QStringLiteral("--target"),
+                QStringLiteral("demo-phone"), QStringLiteral("--target"), QStringLiteral("demo-phone2")});
     EXPECT_EQ(r.status, 0) << r.err.constData();
     EXPECT_EQ(QString::fromUtf8(r.out),
               QStringLiteral("Dry run: nothing is installed or started.\n"
-                             "5 modules shared by demo-phone, demo-phone2 (one queue in this order; each handset takes the next module when it is free):\n"
+                             "5 modules shared by demo-phone, demo-phone2 (one queue in this order; each handset takes "
+                             "the next module when it is free):\n"
                              "1. ITimer           ctf  KVK  5 test cases\n"
                              "2. PlatformVersion  ctf  PVS  2 test cases\n"
                              "3. Widgets          ctfapplet  KVK  3 test cases\n"
@@ -590,7 +670,8 @@ TEST_F(DemoRun, ADryRunSaysWhatWouldRunWhereAndInWhichOrderAndTouchesNothing)
                              "--retry leaves out what the processed results show passed: IClock\n"
                              "A module still running after 90 s is stopped.\n"));
     EXPECT_EQ(testutil::ReadFile(results), before);
-    EXPECT_FALSE(QFileInfo::exists(targets + QStringLiteral("/demo-phone2/Logs/ProcessedResults/ProcessedResults.xml")));
+    EXPECT_FALSE(
+        QFileInfo::exists(targets + QStringLiteral("/demo-phone2/Logs/ProcessedResults/ProcessedResults.xml")));
     EXPECT_FALSE(QFileInfo::exists(targets + QStringLiteral("/demo-phone/run.lock")));
     EXPECT_EQ(Installed(QStringLiteral("demo-phone")), QStringList());
 }
@@ -615,8 +696,10 @@ TEST_F(DemoRun, TheHtmlReportOfARunCutShortShowsItsNotRunModules)
 TEST_F(DemoRun, TheHtmlReportEscapesNamesAndSaysThatNoHistoryIsRecorded)
 {
     const QString file = dir.filePath(QStringLiteral("results.xml"));
-    testutil::WriteFile(file, "<testmodules><module name=\"&lt;script&gt;alert(1)&lt;/script&gt;\" family=\"a&amp;b\" source=\"KVK\">"
-                              "<testcase name=\"&lt;img src=x onerror=alert(2)&gt;\" result=\"fail\"/></module></testmodules>");
+    testutil::WriteFile(
+        file,
+        "<testmodules><module name=\"&lt;script&gt;alert(1)&lt;/script&gt;\" family=\"a&amp;b\" source=\"KVK\">"
+        "<testcase name=\"&lt;img src=x onerror=alert(2)&gt;\" result=\"fail\"/></module></testmodules>");
     const QString html = dir.filePath(QStringLiteral("history.html"));
     const ToolResult r = RunTool({QStringLiteral("report"), file, QStringLiteral("--html"), html}, env, dir.path());
     EXPECT_EQ(r.status, 1) << r.err.constData();
@@ -626,7 +709,7 @@ TEST_F(DemoRun, TheHtmlReportEscapesNamesAndSaysThatNoHistoryIsRecorded)
     EXPECT_TRUE(page.contains(QStringLiteral("a&amp;b")));
     EXPECT_FALSE(page.contains(QStringLiteral("<script>alert")));
     EXPECT_FALSE(page.contains(QStringLiteral("<img")));
-    EXPECT_EQ(page.count(QStringLiteral("<script>")), 1);  // the page's own
+    EXPECT_EQ(page.count(QStringLiteral("<script>")), 1); // the page's own
     EXPECT_TRUE(page.contains(QStringLiteral("no history across runs is recorded")));
 }
 
@@ -635,10 +718,12 @@ TEST_F(DemoRun, TheHtmlReportWorksInARealBrowser)
 {
     QString chromium = QStandardPaths::findExecutable(QStringLiteral("chromium"));
     if (chromium.isEmpty())
-        GTEST_SKIP() << "headless browser test skipped: no 'chromium' on PATH (./run installs Debian's chromium package)";
+        GTEST_SKIP()
+            << "headless browser test skipped: no 'chromium' on PATH (./run installs Debian's chromium package)";
     AddHandset(QStringLiteral("demo-phone2"));
     const QString html = dir.filePath(QStringLiteral("report.html"));
-    const ToolResult r = Tool({QStringLiteral("run"), QStringLiteral("--all-targets"), QStringLiteral("--test-data"), testData, QStringLiteral("--html"), html});
+    const ToolResult r = Tool({QStringLiteral("run"), QStringLiteral("--all-targets"), QStringLiteral("--test-data"),
+                               testData, QStringLiteral("--html"), html});
     ASSERT_EQ(r.status, 1) << r.err.constData();
 
     // Every link is a relative one to a copied log, or one within the page.
@@ -650,22 +735,25 @@ TEST_F(DemoRun, TheHtmlReportWorksInARealBrowser)
         if (target.startsWith(QLatin1Char('#')))
             continue;
         EXPECT_TRUE(target.startsWith(QStringLiteral("demo/data/Norvane/Targets/demo-phone"))) << target.toStdString();
-        EXPECT_TRUE(QFileInfo(dir.filePath(QUrl::fromPercentEncoding(target.toUtf8()))).isFile()) << target.toStdString();
+        EXPECT_TRUE(QFileInfo(dir.filePath(QUrl::fromPercentEncoding(target.toUtf8()))).isFile())
+            << target.toStdString();
         ++logLinks;
     }
-    EXPECT_GE(logLinks, 7);  // Sockets has two
+    EXPECT_GE(logLinks, 7); // Sockets has two
 
     QTemporaryDir profile;
     ASSERT_TRUE(profile.isValid());
     // The page after its script ran; standard error holds its console.
     const auto browse = [&](const QStringList &what, const QString &fragment, QByteArray &err) {
         QProcess browser;
-        browser.start(chromium, QStringList{QStringLiteral("--headless"), QStringLiteral("--no-sandbox"), QStringLiteral("--disable-gpu"),
-                                            QStringLiteral("--disable-quic"), QStringLiteral("--no-first-run"),
-                                            QStringLiteral("--disable-background-networking"), QStringLiteral("--disable-component-update"),
-                                            QStringLiteral("--disable-sync"), QStringLiteral("--user-data-dir=") + profile.path(),
-                                            QStringLiteral("--enable-logging=stderr"), QStringLiteral("--v=0")}
-                                    + what + QStringList{QUrl::fromLocalFile(html).toString() + fragment});
+        browser.start(chromium,
+                      QStringList{QStringLiteral("--headless"), QStringLiteral("--no-sandbox"),
+                                  QStringLiteral("--disable-gpu"), QStringLiteral("--disable-quic"),
+                                  QStringLiteral("--no-first-run"), QStringLiteral("--disable-background-networking"),
+                                  QStringLiteral("--disable-component-update"), QStringLiteral("--disable-sync"),
+                                  QStringLiteral("--user-data-dir=") + profile.path(),
+                                  QStringLiteral("--enable-logging=stderr"), QStringLiteral("--v=0")}
+                          + what + QStringList{QUrl::fromLocalFile(html).toString() + fragment});
         if (!browser.waitForFinished(120000) || browser.exitCode() != 0) {
             browser.kill();
             browser.waitForFinished();
@@ -690,9 +778,11 @@ TEST_F(DemoRun, TheHtmlReportWorksInARealBrowser)
     EXPECT_FALSE(dom.contains(QStringLiteral("hidden=\"\"")));
 
     // "#failures" in the address leaves only the modules with a failure.
-    const QString failures = QString::fromUtf8(browse({QStringLiteral("--dump-dom")}, QStringLiteral("#failures"), console));
+    const QString failures
+        = QString::fromUtf8(browse({QStringLiteral("--dump-dom")}, QStringLiteral("#failures"), console));
     EXPECT_TRUE(failures.contains(QStringLiteral("data-filter=\"failures\""))) << failures.toStdString();
-    static const QRegularExpression row(QStringLiteral("<tr class=\"module\" data-module=\"(\\w+)\" data-ok=\"(\\d)\"( hidden=\"\")?>"));
+    static const QRegularExpression row(
+        QStringLiteral("<tr class=\"module\" data-module=\"(\\w+)\" data-ok=\"(\\d)\"( hidden=\"\")?>"));
     int shown = 0;
     for (QRegularExpressionMatchIterator it = row.globalMatch(failures); it.hasNext();) {
         const QRegularExpressionMatch m = it.next();

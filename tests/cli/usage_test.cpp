@@ -14,8 +14,8 @@ TEST(ToolUsage, HashPrintsTheStoredHashName)
 TEST(ToolUsage, BadUsageExitsWithTwoAndExplainsOnStandardError)
 {
     for (const QStringList &arguments :
-         {QStringList{}, QStringList{QStringLiteral("no-such-command")},
-          QStringList{QStringLiteral("hash")}, QStringList{QStringLiteral("hash"), QStringLiteral("--bogus"), QStringLiteral("x")}}) {
+         {QStringList{}, QStringList{QStringLiteral("no-such-command")}, QStringList{QStringLiteral("hash")},
+          QStringList{QStringLiteral("hash"), QStringLiteral("--bogus"), QStringLiteral("x")}}) {
         const ToolResult r = RunTool(arguments);
         EXPECT_EQ(r.status, 2) << arguments.join(QLatin1Char(' ')).toStdString();
         EXPECT_TRUE(r.out.isEmpty());

@@ -18,24 +18,25 @@ struct CleanCase
     const char *cleaned; // "" when refused
 };
 
-class HandsetPathClean : public ::testing::TestWithParam<CleanCase> {};
+class HandsetPathClean : public ::testing::TestWithParam<CleanCase>
+{
+};
 
 TEST_P(HandsetPathClean, KeepsPathsInsideTheFileSystemAndRefusesTheRest)
 {
     EXPECT_EQ(HandsetPath::Clean(QString::fromUtf8(GetParam().path)), QString::fromUtf8(GetParam().cleaned));
 }
 
-INSTANTIATE_TEST_SUITE_P(
-    Paths, HandsetPathClean,
-    ::testing::Values(CleanCase{"fs:/usermods/ctf/CTF.log", "fs:/usermods/ctf/CTF.log"},
-                      CleanCase{"fs:/usermods/oat/", "fs:/usermods/oat"},
-                      CleanCase{"fs:/a//b/./../c/", "fs:/a/c"},
-                      CleanCase{"fs:/", "fs:/"}, CleanCase{"fs:/a/..", "fs:/"},
-                      CleanCase{"fs:/../x", ""}, CleanCase{"fs:/a/../../x", ""},
-                      CleanCase{"fs:/..", ""}, CleanCase{"fs:", ""}, CleanCase{"FS:/a", ""},
-                      CleanCase{"/etc/passwd", ""}, CleanCase{"usermods/a", ""},
-                      CleanCase{"", ""}, CleanCase{"fs:/my file $x", "fs:/my file $x"}),
-    [](const auto &info) { return std::to_string(info.index); });
+INSTANTIATE_TEST_SUITE_P(Paths, HandsetPathClean,
+                         ::testing::Values(CleanCase{"fs:/usermods/ctf/CTF.log", "fs:/usermods/ctf/CTF.log"},
+                                           CleanCase{"fs:/usermods/oat/", "fs:/usermods/oat"},
+                                           CleanCase{"fs:/a//b/./../c/", "fs:/a/c"}, CleanCase{"fs:/", "fs:/"},
+                                           CleanCase{"fs:/a/..", "fs:/"}, CleanCase{"fs:/../x", ""},
+                                           CleanCase{"fs:/a/../../x", ""}, CleanCase{"fs:/..", ""},
+                                           CleanCase{"fs:", ""}, CleanCase{"FS:/a", ""}, CleanCase{"/etc/passwd", ""},
+                                           CleanCase{"usermods/a", ""}, CleanCase{"", ""},
+                                           CleanCase{"fs:/my file $x", "fs:/my file $x"}),
+                         [](const auto &info) { return std::to_string(info.index); });
 
 class HandsetPathHost : public ::testing::Test
 {

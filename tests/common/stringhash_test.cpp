@@ -12,7 +12,9 @@ struct HashCase
     unsigned int hash;
 };
 
-class StringHashTest : public ::testing::TestWithParam<HashCase> {};
+class StringHashTest : public ::testing::TestWithParam<HashCase>
+{
+};
 
 TEST_P(StringHashTest, MatchesTheStoredHashOfEveryCacheName)
 {
@@ -25,10 +27,8 @@ TEST_P(StringHashTest, MatchesTheStoredHashOfEveryCacheName)
 // (long inputs exercise the fold of the top nibble; the last one a
 // surrogate pair, hashed as two UTF-16 units).
 INSTANTIATE_TEST_SUITE_P(KnownValues, StringHashTest,
-                         ::testing::Values(HashCase{u"", 0}, HashCase{u"a", 97},
-                                           HashCase{u"ab", 1650},
-                                           HashCase{u"abcdefgh", 144355384},
-                                           HashCase{u"C:/kits/Test Kit 1", 19847025},
+                         ::testing::Values(HashCase{u"", 0}, HashCase{u"a", 97}, HashCase{u"ab", 1650},
+                                           HashCase{u"abcdefgh", 144355384}, HashCase{u"C:/kits/Test Kit 1", 19847025},
                                            HashCase{u"\U0001F600x", 15080824}),
                          [](const auto &info) { return std::to_string(info.index); });
 

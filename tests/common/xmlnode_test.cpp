@@ -158,9 +158,15 @@ TEST(XmlNode, AgreesWithTheFullReaderOnMutatedDocuments)
             const int at = random.bounded(int(bytes.size()));
             const char c = alphabet.at(random.bounded(int(alphabet.size())));
             switch (random.bounded(3)) {
-            case 0: bytes[at] = c; break;
-            case 1: bytes.insert(at, c); break;
-            default: bytes.remove(at, 1); break;
+            case 0:
+                bytes[at] = c;
+                break;
+            case 1:
+                bytes.insert(at, c);
+                break;
+            default:
+                bytes.remove(at, 1);
+                break;
             }
         }
         const std::unique_ptr<XmlNode> quick = XmlNodeTestAccess::ParseQuickly(bytes);

@@ -40,28 +40,30 @@ TEST(XmlWriter, OrdersAttributesByNameAndIndentsOneBlankPerLevel)
 
     EXPECT_EQ(XmlWriter::ToString(doc),
               u"<manifest>\n"
-                             " <module alpha=\"ALPHA\" b=\"B\" id=\"ID\" name=\"NAME\" type=\"TYPE\" zeta=\"ZETA\">\n"
-                             "  <testcase>Run &amp; &lt;check&gt;</testcase>\n"
-                             " </module>\n"
-                             "</manifest>\n"_s);
+              " <module alpha=\"ALPHA\" b=\"B\" id=\"ID\" name=\"NAME\" type=\"TYPE\" zeta=\"ZETA\">\n"
+              "  <testcase>Run &amp; &lt;check&gt;</testcase>\n"
+              " </module>\n"
+              "</manifest>\n"_s);
 }
 
 TEST(XmlWriter, WritesTheSameBytesInEveryProcess)
 {
     // Qt's own serialiser orders attributes by a per-process seed; two child
     // processes with different seeds must still agree with us.
-    const QString text = u"<a q=\"1\" w=\"2\" e=\"3\" r=\"4\" t=\"5\" y=\"6\" u=\"7\" i=\"8\"><b x=\"1\" y=\"2\"/></a>"_s;
+    const QString text
+        = u"<a q=\"1\" w=\"2\" e=\"3\" r=\"4\" t=\"5\" y=\"6\" u=\"7\" i=\"8\"><b x=\"1\" y=\"2\"/></a>"_s;
     const QByteArray ours = XmlWriter::Serialize(Parse(text));
-    EXPECT_EQ(ours, QByteArray("<a e=\"3\" i=\"8\" q=\"1\" r=\"4\" t=\"5\" u=\"7\" w=\"2\" y=\"6\">\n"
-                               " <b x=\"1\" y=\"2\"/>\n"
-                               "</a>\n"));
+    EXPECT_EQ(ours,
+              QByteArray("<a e=\"3\" i=\"8\" q=\"1\" r=\"4\" t=\"5\" u=\"7\" w=\"2\" y=\"6\">\n"
+                         " <b x=\"1\" y=\"2\"/>\n"
+                         "</a>\n"));
 }
 
 TEST(XmlWriter, KeepsOnlyTheNodesTheDocumentHolds)
 {
     EXPECT_FALSE(XmlWriter::ToString(Parse(u"<r/>"_s)).contains(QLatin1String("<?xml")));
-    const QString withDecl = XmlWriter::ToString(
-        Parse(u"<?xml version=\"1.0\" encoding=\"UTF-8\"?><r><!--c--><?pi x?></r>"_s));
+    const QString withDecl
+        = XmlWriter::ToString(Parse(u"<?xml version=\"1.0\" encoding=\"UTF-8\"?><r><!--c--><?pi x?></r>"_s));
     EXPECT_EQ(withDecl, u"<?xml version='1.0' encoding='UTF-8'?>\n<r>\n <!--c-->\n <?pi x?>\n</r>\n"_s);
 }
 
@@ -114,15 +116,16 @@ TEST(XmlWriter, OutputIsWellFormedForXmllint)
 
 TEST(XmlWriterDeclarations, DocumentTypeFollowsTheXmlDeclarationWithEntitiesByName)
 {
-    const QDomDocument doc = Parse(u"<?xml version=\"1.0\"?>\n"
-        "<!DOCTYPE pack [<!ENTITY zz SYSTEM \"z.xml\"><!ENTITY aa PUBLIC \"-//A//X\" \"a.xml\">"
-        "<!ENTITY mm SYSTEM \"m.xml\">]>\n"
-        "<!--note--><pack/>"_s);
+    const QDomDocument doc
+        = Parse(u"<?xml version=\"1.0\"?>\n"
+                "<!DOCTYPE pack [<!ENTITY zz SYSTEM \"z.xml\"><!ENTITY aa PUBLIC \"-//A//X\" \"a.xml\">"
+                "<!ENTITY mm SYSTEM \"m.xml\">]>\n"
+                "<!--note--><pack/>"_s);
     const QString expected = u"<?xml version='1.0'?>\n"
-                                            "<!DOCTYPE pack [\n"
-                                            "<!ENTITY aa PUBLIC \"-//A//X\" \"a.xml\">\n"
-                                            "<!ENTITY mm SYSTEM \"m.xml\">\n"
-                                            "<!ENTITY zz SYSTEM \"z.xml\">\n]>\n<!--note-->\n<pack/>\n"_s;
+                             "<!DOCTYPE pack [\n"
+                             "<!ENTITY aa PUBLIC \"-//A//X\" \"a.xml\">\n"
+                             "<!ENTITY mm SYSTEM \"m.xml\">\n"
+                             "<!ENTITY zz SYSTEM \"z.xml\">\n]>\n<!--note-->\n<pack/>\n"_s;
     EXPECT_EQ(XmlWriter::ToString(doc), expected);
     // The same bytes from a fresh parse (declarations live in a seeded hash).
     EXPECT_EQ(XmlWriter::ToString(Parse(expected)), expected);
@@ -159,12 +162,15 @@ TEST(XmlWriterDeclarations, AsciiStringEscapesEverythingBeyondAscii)
     root.appendChild(doc.createCDATASection(QString()));
 
     const QString ascii = XmlWriter::ToAsciiString(doc);
-    EXPECT_EQ(ascii, u"<r v=\"&#xe9;&quot;&#x1f600;\">caf&#xe9; &amp; &#x65e5;"
-                                    "<![CDATA[a]]>&#xe9;<![CDATA[]]]]><![CDATA[>b]]><![CDATA[]]></r>\n"_s);
+    EXPECT_EQ(ascii,
+              u"<r v=\"&#xe9;&quot;&#x1f600;\">caf&#xe9; &amp; &#x65e5;"
+              "<![CDATA[a]]>&#xe9;<![CDATA[]]]]><![CDATA[>b]]><![CDATA[]]></r>\n"_s);
     // Read back, it holds the same text.
     const QDomDocument back = Parse(ascii);
     EXPECT_EQ(back.documentElement().attribute(u"v"_s), QString::fromUtf8("\xc3\xa9\"\xf0\x9f\x98\x80"));
-    EXPECT_EQ(back.documentElement().text(), QString::fromUtf8("caf\xc3\xa9 & \xe6\x97\xa5" "a\xc3\xa9]]>b"));
+    EXPECT_EQ(back.documentElement().text(),
+              QString::fromUtf8("caf\xc3\xa9 & \xe6\x97\xa5"
+                                "a\xc3\xa9]]>b"));
 }
 
 } // namespace
@@ -174,12 +180,13 @@ TEST(XmlWriterDeclarations, AsciiStringEscapesEverythingBeyondAscii)
 // nothing closes as an empty one.
 TEST(XmlWriterStream, PiecesGiveTheBytesOfTheWholeDocument)
 {
-    const QString text = u"<kit z=\"1\" a=\"x &amp; &quot;y&quot;\">"
-        "<modules>"
-        "<module n=\"1\" b=\"2\"><case name=\"t&lt;1&gt;\"/><case name=\"t2\">text &amp; more</case></module>"
-        "<module n=\"\u00e9\"/>"
-        "</modules>"
-        "<empty k=\"v\"/><frameworks><framework name=\"ctf\"><variant/></framework></frameworks></kit>"_s;
+    const QString text
+        = u"<kit z=\"1\" a=\"x &amp; &quot;y&quot;\">"
+          "<modules>"
+          "<module n=\"1\" b=\"2\"><case name=\"t&lt;1&gt;\"/><case name=\"t2\">text &amp; more</case></module>"
+          "<module n=\"\u00e9\"/>"
+          "</modules>"
+          "<empty k=\"v\"/><frameworks><framework name=\"ctf\"><variant/></framework></frameworks></kit>"_s;
     const QDomDocument whole = Parse(text);
 
     XmlWriter::DocumentStream out;
@@ -187,8 +194,7 @@ TEST(XmlWriterStream, PiecesGiveTheBytesOfTheWholeDocument)
     out.Open(kit);
     const QDomElement modules = kit.firstChildElement();
     out.Open(modules);
-    for (QDomElement module = modules.firstChildElement(); !module.isNull();
-         module = module.nextSiblingElement()) {
+    for (QDomElement module = modules.firstChildElement(); !module.isNull(); module = module.nextSiblingElement()) {
         // Each piece in a document of its own, as a caller builds it.
         QDomDocument piece;
         piece.appendChild(piece.importNode(module, true));

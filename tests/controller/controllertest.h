@@ -47,11 +47,7 @@ namespace controllertest {
 class ScriptedModule : public _TestModule
 {
 public:
-    explicit ScriptedModule(const QString &name, const QString &type = u"ctf"_s)
-        : m_type(type)
-    {
-        moduleName = name;
-    }
+    explicit ScriptedModule(const QString &name, const QString &type = u"ctf"_s) : m_type(type) { moduleName = name; }
 
     QString TestType() override { return m_type; }
     bool Run(IKestoDevice *, const QMap<QString, QString> &) override { return true; }

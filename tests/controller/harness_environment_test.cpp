@@ -11,9 +11,9 @@ using namespace Qt::StringLiterals;
 namespace {
 
 using harnesstest::CapturedLog;
-using testutil::CurrentDirectory;
 using harnesstest::SetModified;
 using harnesstest::Toolset;
+using testutil::CurrentDirectory;
 using testutil::EnvGuard;
 using testutil::ReadFile;
 using testutil::WriteFile;
@@ -29,7 +29,7 @@ const Env &EnvOf(const Harness &harness)
 class HarnessEnvironmentTest : public ::testing::Test
 {
 protected:
-    HarnessEnvironmentTest() : m_env("KESTIX_DATA_ROOT", m_root.filePath(u"data"_s)) {}
+    HarnessEnvironmentTest() : m_env("KESTIX_DATA_ROOT", m_root.filePath(u"data"_s)) { }
 
     void SetUp() override
     {
@@ -105,8 +105,7 @@ TEST_F(HarnessEnvironmentTest, RelativeAndAbsolutePathsShareOneCache)
     other.SetDPK(pack);
 
     for (const char *key : {"TestDataCachePath", "DevicePack", "DevicePackCachePath"})
-        EXPECT_EQ(EnvOf(m_harness).value(QLatin1String(key)), EnvOf(other).value(QLatin1String(key)))
-            << key;
+        EXPECT_EQ(EnvOf(m_harness).value(QLatin1String(key)), EnvOf(other).value(QLatin1String(key))) << key;
     EXPECT_EQ(EnvOf(other).value(u"DevicePack"_s), pack);
     // Each compiler ran once.
     EXPECT_EQ(m_toolset.Calls().size(), 2);
@@ -119,10 +118,11 @@ TEST_F(HarnessEnvironmentTest, InvalidSourcesAreReportedAndChangeNothing)
     m_harness.SetTestData(m_root.path());
     m_harness.SetDPK(QString());
     EXPECT_EQ(EnvOf(m_harness), before);
-    EXPECT_EQ(m_log.Text(), QStringLiteral("Test data %1 is not valid.\n"
-                                           "Test data %2 is not valid.\n"
-                                           "DPK  is not valid.\n")
-                                .arg(RootPath(u"missing.kar"_s), m_root.path()));
+    EXPECT_EQ(m_log.Text(),
+              QStringLiteral("Test data %1 is not valid.\n"
+                             "Test data %2 is not valid.\n"
+                             "DPK  is not valid.\n")
+                  .arg(RootPath(u"missing.kar"_s), m_root.path()));
 }
 
 TEST_F(HarnessEnvironmentTest, FailedTestDataCompileDropsTheCacheEntryAndTriesAgainNextTime)
@@ -138,9 +138,7 @@ TEST_F(HarnessEnvironmentTest, FailedTestDataCompileDropsTheCacheEntryAndTriesAg
     m_harness.SetTestData(source);
     EXPECT_FALSE(EnvOf(m_harness).contains(u"TestDataCachePath"_s));
     EXPECT_EQ(EnvOf(m_harness).value(u"TestDataSpecified"_s), u"true"_s);
-    EXPECT_EQ(m_log.Text(),
-              u"Resource Compile Error: %1 can not be compiled into %2.\n"_s
-                  .arg(source, cache));
+    EXPECT_EQ(m_log.Text(), u"Resource Compile Error: %1 can not be compiled into %2.\n"_s.arg(source, cache));
     EXPECT_FALSE(QFileInfo::exists(cache));
 
     m_toolset.InstallCompiler();
@@ -159,8 +157,7 @@ TEST_F(HarnessEnvironmentTest, DevicePackIsCompiledAndFlattened)
     m_harness.SetDPK(source);
     const Env &env = EnvOf(m_harness);
     EXPECT_EQ(env.value(u"DevicePack"_s), source);
-    EXPECT_EQ(env.value(u"DevicePackCachePath"_s),
-              TestDirectories::GetTestDataCacheFilePath(key));
+    EXPECT_EQ(env.value(u"DevicePackCachePath"_s), TestDirectories::GetTestDataCacheFilePath(key));
     const QString dso = TestDirectories::GetDSOCacheFilePath(key);
     EXPECT_EQ(env.value(u"DSOCacheFilePath"_s), dso);
     EXPECT_EQ(env.value(u"KeyDevicePackSpecified"_s), u"true"_s);
@@ -188,8 +185,8 @@ TEST_F(HarnessEnvironmentTest, DevicePackThatFailsKeepsItsOtherEntries)
     EXPECT_EQ(env.value(u"DevicePack"_s), source);
     EXPECT_EQ(env.value(u"DSOCacheFilePath"_s), source);
     EXPECT_EQ(env.value(u"KeyDevicePackSpecified"_s), u"true"_s);
-    EXPECT_TRUE(m_log.Text().endsWith(
-        u"Resource Compile Error: %1 can not be compiled into %2.\n"_s.arg(source, cache)));
+    EXPECT_TRUE(
+        m_log.Text().endsWith(u"Resource Compile Error: %1 can not be compiled into %2.\n"_s.arg(source, cache)));
     // The empty file the compiler left is not taken for a fresh cache.
     EXPECT_FALSE(QFileInfo::exists(cache));
     m_harness.SetDPK(source);
@@ -204,8 +201,8 @@ protected:
     void SetUp() override
     {
         HarnessEnvironmentTest::SetUp();
-        for (const char *dir : {"platforms/Alpha Pro", "platforms/Beta Pro", "platforms/Gamma",
-                                "kits/KitOne", "kits/KitTwo", "kits/Other"})
+        for (const char *dir : {"platforms/Alpha Pro", "platforms/Beta Pro", "platforms/Gamma", "kits/KitOne",
+                                "kits/KitTwo", "kits/Other"})
             ASSERT_TRUE(QDir().mkpath(RootPath(QLatin1String(dir))));
         m_vars.Set("KESTIX_PLATFORMS_ALL", RootPath(u"platforms"_s));
         m_vars.Set("KESTIX_PLATFORM", RootPath(u"platforms/Beta Pro/"_s));

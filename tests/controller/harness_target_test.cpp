@@ -1,6 +1,5 @@
 #include "harnesstest.h"
 
-
 #include "environment/testdirectories.h"
 
 using namespace Qt::StringLiterals;

@@ -42,10 +42,7 @@ using testutil::CapturedLog;
 class Toolset
 {
 public:
-    Toolset()
-        : m_env("KESTIX_TOOLSET", m_dir.path())
-    {
-    }
+    Toolset() : m_env("KESTIX_TOOLSET", m_dir.path()) { }
 
     QString Path() const { return m_dir.path(); }
     QString CompilerPath() const { return m_dir.filePath(u"bin/kestormc.exe"_s); }

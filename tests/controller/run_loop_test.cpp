@@ -26,8 +26,7 @@ class RecordingModule : public ScriptedModule
 {
 public:
     RecordingModule(const QString &name, const QString &type, QStringList *events)
-        : ScriptedModule(name, type)
-        , m_events(events)
+        : ScriptedModule(name, type), m_events(events)
     {
         source = u"KVK"_s;
         Report(name, {{name + u"_1"_s, u"pass"_s}});
@@ -76,11 +75,7 @@ private:
 class RecordingFramework : public _Framework
 {
 public:
-    RecordingFramework(const QString &frameworkName, QStringList *events)
-        : m_events(events)
-    {
-        name = frameworkName;
-    }
+    RecordingFramework(const QString &frameworkName, QStringList *events) : m_events(events) { name = frameworkName; }
     bool IsLoaded(IKestoDevice *) override { return onHandset; }
     bool Load(IKestoDevice *, QMap<QString, QString> &) override
     {
@@ -295,8 +290,12 @@ TEST_F(RunLoopTest, AModulePastTheTimeLimitIsRemovedUncopiedAndTheObserverSeesIt
     QSharedPointer<RecordingModule> stuck = Queue(QStringLiteral("Stuck"), QStringLiteral("ctf"));
     stuck->pollsNeeded = 1000000;
     QSharedPointer<RecordingModule> next = Queue(QStringLiteral("Zeta"), QStringLiteral("ctf"));
-    struct Watcher : RunObserver {
-        void ModuleStarted(const ModuleRecord &record) override { events.append(QStringLiteral("start ") + record.name); }
+    struct Watcher : RunObserver
+    {
+        void ModuleStarted(const ModuleRecord &record) override
+        {
+            events.append(QStringLiteral("start ") + record.name);
+        }
         void ModuleWaiting(const ModuleRecord &record, const QString &what, qint64 elapsedMs) override
         {
             EXPECT_GE(elapsedMs, lastElapsed);
@@ -319,8 +318,9 @@ TEST_F(RunLoopTest, AModulePastTheTimeLimitIsRemovedUncopiedAndTheObserverSeesIt
     EXPECT_TRUE(m_harness.Run());
     m_harness.SetRunObserver(nullptr);
 
-    EXPECT_EQ(watcher.events, (QStringList{QStringLiteral("start Stuck"), QStringLiteral("end Stuck"),
-                                           QStringLiteral("start Zeta"), QStringLiteral("end Zeta")}));
+    EXPECT_EQ(watcher.events,
+              (QStringList{QStringLiteral("start Stuck"), QStringLiteral("end Stuck"), QStringLiteral("start Zeta"),
+                           QStringLiteral("end Zeta")}));
     EXPECT_TRUE(watcher.waits.contains(QStringLiteral("Stuck its log")));
     const ModuleRecord timedOut = watcher.ended.value(QStringLiteral("Stuck"));
     EXPECT_EQ(timedOut.outcome, ModuleSource::TimedOut);
@@ -431,10 +431,7 @@ namespace {
 class ListingModule : public controllertest::ScriptedModule
 {
 public:
-    ListingModule()
-        : ScriptedModule(u"Lister"_s)
-    {
-    }
+    ListingModule() : ScriptedModule(u"Lister"_s) { }
     bool GetLogFilePaths(IKestoDevice *device, QStringList &paths) override
     {
         if (!device)
@@ -463,11 +460,7 @@ TEST_F(RunLoopTest, LogFilePathsComeFromTheModuleOnceConnected)
 class RecordingSource : public ModuleSource
 {
 public:
-    RecordingSource(const QList<QSharedPointer<_TestModule>> &modules, bool keep)
-        : m_modules(modules)
-        , m_keep(keep)
-    {
-    }
+    RecordingSource(const QList<QSharedPointer<_TestModule>> &modules, bool keep) : m_modules(modules), m_keep(keep) { }
     QSharedPointer<_TestModule> Next() override
     {
         return m_modules.isEmpty() ? QSharedPointer<_TestModule>() : m_modules.takeFirst();

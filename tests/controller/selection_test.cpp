@@ -141,16 +141,16 @@ TEST_P(BadFeatureFileTest, SelectsNothingAndSaysWhy)
     EXPECT_TRUE(message.match(m_log.Text()).hasMatch()) << m_log.Text().toStdString();
 }
 
-INSTANTIATE_TEST_SUITE_P(
-    Files, BadFeatureFileTest,
-    ::testing::Values(BadFeatureFile{"Missing", nullptr, "BFS File %1 not found\\."},
-                      BadFeatureFile{"Truncated", "<features><feature testModule=\"Foo\">",
-                                     "Error Parsing BFS File %1, Error:.+ Line:1 Column:\\d+"},
-                      BadFeatureFile{"Mismatched", "<features>\n<feature testModule=\"Foo\">\n</x>",
-                                     "Error Parsing BFS File %1, Error:.+ Line:3 Column:\\d+"},
-                      BadFeatureFile{"NoFeatures", "<features><module name=\"Foo\"/></features>",
-                                     "No testcases in BFS File %1\\."}),
-    [](const ::testing::TestParamInfo<BadFeatureFile> &info) { return info.param.name; });
+INSTANTIATE_TEST_SUITE_P(Files, BadFeatureFileTest,
+                         ::testing::Values(BadFeatureFile{"Missing", nullptr, "BFS File %1 not found\\."},
+                                           BadFeatureFile{"Truncated", "<features><feature testModule=\"Foo\">",
+                                                          "Error Parsing BFS File %1, Error:.+ Line:1 Column:\\d+"},
+                                           BadFeatureFile{"Mismatched",
+                                                          "<features>\n<feature testModule=\"Foo\">\n</x>",
+                                                          "Error Parsing BFS File %1, Error:.+ Line:3 Column:\\d+"},
+                                           BadFeatureFile{"NoFeatures", "<features><module name=\"Foo\"/></features>",
+                                                          "No testcases in BFS File %1\\."}),
+                         [](const ::testing::TestParamInfo<BadFeatureFile> &info) { return info.param.name; });
 
 // ---- Catalogues of real kits ----
 

@@ -192,7 +192,8 @@ TEST_F(ShardedRunTest, WhenEveryHandsetIsGoneTheModulesLeftAreListed)
     EXPECT_EQ(notRun.size(), kCtfModules + kAppletModules - 1);
     for (const ShardedRun::ModuleResult &module : run.Modules())
         EXPECT_EQ(module.ran, !notRun.contains(module.name)) << module.name.toStdString();
-    EXPECT_TRUE(m_run.LogText().contains(u"Every handset has dropped out; %1 modules never ran: "_s.arg(notRun.size())));
+    EXPECT_TRUE(
+        m_run.LogText().contains(u"Every handset has dropped out; %1 modules never ran: "_s.arg(notRun.size())));
 }
 
 TEST_F(ShardedRunTest, NothingToRunOrNoHandsetIsRefused)

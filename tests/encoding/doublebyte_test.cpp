@@ -16,16 +16,22 @@ QString Decode(KestoEncodingFormat format, const QByteArray &bytes, const QStrin
     return out;
 }
 
-struct DecodeCase {
+struct DecodeCase
+{
     const char *what;
     KestoEncodingFormat format;
     QByteArray in;
     QString out;
 };
 
-void PrintTo(const DecodeCase &c, std::ostream *os) { *os << c.what; }
+void PrintTo(const DecodeCase &c, std::ostream *os)
+{
+    *os << c.what;
+}
 
-class DecodeBlock : public ::testing::TestWithParam<DecodeCase> {};
+class DecodeBlock : public ::testing::TestWithParam<DecodeCase>
+{
+};
 
 TEST_P(DecodeBlock, AppendsToOutput)
 {
@@ -37,7 +43,8 @@ INSTANTIATE_TEST_SUITE_P(
     Blocks, DecodeBlock,
     ::testing::Values(
         DecodeCase{"GB2312 pair then ASCII", ENCODING_GB2312, Bytes({0xA1, 0xA1, 0x41}), Units({0x3000, 'A'})},
-        DecodeCase{"GB2312 mark is decoded too", ENCODING_GB2312, Bytes({0xFC, 0xFE, 0xB0, 0xA1}), Units({'?', '?', 0x554A})},
+        DecodeCase{"GB2312 mark is decoded too", ENCODING_GB2312, Bytes({0xFC, 0xFE, 0xB0, 0xA1}),
+                   Units({'?', '?', 0x554A})},
         DecodeCase{"GB2312 lead takes an ASCII trail", ENCODING_GB2312, Bytes({0xA1, 0x41, 0x42}), Units({'?', 'B'})},
         DecodeCase{"GB2312 lone lead at the end", ENCODING_GB2312, Bytes({0x41, 0xB0}), Units({'A', '?'})},
         DecodeCase{"GB2312 stops at NUL", ENCODING_GB2312, Bytes({0x41, 0x00, 0x42}), Units({'A'})},
@@ -45,7 +52,8 @@ INSTANTIATE_TEST_SUITE_P(
         DecodeCase{"S-JIS ASCII backslash and tilde", ENCODING_SJIS, Bytes({0x5C, 0x7E}), Units({0x5C, 0x7E})},
         DecodeCase{"S-JIS half-width katakana", ENCODING_SJIS, Bytes({0xA1, 0xDF}), Units({0xFF61, 0xFF9F})},
         DecodeCase{"S-JIS kanji and kana", ENCODING_SJIS, Bytes({0x88, 0x9F, 0x82, 0xA0}), Units({0x4E9C, 0x3042})},
-        DecodeCase{"S-JIS user area skips 7F", ENCODING_SJIS, Bytes({0xF0, 0x7E, 0xF0, 0x80, 0xF9, 0xFC}), Units({0xE03E, 0xE03F, 0xE757})},
+        DecodeCase{"S-JIS user area skips 7F", ENCODING_SJIS, Bytes({0xF0, 0x7E, 0xF0, 0x80, 0xF9, 0xFC}),
+                   Units({0xE03E, 0xE03F, 0xE757})},
         DecodeCase{"S-JIS user area has no 7F trail", ENCODING_SJIS, Bytes({0xF0, 0x7F}), Units({'?'})},
         DecodeCase{"S-JIS lone lead at the end", ENCODING_SJIS, Bytes({0x41, 0x81}), Units({'A', '?'})},
         DecodeCase{"S-JIS unassigned bytes", ENCODING_SJIS, Bytes({0x80, 0xA0, 0xFD}), Units({'?', '?', '?'})},
@@ -59,16 +67,22 @@ INSTANTIATE_TEST_SUITE_P(
         DecodeCase{"CP949 unmapped", ENCODING_CP949, Bytes({0xC9, 0xA1, 0x80, 0x41}), Units({' ', ' '})},
         DecodeCase{"CP949 stops at NUL", ENCODING_CP949, Bytes({0x41, 0x00, 0x42}), Units({'A'})}));
 
-struct EncodeCase {
+struct EncodeCase
+{
     const char *what;
     KestoEncodingFormat format;
     QString in;
     QByteArray out;
 };
 
-void PrintTo(const EncodeCase &c, std::ostream *os) { *os << c.what; }
+void PrintTo(const EncodeCase &c, std::ostream *os)
+{
+    *os << c.what;
+}
 
-class EncodeString : public ::testing::TestWithParam<EncodeCase> {};
+class EncodeString : public ::testing::TestWithParam<EncodeCase>
+{
+};
 
 TEST_P(EncodeString, ReplacesOutput)
 {
@@ -119,7 +133,9 @@ TEST(SJis, UserAreaRoundTrips)
 
 // Every unit a converter encodes comes back from decoding the whole string,
 // so lead and trail bytes are never taken apart.
-class RoundTrip : public ::testing::TestWithParam<KestoEncodingFormat> {};
+class RoundTrip : public ::testing::TestWithParam<KestoEncodingFormat>
+{
+};
 
 TEST_P(RoundTrip, EveryEncodableUnit)
 {
@@ -144,14 +160,16 @@ INSTANTIATE_TEST_SUITE_P(Converters, RoundTrip,
 // Arbitrary bytes, biased towards lead bytes, NULs and marks. Each prefix is
 // decoded from a buffer whose next byte is first a NUL, then a byte that
 // would complete a code: a decoder reading past the block would notice.
-class ArbitraryBytes : public ::testing::TestWithParam<KestoEncodingFormat> {};
+class ArbitraryBytes : public ::testing::TestWithParam<KestoEncodingFormat>
+{
+};
 
 TEST_P(ArbitraryBytes, NeverReadPastTheBlock)
 {
     EncoderPtr encoding = Make(GetParam());
     QRandomGenerator random(20261206u + unsigned(GetParam()));
-    static constexpr quint8 kInteresting[] = {0x00, 0x02, 0x03, 0x41, 0x7F, 0x80, 0x81, 0xA1, 0xB0,
-                                              0xC3, 0xE0, 0xED, 0xF0, 0xF4, 0xF7, 0xFC, 0xFE, 0xFF};
+    static constexpr quint8 kInteresting[]
+        = {0x00, 0x02, 0x03, 0x41, 0x7F, 0x80, 0x81, 0xA1, 0xB0, 0xC3, 0xE0, 0xED, 0xF0, 0xF4, 0xF7, 0xFC, 0xFE, 0xFF};
     for (int round = 0; round < 400; ++round) {
         const int size = int(random.bounded(24));
         QByteArray buffer(size + 1, '\0');
@@ -184,7 +202,7 @@ TEST_P(ArbitraryBytes, NullPointersAreRefusedNotFollowed)
 }
 
 INSTANTIATE_TEST_SUITE_P(Converters, ArbitraryBytes,
-                         ::testing::Values(ENCODING_UTF8, ENCODING_ISOLATIN1, ENCODING_GB2312,
-                                           ENCODING_SJIS, ENCODING_KSC5601, ENCODING_CP949));
+                         ::testing::Values(ENCODING_UTF8, ENCODING_ISOLATIN1, ENCODING_GB2312, ENCODING_SJIS,
+                                           ENCODING_KSC5601, ENCODING_CP949));
 
 } // namespace

@@ -10,7 +10,8 @@
 
 namespace encodingtest {
 
-struct EncoderDeleter {
+struct EncoderDeleter
+{
     void operator()(QEncoding *encoder) const { FreeEncoder(encoder); }
 };
 using EncoderPtr = std::unique_ptr<QEncoding, EncoderDeleter>;

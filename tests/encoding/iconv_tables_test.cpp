@@ -18,7 +18,7 @@ namespace {
 class Iconv
 {
 public:
-    Iconv(const char *to, const char *from) : m_cd(iconv_open(to, from)) {}
+    Iconv(const char *to, const char *from) : m_cd(iconv_open(to, from)) { }
     ~Iconv()
     {
         if (Valid())
@@ -77,8 +77,8 @@ std::string HexBytes(const std::string &bytes)
 using Known = std::map<unsigned int, const char *>;
 
 // Every difference found must be listed, and every listed one must occur.
-void ExpectOnlyKnown(const char *table, const char *what,
-                     const std::map<unsigned int, std::string> &found, const Known &known)
+void ExpectOnlyKnown(const char *table, const char *what, const std::map<unsigned int, std::string> &found,
+                     const Known &known)
 {
     for (const auto &[value, detail] : found) {
         if (!known.count(value))
@@ -90,7 +90,8 @@ void ExpectOnlyKnown(const char *table, const char *what,
     }
 }
 
-struct TableCase {
+struct TableCase
+{
     const char *name;
     KestoEncodingFormat format;
     const char *iconvName;
@@ -100,9 +101,18 @@ struct TableCase {
     Known encodeDifferences;
 };
 
-bool GbLead(unsigned char b) { return b >= 0xA1 && b <= 0xF7; }
-bool SjisLead(unsigned char b) { return (b >= 0x81 && b <= 0x9F) || (b >= 0xE0 && b <= 0xFC); }
-bool KsLead(unsigned char b) { return b >= 0x80; }
+bool GbLead(unsigned char b)
+{
+    return b >= 0xA1 && b <= 0xF7;
+}
+bool SjisLead(unsigned char b)
+{
+    return (b >= 0x81 && b <= 0x9F) || (b >= 0xE0 && b <= 0xFC);
+}
+bool KsLead(unsigned char b)
+{
+    return b >= 0x80;
+}
 
 const char *kSjisAscii = "single bytes 5C and 7E are ASCII here, as in Python's shift_jis; "
                          "glibc's SHIFT_JIS reads them as U+00A5 and U+203E";
@@ -142,7 +152,9 @@ TableCase MakeCase(const char *name)
     return {name, ENCODING_CP949, "CP949", KsLead, 17048, {}, {}};
 }
 
-class AgainstIconv : public ::testing::TestWithParam<const char *> {};
+class AgainstIconv : public ::testing::TestWithParam<const char *>
+{
+};
 
 TEST_P(AgainstIconv, EveryCodeDecodesAndEncodesAsGlibc)
 {
@@ -168,8 +180,8 @@ TEST_P(AgainstIconv, EveryCodeDecodesAndEncodesAsGlibc)
         if (encoding->CharToUnicode(code, &unit))
             ours = unit;
         if (ours != theirs) {
-            decodeDifferences[code] = "ours " + (ours ? Hex(*ours) : "none") + ", iconv "
-                                      + (theirs ? Hex(*theirs) : "none");
+            decodeDifferences[code]
+                = "ours " + (ours ? Hex(*ours) : "none") + ", iconv " + (theirs ? Hex(*theirs) : "none");
             continue;
         }
         if (!ours)
@@ -197,16 +209,15 @@ TEST_P(AgainstIconv, EveryCodeDecodesAndEncodesAsGlibc)
         if (encoding->UnicodeToChar(unit, bytes))
             ours = std::string(bytes, unit == 0 ? 1 : std::strlen(bytes));
         if (ours != theirs) {
-            encodeDifferences[unit] = "ours " + (ours ? HexBytes(*ours) : "none") + ", iconv "
-                                      + (theirs ? HexBytes(*theirs) : "none");
+            encodeDifferences[unit]
+                = "ours " + (ours ? HexBytes(*ours) : "none") + ", iconv " + (theirs ? HexBytes(*theirs) : "none");
         }
     }
     ExpectOnlyKnown(c.name, "encoding U+", encodeDifferences, c.encodeDifferences);
     FreeEncoder(encoding);
 }
 
-INSTANTIATE_TEST_SUITE_P(Tables, AgainstIconv,
-                         ::testing::Values("GB2312", "SJIS", "KSC5601", "CP949"),
+INSTANTIATE_TEST_SUITE_P(Tables, AgainstIconv, ::testing::Values("GB2312", "SJIS", "KSC5601", "CP949"),
                          [](const auto &info) { return std::string(info.param); });
 
 } // namespace

@@ -27,9 +27,8 @@ TEST(EncodingFormats, NamesMarksAndSizes)
         EXPECT_EQ(QEncoding::Name2Format(names[i].toLower()), formats[i]);
     }
 
-    const QList<QByteArray> marks{Bytes({0xFF, 0xFE}), Bytes({0x03}), Bytes({0xFE, 0xFE}),
-                                  Bytes({0xFD, 0xFE}), Bytes({0xFC, 0xFE}), Bytes({0xFE, 0xFE}),
-                                  Bytes({0x02})};
+    const QList<QByteArray> marks{Bytes({0xFF, 0xFE}), Bytes({0x03}),       Bytes({0xFE, 0xFE}), Bytes({0xFD, 0xFE}),
+                                  Bytes({0xFC, 0xFE}), Bytes({0xFE, 0xFE}), Bytes({0x02})};
     for (int i = 0; i < 7; ++i) {
         const auto format = static_cast<KestoEncodingFormat>(i);
         EXPECT_EQ(QEncoding::GetBOM(format), marks[i]) << i;
@@ -42,14 +41,17 @@ TEST(EncodingFormats, NamesMarksAndSizes)
     }
 }
 
-struct Detection {
+struct Detection
+{
     QByteArray data;
     KestoEncodingFormat format;
     bool result;
     bool hasEncoder;
 };
 
-class DetectFormat : public ::testing::TestWithParam<Detection> {};
+class DetectFormat : public ::testing::TestWithParam<Detection>
+{
+};
 
 TEST_P(DetectFormat, FromLeadingMark)
 {
@@ -63,23 +65,22 @@ TEST_P(DetectFormat, FromLeadingMark)
     FreeEncoder(encoder);
 }
 
-INSTANTIATE_TEST_SUITE_P(
-    Marks, DetectFormat,
-    ::testing::Values(Detection{Bytes({0x03}), ENCODING_ISOLATIN1, true, true},
-                      Detection{Bytes({0x02}), ENCODING_UTF8, true, true},
-                      Detection{Bytes({0x41}), ENCODING_NONE, false, false},
-                      Detection{Bytes({0xFE}), ENCODING_NONE, false, false},
-                      Detection{Bytes({0xFF, 0xFE}), ENCODING_UNICODE, true, false},
-                      Detection{Bytes({0x03, 0x41}), ENCODING_ISOLATIN1, true, true},
-                      Detection{Bytes({0x02, 0x41}), ENCODING_UTF8, true, true},
-                      Detection{Bytes({0xFE, 0xFE, 0x41}), ENCODING_CP949, true, true},
-                      Detection{Bytes({0xFE, 0xFE}), ENCODING_CP949, true, true},
-                      Detection{Bytes({0xFD, 0xFE}), ENCODING_SJIS, true, true},
-                      Detection{Bytes({0xFC, 0xFE, 0xB0, 0xA1}), ENCODING_GB2312, true, true},
-                      Detection{Bytes({0xFF, 0xFE, 0x41, 0x00}), ENCODING_UNICODE, true, false},
-                      Detection{Bytes({0xFE, 0xFF}), ENCODING_NONE, false, false},
-                      Detection{Bytes({0xFB, 0xFE}), ENCODING_NONE, false, false},
-                      Detection{Bytes({0x41, 0x42}), ENCODING_NONE, false, false}));
+INSTANTIATE_TEST_SUITE_P(Marks, DetectFormat,
+                         ::testing::Values(Detection{Bytes({0x03}), ENCODING_ISOLATIN1, true, true},
+                                           Detection{Bytes({0x02}), ENCODING_UTF8, true, true},
+                                           Detection{Bytes({0x41}), ENCODING_NONE, false, false},
+                                           Detection{Bytes({0xFE}), ENCODING_NONE, false, false},
+                                           Detection{Bytes({0xFF, 0xFE}), ENCODING_UNICODE, true, false},
+                                           Detection{Bytes({0x03, 0x41}), ENCODING_ISOLATIN1, true, true},
+                                           Detection{Bytes({0x02, 0x41}), ENCODING_UTF8, true, true},
+                                           Detection{Bytes({0xFE, 0xFE, 0x41}), ENCODING_CP949, true, true},
+                                           Detection{Bytes({0xFE, 0xFE}), ENCODING_CP949, true, true},
+                                           Detection{Bytes({0xFD, 0xFE}), ENCODING_SJIS, true, true},
+                                           Detection{Bytes({0xFC, 0xFE, 0xB0, 0xA1}), ENCODING_GB2312, true, true},
+                                           Detection{Bytes({0xFF, 0xFE, 0x41, 0x00}), ENCODING_UNICODE, true, false},
+                                           Detection{Bytes({0xFE, 0xFF}), ENCODING_NONE, false, false},
+                                           Detection{Bytes({0xFB, 0xFE}), ENCODING_NONE, false, false},
+                                           Detection{Bytes({0x41, 0x42}), ENCODING_NONE, false, false}));
 
 TEST(DetectFormat, EmptyBlockKeepsFormat)
 {
@@ -144,12 +145,15 @@ TEST(Utf8, EncodesUnitByUnit)
     EXPECT_FALSE(utf8->UnicodeToChar(0x110000, bytes));
 }
 
-struct Utf8Decode {
+struct Utf8Decode
+{
     QByteArray in;
     QString out;
 };
 
-class Utf8Decoding : public ::testing::TestWithParam<Utf8Decode> {};
+class Utf8Decoding : public ::testing::TestWithParam<Utf8Decode>
+{
+};
 
 TEST_P(Utf8Decoding, ReplacesOutput)
 {
@@ -163,19 +167,15 @@ INSTANTIATE_TEST_SUITE_P(
     Blocks, Utf8Decoding,
     ::testing::Values(
         // The last character of a block without a NUL is kept.
-        Utf8Decode{"1.0", "1.0"},
-        Utf8Decode{"A", "A"},
-        Utf8Decode{Bytes({0x02, '1'}), Units({0x02, '1'})},
+        Utf8Decode{"1.0", "1.0"}, Utf8Decode{"A", "A"}, Utf8Decode{Bytes({0x02, '1'}), Units({0x02, '1'})},
         Utf8Decode{Bytes({'a', 0xC3, 0xA9}), Units({'a', 0xE9})},
         Utf8Decode{Bytes({0xF0, 0x9F, 0x98, 0x80}), Units({0xD83D, 0xDE00})},
         // U+FFFF is the last three-byte character, U+10000 the first four-byte one.
         Utf8Decode{Bytes({0xEF, 0xBF, 0xBF, 0xF0, 0x90, 0x80, 0x80}), Units({0xFFFF, 0xD800, 0xDC00})},
         Utf8Decode{Bytes({0xF0, 0x8F, 0xBF, 0xBF}), Units({0xFFFD, 0xFFFD, 0xFFFD, 0xFFFD})},
         Utf8Decode{Bytes({0xED, 0xA0, 0xBD, 0xED, 0xB8, 0x80}), Units({0xD83D, 0xDE00})},
-        Utf8Decode{Bytes({'a', 0, 'b'}), "a"},
-        Utf8Decode{Bytes({'a', 0xE2, 0x82}), "a"},
-        Utf8Decode{Bytes({'a', 0xE2, 0, 'b'}), "a"},
-        Utf8Decode{Bytes({0x80, 'a', 0xFF}), Units({0xFFFD, 'a', 0xFFFD})},
+        Utf8Decode{Bytes({'a', 0, 'b'}), "a"}, Utf8Decode{Bytes({'a', 0xE2, 0x82}), "a"},
+        Utf8Decode{Bytes({'a', 0xE2, 0, 'b'}), "a"}, Utf8Decode{Bytes({0x80, 'a', 0xFF}), Units({0xFFFD, 'a', 0xFFFD})},
         Utf8Decode{Bytes({0xC3, 'a'}), Units({0xFFFD, 'a'})},
         Utf8Decode{Bytes({0xF4, 0x90, 0x80, 0x80}), Units({0xFFFD, 0xFFFD, 0xFFFD, 0xFFFD})},
         Utf8Decode{QByteArray(), QString()}));

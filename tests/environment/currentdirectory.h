@@ -7,10 +7,7 @@
 class CurrentDirectory
 {
 public:
-    explicit CurrentDirectory(const QString &path) : m_saved(QDir::currentPath())
-    {
-        QDir::setCurrent(path);
-    }
+    explicit CurrentDirectory(const QString &path) : m_saved(QDir::currentPath()) { QDir::setCurrent(path); }
     ~CurrentDirectory() { QDir::setCurrent(m_saved); }
     CurrentDirectory(const CurrentDirectory &) = delete;
     CurrentDirectory &operator=(const CurrentDirectory &) = delete;

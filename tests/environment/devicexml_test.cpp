@@ -66,18 +66,18 @@ TEST_F(FlattenDeviceXmlTest, IncludesEntityFilesBesideThePackAndDropsTheDoctype)
     Write(u"keys.xml"_s, "<?xml version=\"1.0\"?>\n<include>\n  <keys><key code=\"1\"/></keys>\n</include>\n");
     Write(u"sub/extra.xml"_s, "<include><extra/><more n=\"2\"/></include>");
     const QString device = Write(u"device.xml"_s,
-        "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n"
-        "<!DOCTYPE devicepack [\n"
-        "  <!ENTITY keys SYSTEM \"keys.xml\">\n"
-        "  <!ENTITY extra SYSTEM \"sub/extra.xml\">\n"
-        "  <!ENTITY name \"Phone &amp; Co\">\n"
-        "]>\n"
-        "<devicepack>\n"
-        "  <display width=\"176\"/>\n"
-        "  &keys;\n"
-        "  <!-- &keys; in a comment stays -->\n"
-        "  <misc label=\"&name;\">&extra;<![CDATA[&keys;]]></misc>\n"
-        "</devicepack>\n");
+                                 "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n"
+                                 "<!DOCTYPE devicepack [\n"
+                                 "  <!ENTITY keys SYSTEM \"keys.xml\">\n"
+                                 "  <!ENTITY extra SYSTEM \"sub/extra.xml\">\n"
+                                 "  <!ENTITY name \"Phone &amp; Co\">\n"
+                                 "]>\n"
+                                 "<devicepack>\n"
+                                 "  <display width=\"176\"/>\n"
+                                 "  &keys;\n"
+                                 "  <!-- &keys; in a comment stays -->\n"
+                                 "  <misc label=\"&name;\">&extra;<![CDATA[&keys;]]></misc>\n"
+                                 "</devicepack>\n");
 
     EXPECT_EQ(Flatten(device),
               QByteArray("<?xml version='1.0' encoding='UTF-8'?>\n"
@@ -98,15 +98,15 @@ TEST_F(FlattenDeviceXmlTest, MergesSectionsOfTheSameNameInDocumentOrder)
 {
     Write(u"more.xml"_s, "<x><display><mode n=\"3\"/></display></x>");
     const QString device = Write(u"device.xml"_s,
-        "<?xml version=\"1.0\"?>\n"
-        "<!DOCTYPE pack [<!ENTITY more SYSTEM \"more.xml\">]>\n"
-        "<pack>\n"
-        "  <display a=\"first\"><mode n=\"1\"/>text</display>\n"
-        "  <keys><k/></keys>\n"
-        "  <display a=\"second\"><mode n=\"2\"/><!--c--></display>\n"
-        "  &more;\n"
-        "  <keys/>\n"
-        "</pack>\n");
+                                 "<?xml version=\"1.0\"?>\n"
+                                 "<!DOCTYPE pack [<!ENTITY more SYSTEM \"more.xml\">]>\n"
+                                 "<pack>\n"
+                                 "  <display a=\"first\"><mode n=\"1\"/>text</display>\n"
+                                 "  <keys><k/></keys>\n"
+                                 "  <display a=\"second\"><mode n=\"2\"/><!--c--></display>\n"
+                                 "  &more;\n"
+                                 "  <keys/>\n"
+                                 "</pack>\n");
 
     EXPECT_EQ(Flatten(device),
               QByteArray("<?xml version='1.0'?>\n"
@@ -126,28 +126,31 @@ TEST_F(FlattenDeviceXmlTest, MergesSectionsOfTheSameNameInDocumentOrder)
 TEST_F(FlattenDeviceXmlTest, PackWithoutXmlDeclarationKeepsItsDoctype)
 {
     Write(u"keys.xml"_s, "<i><keys/></i>");
-    const QString device = Write(u"device.xml"_s,
-        "<!DOCTYPE pack [<!ENTITY keys SYSTEM \"keys.xml\">]>\n<pack>&keys;</pack>\n");
+    const QString device
+        = Write(u"device.xml"_s, "<!DOCTYPE pack [<!ENTITY keys SYSTEM \"keys.xml\">]>\n<pack>&keys;</pack>\n");
 
-    EXPECT_EQ(Flatten(device), QByteArray("<!DOCTYPE pack [\n"
-                                          "<!ENTITY keys SYSTEM \"keys.xml\">\n"
-                                          "]>\n"
-                                          "<pack>\n"
-                                          " <keys/>\n"
-                                          "</pack>\n"));
+    EXPECT_EQ(Flatten(device),
+              QByteArray("<!DOCTYPE pack [\n"
+                         "<!ENTITY keys SYSTEM \"keys.xml\">\n"
+                         "]>\n"
+                         "<pack>\n"
+                         " <keys/>\n"
+                         "</pack>\n"));
 }
 
 TEST_F(FlattenDeviceXmlTest, DoctypeWithoutInternalSubsetStays)
 {
     // "]>" further on belongs to the body, not to the declaration.
-    const QString device = Write(u"device.xml"_s,
-        "<?xml version=\"1.0\"?>\n<!DOCTYPE pack SYSTEM \"pack.dtd\">\n<pack><!-- ]> --><a/></pack>\n");
-    EXPECT_EQ(Flatten(device), QByteArray("<?xml version='1.0'?>\n"
-                                          "<!DOCTYPE pack SYSTEM \"pack.dtd\">\n"
-                                          "<pack>\n"
-                                          " <!-- ]> -->\n"
-                                          " <a/>\n"
-                                          "</pack>\n"));
+    const QString device
+        = Write(u"device.xml"_s,
+                "<?xml version=\"1.0\"?>\n<!DOCTYPE pack SYSTEM \"pack.dtd\">\n<pack><!-- ]> --><a/></pack>\n");
+    EXPECT_EQ(Flatten(device),
+              QByteArray("<?xml version='1.0'?>\n"
+                         "<!DOCTYPE pack SYSTEM \"pack.dtd\">\n"
+                         "<pack>\n"
+                         " <!-- ]> -->\n"
+                         " <a/>\n"
+                         "</pack>\n"));
 }
 
 TEST_F(FlattenDeviceXmlTest, MissingOrMalformedIncludesKeepTheirReferences)
@@ -155,36 +158,38 @@ TEST_F(FlattenDeviceXmlTest, MissingOrMalformedIncludesKeepTheirReferences)
     Write(u"broken.xml"_s, "<i><unclosed></i>");
     Write(u"good.xml"_s, "<i><good/></i>");
     const QString device = Write(u"device.xml"_s,
-        "<?xml version=\"1.0\"?>\n"
-        "<!DOCTYPE pack [\n"
-        "<!ENTITY gone SYSTEM \"gone.xml\">\n"
-        "<!ENTITY broken SYSTEM \"broken.xml\">\n"
-        "<!ENTITY good SYSTEM \"good.xml\">\n"
-        "]>\n"
-        "<pack><a>&gone;</a><b>x&broken;y</b>&good;</pack>\n");
+                                 "<?xml version=\"1.0\"?>\n"
+                                 "<!DOCTYPE pack [\n"
+                                 "<!ENTITY gone SYSTEM \"gone.xml\">\n"
+                                 "<!ENTITY broken SYSTEM \"broken.xml\">\n"
+                                 "<!ENTITY good SYSTEM \"good.xml\">\n"
+                                 "]>\n"
+                                 "<pack><a>&gone;</a><b>x&broken;y</b>&good;</pack>\n");
 
     // The declarations stay with the references, so the file stays well-formed.
-    EXPECT_EQ(Flatten(device), QByteArray("<?xml version='1.0'?>\n"
-                                          "<!DOCTYPE pack [\n"
-                                          "<!ENTITY broken SYSTEM \"broken.xml\">\n"
-                                          "<!ENTITY gone SYSTEM \"gone.xml\">\n"
-                                          "<!ENTITY good SYSTEM \"good.xml\">\n"
-                                          "]>\n"
-                                          "<pack>\n"
-                                          " <a>&gone;</a>\n"
-                                          " <b>x&broken;y</b>\n"
-                                          " <good/>\n"
-                                          "</pack>\n"));
+    EXPECT_EQ(Flatten(device),
+              QByteArray("<?xml version='1.0'?>\n"
+                         "<!DOCTYPE pack [\n"
+                         "<!ENTITY broken SYSTEM \"broken.xml\">\n"
+                         "<!ENTITY gone SYSTEM \"gone.xml\">\n"
+                         "<!ENTITY good SYSTEM \"good.xml\">\n"
+                         "]>\n"
+                         "<pack>\n"
+                         " <a>&gone;</a>\n"
+                         " <b>x&broken;y</b>\n"
+                         " <good/>\n"
+                         "</pack>\n"));
     ExpectWellFormed();
 }
 
 TEST_F(FlattenDeviceXmlTest, TextOutsideAsciiSurvivesAsCharacterReferences)
 {
     Write(u"names.xml"_s, "<i><name>\xe6\x97\xa5\xe6\x9c\xac</name></i>");
-    const QString device = Write(u"device.xml"_s,
-        "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n"
-        "<!DOCTYPE pack [<!ENTITY names SYSTEM \"names.xml\">]>\n"
-        "<pack title=\"Caf\xc3\xa9\">&names;<c><![CDATA[\xc3\xa9<\xf0\x9f\x98\x80>]]></c></pack>\n");
+    const QString device
+        = Write(u"device.xml"_s,
+                "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n"
+                "<!DOCTYPE pack [<!ENTITY names SYSTEM \"names.xml\">]>\n"
+                "<pack title=\"Caf\xc3\xa9\">&names;<c><![CDATA[\xc3\xa9<\xf0\x9f\x98\x80>]]></c></pack>\n");
 
     const QByteArray flattened = Flatten(device);
     for (const char byte : flattened)
@@ -212,9 +217,7 @@ TEST_F(FlattenDeviceXmlTest, PacksInOtherEncodingsAreExpandedToo)
         SCOPED_TRACE(encoding);
         const QString plain = Write(u"plain.xml"_s, QByteArray(utf8).replace("%1", encoding));
         QByteArray converted;
-        ASSERT_EQ(testutil::RunProgram(u"iconv"_s,
-                                       {u"-f"_s, u"UTF-8"_s, u"-t"_s,
-                                        QString::fromLatin1(encoding), plain},
+        ASSERT_EQ(testutil::RunProgram(u"iconv"_s, {u"-f"_s, u"UTF-8"_s, u"-t"_s, QString::fromLatin1(encoding), plain},
                                        &converted),
                   0);
         const QString device = Write(u"device.xml"_s, converted);

@@ -61,11 +61,16 @@ TEST_F(PlatformsTest, ListsSubDirectoriesByNameStrippingTheProWord)
     QList<Platform> platforms;
     ASSERT_EQ(GetPlatforms(platforms), 7u);
 
-    struct Expected { const char *entry; const char *name; bool pro; };
+    struct Expected
+    {
+        const char *entry;
+        const char *name;
+        bool pro;
+    };
     const Expected expected[] = {
-        {"abc", "abc", false},         {"Bar PRO 2", "Bar 2", true},
-        {"Foo Pro", "Foo", true},      {"My Project", "My Project", true},
-        {"Pro", "Pro", true},          {"Product", "Product", true},
+        {"abc", "abc", false},    {"Bar PRO 2", "Bar 2", true},
+        {"Foo Pro", "Foo", true}, {"My Project", "My Project", true},
+        {"Pro", "Pro", true},     {"Product", "Product", true},
         {"zed", "zed", false},
     };
     for (int i = 0; i < 7; ++i) {
@@ -147,8 +152,7 @@ INSTANTIATE_TEST_SUITE_P(
                       DefaultPlatformCase{"/opt/sdk/abc/", true, "/opt/sdk/abc"},
                       DefaultPlatformCase{"/opt/sdk/abc", true, "/opt/sdk"},
                       // A backslash anywhere wins over later forward slashes.
-                      DefaultPlatformCase{"a/b\\c/d", true, "a/b"},
-                      DefaultPlatformCase{"abc", true, "abc"}));
+                      DefaultPlatformCase{"a/b\\c/d", true, "a/b"}, DefaultPlatformCase{"abc", true, "abc"}));
 
 TEST_F(PlatformsTest, TestKitsDefaultToTestsBesidePlatformsRoot)
 {
@@ -224,9 +228,8 @@ TEST_F(PlatformsTest, TestSetEndingInSeparatorPicksTheGreatestName)
 TEST(TestKitNames, DefaultTestKitNameIsTheLastComponent)
 {
     testutil::EnvGuard env;
-    const std::pair<const char *, const char *> cases[] = {
-        {"", ""}, {"kit", "kit"}, {"/a/b/kit", "kit"}, {"C:\\a\\kit", "kit"},
-        {"a\\kit/x", "kit/x"}, {"/a/b/", ""}};
+    const std::pair<const char *, const char *> cases[]
+        = {{"", ""}, {"kit", "kit"}, {"/a/b/kit", "kit"}, {"C:\\a\\kit", "kit"}, {"a\\kit/x", "kit/x"}, {"/a/b/", ""}};
     for (const auto &[setting, name] : cases) {
         env.Set("KESTIX_TESTSET", QString::fromUtf8(setting));
         EXPECT_EQ(GetDefaultTestKitName(), QString::fromUtf8(name)) << setting;
@@ -278,16 +281,12 @@ TEST_P(BreakPackageNameTest, Splits)
 
 INSTANTIATE_TEST_SUITE_P(
     Names, BreakPackageNameTest,
-    ::testing::Values(
-        PackageCase{"my_mod_RVCT22arm9_Release.kestix", true, "my_mod", "RVCT22arm9", "Release"},
-        PackageCase{"mod_GCCE_UDEB.KESTIX", true, "mod", "GCCE", "UDEB"},
-        PackageCase{"a__b_c", true, "a", "b", "c"},
-        PackageCase{"x_y__b_c", true, "x_y", "b", "c"},
-        PackageCase{"_b_c", true, "", "b", "c"},
-        PackageCase{"a_b_", true, "a", "b", ""},
-        PackageCase{"a.kestix_b.kestix_c.kestix", true, "a", "b", "c"},
-        PackageCase{"a_b.kestix", false, "", "2", "3"},
-        PackageCase{"plain", false, "", "2", "3"},
-        PackageCase{"", false, "", "2", "3"}));
+    ::testing::Values(PackageCase{"my_mod_RVCT22arm9_Release.kestix", true, "my_mod", "RVCT22arm9", "Release"},
+                      PackageCase{"mod_GCCE_UDEB.KESTIX", true, "mod", "GCCE", "UDEB"},
+                      PackageCase{"a__b_c", true, "a", "b", "c"}, PackageCase{"x_y__b_c", true, "x_y", "b", "c"},
+                      PackageCase{"_b_c", true, "", "b", "c"}, PackageCase{"a_b_", true, "a", "b", ""},
+                      PackageCase{"a.kestix_b.kestix_c.kestix", true, "a", "b", "c"},
+                      PackageCase{"a_b.kestix", false, "", "2", "3"}, PackageCase{"plain", false, "", "2", "3"},
+                      PackageCase{"", false, "", "2", "3"}));
 
 } // namespace

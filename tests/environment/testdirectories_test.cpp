@@ -92,17 +92,13 @@ TEST_P(TargetNameTest, BecomesOneFolderBelowTargets)
     EXPECT_TRUE(QFileInfo(directory).isDir());
 }
 
-INSTANTIATE_TEST_SUITE_P(
-    Names, TargetNameTest,
-    ::testing::Values(TargetCase{"My Phone:1", "My%20Phone%3A1"},
-                      TargetCase{"a/b\\c", "a%2Fb%5Cc"},
-                      TargetCase{"Az09-._~", "Az09-._~"},
-                      TargetCase{"100%", "100%25"},
-                      TargetCase{"..", "%2E%2E"},
-                      TargetCase{".", "%2E"},
-                      TargetCase{"a..b", "a..b"},
-                      TargetCase{"T\xc3\xa9l\xc3\xa9phone", "T%E9l%E9phone"},
-                      TargetCase{"\xe9\x9b\xbb\xe8\xa9\xb1", "%E9%9B%BB%E8%A9%B1"}));
+INSTANTIATE_TEST_SUITE_P(Names, TargetNameTest,
+                         ::testing::Values(TargetCase{"My Phone:1", "My%20Phone%3A1"},
+                                           TargetCase{"a/b\\c", "a%2Fb%5Cc"}, TargetCase{"Az09-._~", "Az09-._~"},
+                                           TargetCase{"100%", "100%25"}, TargetCase{"..", "%2E%2E"},
+                                           TargetCase{".", "%2E"}, TargetCase{"a..b", "a..b"},
+                                           TargetCase{"T\xc3\xa9l\xc3\xa9phone", "T%E9l%E9phone"},
+                                           TargetCase{"\xe9\x9b\xbb\xe8\xa9\xb1", "%E9%9B%BB%E8%A9%B1"}));
 
 class OatScriptsTest : public TestDirectoriesTest
 {

@@ -36,10 +36,7 @@ protected:
         testutil::WriteFile(outside + u"/keep.txt"_s, "keep");
     }
 
-    QString Host(const char *handsetPath) const
-    {
-        return fixture.HostPath(u"phone"_s, QString::fromUtf8(handsetPath));
-    }
+    QString Host(const char *handsetPath) const { return fixture.HostPath(u"phone"_s, QString::fromUtf8(handsetPath)); }
     QString Work(const char *name) const { return fixture.WorkFolder() + QLatin1Char('/') + QString::fromUtf8(name); }
 
     HandsetFixture fixture;
@@ -103,7 +100,9 @@ struct FailureCase
     std::function<unsigned int(IKestoDevice &, const QString &work)> call;
 };
 
-class EmulatedHandsetFailure : public EmulatedHandsetTest, public ::testing::WithParamInterface<FailureCase> {};
+class EmulatedHandsetFailure : public EmulatedHandsetTest, public ::testing::WithParamInterface<FailureCase>
+{
+};
 
 TEST_P(EmulatedHandsetFailure, FailsWithItsErrorNumber)
 {
@@ -135,30 +134,74 @@ constexpr unsigned int kBadPath = HANDSET_ERROR_BAD_PATH;
 using Work = const QString &;
 
 const FailureCase kFailures[] = {
-    {"ListMissing", kNotFound, [](IKestoDevice &d, Work) { return List(d, u"fs:/none"_s); }},
-    {"ListAFile", kNotFound, [](IKestoDevice &d, Work) { return List(d, u"fs:/file"_s); }},
-    {"ListOutside", kBadPath, [](IKestoDevice &d, Work) { return List(d, u"fs:/../../../work/outside"_s); }},
-    {"ListNoPrefix", kBadPath, [](IKestoDevice &d, Work work) { return List(d, work); }},
-    {"ListUnknownClass", kNotFound, [](IKestoDevice &d, Work) { return List(d, u"fs:/~0x01010001"_s); }},
-    {"DeleteMissing", kNotFound, [](IKestoDevice &d, Work) { return d.DeleteFile(u"fs:/none"_s); }},
-    {"DeleteOutside", kBadPath, [](IKestoDevice &d, Work) { return d.DeleteFile(kOut); }},
-    {"RemoveMissing", kNotFound, [](IKestoDevice &d, Work) { return d.RemoveDirectory(u"fs:/none"_s); }},
-    {"RemoveParent", kBadPath, [](IKestoDevice &d, Work) { return d.RemoveDirectory(u"fs:/.."_s); }},
+    {"ListMissing", kNotFound,
+     [](IKestoDevice &d, Work) {
+         return List(d, u"fs:/none"_s);
+     }},
+    {"ListAFile", kNotFound,
+     [](IKestoDevice &d, Work) {
+         return List(d, u"fs:/file"_s);
+     }},
+    {"ListOutside", kBadPath,
+     [](IKestoDevice &d, Work) {
+         return List(d, u"fs:/../../../work/outside"_s);
+     }},
+    {"ListNoPrefix", kBadPath,
+     [](IKestoDevice &d, Work work) {
+         return List(d, work);
+     }},
+    {"ListUnknownClass", kNotFound,
+     [](IKestoDevice &d, Work) {
+         return List(d, u"fs:/~0x01010001"_s);
+     }},
+    {"DeleteMissing", kNotFound,
+     [](IKestoDevice &d, Work) {
+         return d.DeleteFile(u"fs:/none"_s);
+     }},
+    {"DeleteOutside", kBadPath,
+     [](IKestoDevice &d, Work) {
+         return d.DeleteFile(kOut);
+     }},
+    {"RemoveMissing", kNotFound,
+     [](IKestoDevice &d, Work) {
+         return d.RemoveDirectory(u"fs:/none"_s);
+     }},
+    {"RemoveParent", kBadPath,
+     [](IKestoDevice &d, Work) {
+         return d.RemoveDirectory(u"fs:/.."_s);
+     }},
     {"CopyFromMissingHostFile", kNotFound,
-     [](IKestoDevice &d, Work work) { return d.CopyFileToDevice(work + u"/none"_s, u"fs:/x"_s); }},
+     [](IKestoDevice &d, Work work) {
+         return d.CopyFileToDevice(work + u"/none"_s, u"fs:/x"_s);
+     }},
     {"CopyToOutside", kBadPath,
-     [](IKestoDevice &d, Work work) { return d.CopyFileToDevice(work + u"/outside/keep.txt"_s, kOut); }},
+     [](IKestoDevice &d, Work work) {
+         return d.CopyFileToDevice(work + u"/outside/keep.txt"_s, kOut);
+     }},
     {"CopyMissingFromDevice", kNotFound,
-     [](IKestoDevice &d, Work work) { return d.CopyFileFromDevice(u"fs:/none"_s, work + u"/x"_s); }},
+     [](IKestoDevice &d, Work work) {
+         return d.CopyFileFromDevice(u"fs:/none"_s, work + u"/x"_s);
+     }},
     {"CopyFromOutsideOfDevice", kBadPath,
-     [](IKestoDevice &d, Work work) { return d.CopyFileFromDevice(u"fs:/../handset.ini"_s, work + u"/x"_s); }},
+     [](IKestoDevice &d, Work work) {
+         return d.CopyFileFromDevice(u"fs:/../handset.ini"_s, work + u"/x"_s);
+     }},
     {"ExistsOutside", kBadPath,
-     [](IKestoDevice &d, Work) { return ErrorOf(d, d.FileExists(u"fs:/../handset.ini"_s)); }},
-    {"ExistsMissing", kNotFound, [](IKestoDevice &d, Work) { return ErrorOf(d, d.FileExists(u"fs:/none"_s)); }},
+     [](IKestoDevice &d, Work) {
+         return ErrorOf(d, d.FileExists(u"fs:/../handset.ini"_s));
+     }},
+    {"ExistsMissing", kNotFound,
+     [](IKestoDevice &d, Work) {
+         return ErrorOf(d, d.FileExists(u"fs:/none"_s));
+     }},
     {"CopyOnDeviceMissing", kNotFound,
-     [](IKestoDevice &d, Work) { return ErrorOf(d, d.CopyOnDevice(u"fs:/none"_s, u"fs:/y"_s)); }},
+     [](IKestoDevice &d, Work) {
+         return ErrorOf(d, d.CopyOnDevice(u"fs:/none"_s, u"fs:/y"_s));
+     }},
     {"CopyOnDeviceToOutside", kBadPath,
-     [](IKestoDevice &d, Work) { return ErrorOf(d, d.CopyOnDevice(u"fs:/file"_s, kOut)); }},
+     [](IKestoDevice &d, Work) {
+         return ErrorOf(d, d.CopyOnDevice(u"fs:/file"_s, kOut));
+     }},
     {"FindModuleNone", kNotFound,
      [](IKestoDevice &d, Work) {
          QString directory = u"stale"_s;
@@ -170,13 +213,26 @@ const FailureCase kFailures[] = {
          QString directory;
          return d.FindModule(0, directory);
      }},
-    {"DeleteDirectoryUnknownClass", kNotFound, [](IKestoDevice &d, Work) { return d.DeleteDirectory(0x01010001); }},
-    {"StartUnknownProgram", kNotFound, [](IKestoDevice &d, Work) { return d.StartProgram(u"nothing"_s, QString()); }},
-    {"StartUnknownApplet", kNotFound, [](IKestoDevice &d, Work) { return d.StartApplet(0x1234, QString()); }},
+    {"DeleteDirectoryUnknownClass", kNotFound,
+     [](IKestoDevice &d, Work) {
+         return d.DeleteDirectory(0x01010001);
+     }},
+    {"StartUnknownProgram", kNotFound,
+     [](IKestoDevice &d, Work) {
+         return d.StartProgram(u"nothing"_s, QString());
+     }},
+    {"StartUnknownApplet", kNotFound,
+     [](IKestoDevice &d, Work) {
+         return d.StartApplet(0x1234, QString());
+     }},
     {"InstallMissingPackage", kNotFound,
-     [](IKestoDevice &d, Work work) { return d.InstallPackage(work + u"/none.kestix"_s); }},
+     [](IKestoDevice &d, Work work) {
+         return d.InstallPackage(work + u"/none.kestix"_s);
+     }},
     {"InstallNotATar", HANDSET_ERROR_BAD_PACKAGE,
-     [](IKestoDevice &d, Work work) { return d.InstallPackage(work + u"/outside/keep.txt"_s); }},
+     [](IKestoDevice &d, Work work) {
+         return d.InstallPackage(work + u"/outside/keep.txt"_s);
+     }},
 };
 
 INSTANTIATE_TEST_SUITE_P(Operations, EmulatedHandsetFailure, ::testing::ValuesIn(kFailures),

@@ -55,10 +55,7 @@ protected:
         layout.files = {{u"data/table.txt"_s, "rows"}};
     }
 
-    QString Host(const char *handsetPath) const
-    {
-        return fixture.HostPath(u"phone"_s, QString::fromUtf8(handsetPath));
-    }
+    QString Host(const char *handsetPath) const { return fixture.HostPath(u"phone"_s, QString::fromUtf8(handsetPath)); }
     QString Fs() const { return fixture.HandsetFolder(u"phone"_s) + u"/fs"_s; }
 
     HandsetFixture fixture;
@@ -142,7 +139,9 @@ struct BadPackage
     std::vector<const char *> names; // created with the tar program, -P keeps them as given
 };
 
-class HostilePackage : public PackageTest, public ::testing::WithParamInterface<BadPackage> {};
+class HostilePackage : public PackageTest, public ::testing::WithParamInterface<BadPackage>
+{
+};
 
 TEST_P(HostilePackage, IsRefusedAsAWholeAndLeavesNothingBehind)
 {
@@ -189,9 +188,8 @@ TEST_F(PackageTest, DamagedPackageIsRefusedWithItsReasonAndInstallsNothing)
     log.SetLogPath(fixture.WorkFolder() + u"/log.txt"_s);
     device = fixture.Connect(u"phone"_s, &log);
     ASSERT_TRUE(device);
-    const QString package = fixture.MakePackage(u"p.kestix"_s,
-                                                testutil::Members{{u"m/a.txt"_s, "a"},
-                                                                  {u"m/big.bin"_s, QByteArray(4096, 'x')}});
+    const QString package = fixture.MakePackage(
+        u"p.kestix"_s, testutil::Members{{u"m/a.txt"_s, "a"}, {u"m/big.bin"_s, QByteArray(4096, 'x')}});
     QByteArray bytes = testutil::ReadFile(package);
     const struct
     {
@@ -208,10 +206,10 @@ TEST_F(PackageTest, DamagedPackageIsRefusedWithItsReasonAndInstallsNothing)
         testutil::WriteFile(path, c.bytes);
         EXPECT_EQ(device->InstallPackage(path), HANDSET_ERROR_BAD_PACKAGE) << c.name;
         EXPECT_TRUE(Tree(Fs()).isEmpty()) << c.name;
-        EXPECT_TRUE(testutil::ReadFile(fixture.WorkFolder() + u"/log.txt"_s)
-                        .contains(u"EmulatedHandset::InstallPackage refused %1: %2\n"_s
-                                      .arg(path, QLatin1String(c.reason))
-                                      .toLatin1()))
+        EXPECT_TRUE(
+            testutil::ReadFile(fixture.WorkFolder() + u"/log.txt"_s)
+                .contains(u"EmulatedHandset::InstallPackage refused %1: %2\n"_s.arg(path, QLatin1String(c.reason))
+                              .toLatin1()))
             << c.name;
     }
 }
@@ -220,9 +218,8 @@ TEST_F(PackageTest, WriteFailureTakesBackWhatThePackageWrote)
 {
     // "m/x" exists as a folder, so the second member cannot be written.
     QDir().mkpath(Host("fs:/usermods/m/x/inner"));
-    const QString package = fixture.MakePackage(u"p.kestix"_s,
-                                                testutil::Members{{u"new/deep/a.txt"_s, "a"},
-                                                                  {u"m/x"_s, "b"}});
+    const QString package
+        = fixture.MakePackage(u"p.kestix"_s, testutil::Members{{u"new/deep/a.txt"_s, "a"}, {u"m/x"_s, "b"}});
     EXPECT_EQ(device->InstallPackage(package), HANDSET_ERROR_IO);
     EXPECT_EQ(Tree(Fs()), (QStringList{u"usermods"_s, u"usermods/m"_s, u"usermods/m/x"_s, u"usermods/m/x/inner"_s}));
 }
@@ -241,7 +238,7 @@ protected:
         PackageTest::SetUp();
         // Logs what it was asked and where it ran.
         layout.behaviour = "echo \"$1 $2 [$3] [$4] $(pwd) $HANDSET_FS\" > \"$HANDSET_MODULE_DIR/run.log\"\n"
-                         "echo '[/VERBOSE]' >> \"$HANDSET_MODULE_DIR/run.log\"\n";
+                           "echo '[/VERBOSE]' >> \"$HANDSET_MODULE_DIR/run.log\"\n";
         ASSERT_EQ(device->InstallPackage(fixture.MakePackage(u"ctfmod.kestix"_s, layout)), 0u);
     }
 
@@ -314,7 +311,8 @@ TEST_F(BehaviourTest, BehaviourLinkedToAHostFileOutsideTheHandsetIsNotRun)
 
 TEST_F(BehaviourTest, BehaviourThatDoesNotEndIsKilledAfterTheTimeout)
 {
-    testutil::WriteFile(Host("fs:/usermods/ctfmod/behaviour"), "echo started > \"$HANDSET_MODULE_DIR/run.log\"\nsleep 30\n");
+    testutil::WriteFile(Host("fs:/usermods/ctfmod/behaviour"),
+                        "echo started > \"$HANDSET_MODULE_DIR/run.log\"\nsleep 30\n");
     static_cast<EmulatedHandset *>(device.get())->SetBehaviourTimeout(200);
     ASSERT_EQ(device->StartProgram(u"ctfmod_k"_s, QString()), 0u);
     EXPECT_EQ(RunLog(), QByteArray("started\n"));

@@ -122,7 +122,7 @@ TEST(Log, MessagesFromManyThreadsNeverInterleave)
     for (std::thread &thread : threads)
         thread.join();
     const QList<QByteArray> lines = ReadFile(path).split('\n');
-    EXPECT_EQ(lines.size(), 201);  // 200 whole lines and the empty tail
+    EXPECT_EQ(lines.size(), 201); // 200 whole lines and the empty tail
     for (int i = 0; i < 200; ++i)
         EXPECT_TRUE(lines.at(i).startsWith("thread ")) << lines.at(i).constData();
 }

@@ -252,7 +252,9 @@ TEST_F(EndToEnd, UtModuleReadsItsConfigurationAndWritesBothLogs)
     module.applets << AppletWithId(0x20002000);
     module.targets.insert(u"t"_s, Target(package));
     module.SetTestCases({u"t1"_s, u"t2"_s});
-    const auto scratch = [] { return QDir::temp().entryList({u"test_*.dat"_s}, QDir::Files); };
+    const auto scratch = [] {
+        return QDir::temp().entryList({u"test_*.dat"_s}, QDir::Files);
+    };
     const QStringList before = scratch();
     RunModule(module);
     EXPECT_EQ(scratch(), before); // the configuration's way to the handset leaves nothing behind

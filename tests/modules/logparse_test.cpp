@@ -31,16 +31,16 @@ TEST_F(LogFiles, CtfPairsResultsWithTestNamesInEitherOrder)
     CtfTestModule module;
     TestResults results;
     const QString path = Write(u"a.LOG"_s,
-        "Suite: A\r\n"
-        "Time: 2026/12/03 14:05:09\r\n"
-        "Result: PASS\r\n"
-        "Test: t1\r\n"
-        "test:  t2 with words \r\n"
-        "RESULT: Failed\r\n"
-        "Suite: ignored\r\n"
-        "Manifest Name: B\r\n"
-        "ID Hash: #123\r\n"
-        "[/verbose]\r\n");
+                               "Suite: A\r\n"
+                               "Time: 2026/12/03 14:05:09\r\n"
+                               "Result: PASS\r\n"
+                               "Test: t1\r\n"
+                               "test:  t2 with words \r\n"
+                               "RESULT: Failed\r\n"
+                               "Suite: ignored\r\n"
+                               "Manifest Name: B\r\n"
+                               "ID Hash: #123\r\n"
+                               "[/verbose]\r\n");
     ASSERT_TRUE(module.ParseLog(path, results));
     EXPECT_EQ(results.manifestName, u"B"_s);
     EXPECT_EQ(results.idHash, u"#123"_s);
@@ -81,8 +81,8 @@ TEST_F(LogFiles, AppletTakesTheFirstWordAndDropsKFromSuiteNames)
 {
     CtfAppletTestModule module;
     TestResults results;
-    ASSERT_TRUE(module.ParseLog(Write(u"s.log"_s,
-        "Suite: foo_K\nTest: t1 extra words\nResult: Pass\nTest:\nResult: x\n"), results));
+    ASSERT_TRUE(module.ParseLog(
+        Write(u"s.log"_s, "Suite: foo_K\nTest: t1 extra words\nResult: Pass\nTest:\nResult: x\n"), results));
     EXPECT_EQ(results.manifestName, u"foo"_s);
     EXPECT_EQ(PairsOf(results), (Pairs{{"t1", "pass"}}));
 
@@ -95,28 +95,30 @@ TEST_F(LogFiles, OatMapsStatusWordsAndMarksUnfinishedCasesUnexecuted)
     OatTestModule module;
     TestResults results;
     ASSERT_TRUE(module.ParseLog(Write(u"timer_u.OAT"_s,
-        "@#OatTimer#\n"
-        "@Another\n"
-        "TimeStamp: 14:05:09 12-03-2026\n"
-        "@1: #t1@\n"
-        "@2: t2\n"
-        "Status: Success\n"
-        "@3: t3\n"
-        "status: FAILED\n"
-        "@4: t4\n"
-        "Status: unsupported\n"
-        "@5: t5\n"
-        "Status: error\n"
-        "@6: t6\n"
-        "ID Hash: #9\n"
-        "TEST RESULT: done\n"), results));
+                                      "@#OatTimer#\n"
+                                      "@Another\n"
+                                      "TimeStamp: 14:05:09 12-03-2026\n"
+                                      "@1: #t1@\n"
+                                      "@2: t2\n"
+                                      "Status: Success\n"
+                                      "@3: t3\n"
+                                      "status: FAILED\n"
+                                      "@4: t4\n"
+                                      "Status: unsupported\n"
+                                      "@5: t5\n"
+                                      "Status: error\n"
+                                      "@6: t6\n"
+                                      "ID Hash: #9\n"
+                                      "TEST RESULT: done\n"),
+                                results));
     EXPECT_EQ(results.manifestName, u"OatTimer"_s);
     EXPECT_EQ(module.moduleName, u"OatTimer"_s);
     EXPECT_EQ(results.idHash, u"#9"_s);
     EXPECT_TRUE(results.complete);
     EXPECT_EQ(results.timeStamp, QDateTime(QDate(2026, 12, 3), QTime(14, 5, 9)));
-    EXPECT_EQ(PairsOf(results), (Pairs{{"t1", "unexecuted"}, {"t2", "pass"}, {"t3", "fail"},
-                                       {"t4", "unsupported"}, {"t5", "unexecuted"}}));
+    EXPECT_EQ(
+        PairsOf(results),
+        (Pairs{{"t1", "unexecuted"}, {"t2", "pass"}, {"t3", "fail"}, {"t4", "unsupported"}, {"t5", "unexecuted"}}));
 
     // A stamped manifest name replaces the suite line; a log of another kind is not read.
     ASSERT_TRUE(module.ParseLog(Write(u"a.oat"_s, "@suite\nManifest Name: Timer\n"), results));
@@ -129,17 +131,18 @@ TEST_F(LogFiles, UtReadsTheResultTableAndDropsTheUtPrefix)
     UTTestModule module;
     TestResults results;
     ASSERT_TRUE(module.ParseLog(Write(u"ut.TXT"_s,
-        "SuiteName: UTTimer 14:05:09 03-Dec-2026 extra\n"
-        "ID Hash: #77\n"
-        "---- results\n"
-        "t1 PASSED 12 ms\n"
-        "t2 FAILED\n"
-        "t3 Failed 1 ms\n"
-        "t4 UNSUPPORTED 0 ms\n"
-        "t5 skipped 0 ms\n"
-        "----------\n"
-        "t6 PASSED 1 ms\n"
-        "Elapsed Time: 12s\n"), results));
+                                      "SuiteName: UTTimer 14:05:09 03-Dec-2026 extra\n"
+                                      "ID Hash: #77\n"
+                                      "---- results\n"
+                                      "t1 PASSED 12 ms\n"
+                                      "t2 FAILED\n"
+                                      "t3 Failed 1 ms\n"
+                                      "t4 UNSUPPORTED 0 ms\n"
+                                      "t5 skipped 0 ms\n"
+                                      "----------\n"
+                                      "t6 PASSED 1 ms\n"
+                                      "Elapsed Time: 12s\n"),
+                                results));
     EXPECT_EQ(results.manifestName, u"Timer"_s);
     EXPECT_EQ(results.idHash, u"#77"_s);
     EXPECT_TRUE(results.complete);
@@ -191,8 +194,9 @@ TEST_P(HostileLog, EveryParserSurvives)
     ut.ParseLog(Write(u"raw.txt"_s, bytes), results);
 }
 
-INSTANTIATE_TEST_SUITE_P(
-    Bytes, HostileLog,
-    ::testing::Values(QByteArray(), QByteArray("\0\0Test:\0x\0\n", 12), QByteArray("\xff\xfe\xc3(\x80 Result:\xed\xa0\x80"),
-                      QByteArray(3 * 1024 * 1024, 'A'), QByteArray("@:::::\nStatus:\n----\n----\nSuiteName:\n"),
-                      QByteArray("\r\r\r\n\n\rTime: 9999/99/99 99:99:99\nTimeStamp: x\n")));
+INSTANTIATE_TEST_SUITE_P(Bytes, HostileLog,
+                         ::testing::Values(QByteArray(), QByteArray("\0\0Test:\0x\0\n", 12),
+                                           QByteArray("\xff\xfe\xc3(\x80 Result:\xed\xa0\x80"),
+                                           QByteArray(3 * 1024 * 1024, 'A'),
+                                           QByteArray("@:::::\nStatus:\n----\n----\nSuiteName:\n"),
+                                           QByteArray("\r\r\r\n\n\rTime: 9999/99/99 99:99:99\nTimeStamp: x\n")));

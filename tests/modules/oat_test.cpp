@@ -16,12 +16,12 @@
 
 using namespace Qt::StringLiterals;
 
+using moduletest::Target;
 using ::testing::_;
 using ::testing::DoAll;
 using ::testing::NiceMock;
 using ::testing::Return;
 using ::testing::SetArgReferee;
-using moduletest::Target;
 
 namespace {
 
@@ -33,7 +33,8 @@ SysResource Program(const QByteArray &name)
     return program;
 }
 
-struct NameCase {
+struct NameCase
+{
     const char *moduleName;
     const char *mifname;
     const char *directory;
@@ -116,8 +117,8 @@ TEST_F(OatRun, PublishesTheModuleInformationFileBeforeStarting)
     module.programs << Program("OatSuite1");
     ::testing::InSequence order;
     EXPECT_CALL(device, InstallPackage(u"/oattimer.kestix"_s)).WillOnce(Return(0u));
-    EXPECT_CALL(device, CopyOnDevice(u"fs:/usermods/oattimer/oattimer.mif"_s,
-                                     u"fs:/mif/oattimer.mif"_s)).WillOnce(Return(true));
+    EXPECT_CALL(device, CopyOnDevice(u"fs:/usermods/oattimer/oattimer.mif"_s, u"fs:/mif/oattimer.mif"_s))
+        .WillOnce(Return(true));
     EXPECT_CALL(device, StartApplet(0x01010001u, _)).WillOnce(Return(0u));
     EXPECT_CALL(device, IsAppletRunning(0x01010001u)).WillOnce(Return(true)).WillOnce(Return(false));
     EXPECT_TRUE(module.Run(&device, env));
@@ -280,7 +281,8 @@ TEST_F(OatPostProcess, FrameworkPostProcessCoversTheWholeRawFolder)
     EXPECT_EQ(testutil::ReadFile(raw + u"/timer-2026.oat"_s), QByteArray("@Timer\nModuleVer: 1\n"));
 }
 
-struct MissingEntry {
+struct MissingEntry
+{
     const char *key;
     const char *message;
 };

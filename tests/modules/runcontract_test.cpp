@@ -72,8 +72,8 @@ TEST_F(RunContract, CopyLogSkipsMalformedPathsAndStampsEveryDot)
     module.deviceDirectory = u"fs:/usermods/ut/"_s;
     module.desktopLogFiles << u"stale"_s;
     EXPECT_CALL(device, ListDirectory(u"fs:/usermods/ut/log"_s, _))
-        .WillRepeatedly(ListingOf({u"nodirectory.txt"_s, u"fs:/usermods/ut/log/run.1.xml"_s,
-                                   u"fs:/usermods/ut/log/broken.txt"_s}));
+        .WillRepeatedly(
+            ListingOf({u"nodirectory.txt"_s, u"fs:/usermods/ut/log/run.1.xml"_s, u"fs:/usermods/ut/log/broken.txt"_s}));
     EXPECT_CALL(device, CopyFileFromDevice(u"fs:/usermods/ut/log/run.1.xml"_s, _))
         .WillOnce(Invoke(CopiesContent("<TestRunLog/>")));
     EXPECT_CALL(device, CopyFileFromDevice(u"fs:/usermods/ut/log/broken.txt"_s, _)).WillOnce(Return(5u));
@@ -81,8 +81,8 @@ TEST_F(RunContract, CopyLogSkipsMalformedPathsAndStampsEveryDot)
     ASSERT_TRUE(module.CopyLog(&device, env));
     ASSERT_EQ(module.desktopLogFiles.size(), 1);
     const QString copied = module.desktopLogFiles.first();
-    EXPECT_TRUE(QFileInfo(copied).fileName().contains(QRegularExpression(u"^run"_s + kStamp + u"1"_s
-                                                                         + kStamp + u"xml$"_s)))
+    EXPECT_TRUE(
+        QFileInfo(copied).fileName().contains(QRegularExpression(u"^run"_s + kStamp + u"1"_s + kStamp + u"xml$"_s)))
         << copied.toStdString();
     EXPECT_EQ(QFileInfo(copied).absolutePath(), env.value(u"LogPath"_s));
     const QString text = LogText();
@@ -99,20 +99,24 @@ TEST_F(RunContract, KindsRenameTheirLogsOnTheHost)
     EXPECT_CALL(device, CopyFileFromDevice(_, _)).WillRepeatedly(Invoke(CopiesContent("x")));
     ASSERT_TRUE(ctf.CopyLog(&device, env));
     ASSERT_EQ(ctf.desktopLogFiles.size(), 2);
-    EXPECT_TRUE(QFileInfo(ctf.desktopLogFiles[0]).fileName().contains(QRegularExpression(u"^ITimer-CTF"_s + kStamp + u"log$"_s)));
-    EXPECT_TRUE(QFileInfo(ctf.desktopLogFiles[1]).fileName().contains(QRegularExpression(u"^ctf"_s + kStamp + u"log$"_s)));
+    EXPECT_TRUE(QFileInfo(ctf.desktopLogFiles[0])
+                    .fileName()
+                    .contains(QRegularExpression(u"^ITimer-CTF"_s + kStamp + u"log$"_s)));
+    EXPECT_TRUE(
+        QFileInfo(ctf.desktopLogFiles[1]).fileName().contains(QRegularExpression(u"^ctf"_s + kStamp + u"log$"_s)));
 
     CtfAppletTestModule applet;
     applet.applets << AppletWithId(0x20);
     EXPECT_CALL(device, FindModule(0x20u, _)).WillRepeatedly(DoAll(SetArgReferee<1>(u"fs:/usermods/a/"_s), Return(0u)));
     EXPECT_CALL(device, ListDirectory(u"fs:/usermods/a/"_s, _))
-        .WillRepeatedly(ListingOf({u"fs:/usermods/a/suite_K.LOG"_s, u"fs:/usermods/a/other_k.log"_s,
-                                   u"fs:/usermods/a/notes.txt"_s}));
+        .WillRepeatedly(ListingOf(
+            {u"fs:/usermods/a/suite_K.LOG"_s, u"fs:/usermods/a/other_k.log"_s, u"fs:/usermods/a/notes.txt"_s}));
     ASSERT_TRUE(applet.CopyLog(&device, env));
     ASSERT_EQ(applet.desktopLogFiles.size(), 2);
     // "_K." passes the test but only the exact "_k." is replaced.
     EXPECT_TRUE(QFileInfo(applet.desktopLogFiles[0]).fileName().startsWith(u"suite_K-"_s));
-    EXPECT_TRUE(QFileInfo(applet.desktopLogFiles[1]).fileName().contains(QRegularExpression(u"^other"_s + kStamp + u"log$"_s)));
+    EXPECT_TRUE(
+        QFileInfo(applet.desktopLogFiles[1]).fileName().contains(QRegularExpression(u"^other"_s + kStamp + u"log$"_s)));
 }
 
 TEST_F(RunContract, RemoveTestFallsBackToTheNamedDirectory)
@@ -183,7 +187,8 @@ TEST_F(RunContract, OatStampsBeforeTheLastModuleVerLine)
     oat.AddDesktopLogFile(Write(u"t.oat"_s, "@Timer\nModuleVer: 1\nModuleVer: 2\nGUID:old\nModuleVer: 3\n"));
     oat.PostProcess(env); // no Perl cache: stamping only
     EXPECT_EQ(testutil::ReadFile(oat.desktopLogFiles[0]),
-              QByteArray("@Timer\nModuleVer: 1\nGUID:{run-1}\nManifest Name:Timer\nID Hash:\nModuleVer: 2\nGUID:old\nModuleVer: 3\n\n"));
+              QByteArray("@Timer\nModuleVer: 1\nGUID:{run-1}\nManifest Name:Timer\nID Hash:\nModuleVer: "
+                         "2\nGUID:old\nModuleVer: 3\n\n"));
 }
 
 TEST_F(RunContract, UtStampsTextAfterTheFirstLineAndXmlOnTheRoot)
@@ -228,7 +233,8 @@ TEST_F(RunContract, LogWaitsGiveUpWhenTheEndMarkerNeverComes)
     EXPECT_CALL(device, FileExists(u"fs:/shared/pek/log/timer_u.oat"_s)).WillRepeatedly(Return(true));
     EXPECT_CALL(device, CopyFileFromDevice(u"fs:/shared/pek/log/timer_u.oat"_s, _))
         .WillOnce(Return(1u))
-        .WillOnce(Invoke(CopiesContent("@Timer\n"))).WillOnce(Invoke(CopiesContent("@Timer\nRESULT: done\n")));
+        .WillOnce(Invoke(CopiesContent("@Timer\n")))
+        .WillOnce(Invoke(CopiesContent("@Timer\nRESULT: done\n")));
     EXPECT_TRUE(oat.IsLogComplete(&device));
 }
 
@@ -260,10 +266,12 @@ TEST_F(RunContract, UtCompletionNeedsBothMarkers)
         .WillRepeatedly(ListingOf({u"fs:/usermods/ut/log/r.txt"_s, u"fs:/usermods/ut/log/r.xml"_s}));
     int textCopies = 0;
     EXPECT_CALL(device, CopyFileFromDevice(u"fs:/usermods/ut/log/r.xml"_s, _))
-        .WillOnce(Invoke(CopiesContent("<TestRunLog>"))).WillOnce(Invoke(CopiesContent("<TestRunLog></TestRunLog>")));
+        .WillOnce(Invoke(CopiesContent("<TestRunLog>")))
+        .WillOnce(Invoke(CopiesContent("<TestRunLog></TestRunLog>")));
     EXPECT_CALL(device, CopyFileFromDevice(u"fs:/usermods/ut/log/r.txt"_s, _))
         .WillRepeatedly(Invoke([&textCopies](const QString &, const QString &host) {
-            return CopiesContent(++textCopies < 4 ? "elapsed time: lower case\n" : "Elapsed Time: 1s\n")(QString(), host);
+            return CopiesContent(++textCopies < 4 ? "elapsed time: lower case\n" : "Elapsed Time: 1s\n")(QString(),
+                                                                                                         host);
         }));
     EXPECT_TRUE(ut.IsLogComplete(&device));
     EXPECT_EQ(textCopies, 4);
@@ -318,8 +326,8 @@ TEST_F(RunContract, CtfRunResetsTheLogAndStartsThePreferredProgram)
     ctf.targets.insert(u"t"_s, Target(u"/c.kestix"_s, IKestoDevice::PLATFORM_UNKNOWN));
     env.insert(u"DataCachePath"_s, dir.path());
 
-    EXPECT_CALL(device, CopyFileToDevice(QDir::cleanPath(dir.path()) + u"/CTF.log"_s,
-                                         u"fs:/usermods/CTF/CTF.log"_s)).WillRepeatedly(Return(0u));
+    EXPECT_CALL(device, CopyFileToDevice(QDir::cleanPath(dir.path()) + u"/CTF.log"_s, u"fs:/usermods/CTF/CTF.log"_s))
+        .WillRepeatedly(Return(0u));
     EXPECT_CALL(device, InstallPackage(_)).WillRepeatedly(Return(0u));
     EXPECT_CALL(device, StartProgram(u"Foo_k_main"_s, u"-v"_s)).WillOnce(Return(0u)).WillOnce(Return(2u));
     EXPECT_CALL(device, IsProgramRunning(_)).WillRepeatedly(Return(true));

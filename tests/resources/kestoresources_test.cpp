@@ -1,8 +1,8 @@
 #include "resources/kestoresources.h"
 
+#include "bytes.h"
 #include "encoding/qencoding.h"
 #include "support/testutil.h"
-#include "bytes.h"
 
 #include <QTemporaryDir>
 
@@ -27,10 +27,16 @@ bool HasConverter(quint16 format)
 TEST(KestoResources, NamesTheKnownTypesAndFormats)
 {
     KestoResources resources;
-    const std::pair<quint16, const char *> types[] = {
-        {0x0001, "Strings"}, {0x0006, "Objects"}, {0x5000, "Binaries"}, {0x6000, "Sys Resource"},
-        {0x6001, "Granted Priviledges"}, {0x6002, "Required Priviledges"}, {0x6011, "Priviledge Data"},
-        {7, "Type: 7 (0x0007)"}, {4096, "Type: 4096 (0x1000)"}, {0xBEEF, "Type: 48879 (0xbeef)"}};
+    const std::pair<quint16, const char *> types[] = {{0x0001, "Strings"},
+                                                      {0x0006, "Objects"},
+                                                      {0x5000, "Binaries"},
+                                                      {0x6000, "Sys Resource"},
+                                                      {0x6001, "Granted Priviledges"},
+                                                      {0x6002, "Required Priviledges"},
+                                                      {0x6011, "Priviledge Data"},
+                                                      {7, "Type: 7 (0x0007)"},
+                                                      {4096, "Type: 4096 (0x1000)"},
+                                                      {0xBEEF, "Type: 48879 (0xbeef)"}};
     for (const auto &[type, name] : types)
         EXPECT_EQ(resources.GetResourceTypeName(type), QLatin1String(name));
 
@@ -113,15 +119,16 @@ TEST_P(KestoStringRoundTrip, ReadsBackTheStoredText)
     EXPECT_EQ(format, c.format == 2 ? 5 : c.format);
 }
 
-INSTANTIATE_TEST_SUITE_P(
-    KestoResources, KestoStringRoundTrip,
-    ::testing::Values(StringCase{0, u"AB"}, StringCase{0, u"A"}, StringCase{0, u"\u00dcn\u00ef \U0001D11E"},
-                      StringCase{0, u""}, StringCase{1, u"A"}, StringCase{1, u"caf\u00e9"},
-                      StringCase{1, u"\u0003lead"}, StringCase{6, u"A"}, StringCase{6, u"AB"},
-                      StringCase{6, u"h\u00e9llo \u20ac"}, StringCase{6, u"\u65e5"}, StringCase{2, u"A"},
-                      StringCase{2, u"\ud55c\uae00 AB"}, StringCase{3, u"A"}, StringCase{3, u"\u65e5\u672c AB"},
-                      StringCase{4, u"A"}, StringCase{4, u"\u4e2d\u6587 AB"}, StringCase{5, u"A"},
-                      StringCase{5, u"\ud55c\uae00 AB"}));
+INSTANTIATE_TEST_SUITE_P(KestoResources, KestoStringRoundTrip,
+                         ::testing::Values(StringCase{0, u"AB"}, StringCase{0, u"A"},
+                                           StringCase{0, u"\u00dcn\u00ef \U0001D11E"}, StringCase{0, u""},
+                                           StringCase{1, u"A"}, StringCase{1, u"caf\u00e9"},
+                                           StringCase{1, u"\u0003lead"}, StringCase{6, u"A"}, StringCase{6, u"AB"},
+                                           StringCase{6, u"h\u00e9llo \u20ac"}, StringCase{6, u"\u65e5"},
+                                           StringCase{2, u"A"}, StringCase{2, u"\ud55c\uae00 AB"}, StringCase{3, u"A"},
+                                           StringCase{3, u"\u65e5\u672c AB"}, StringCase{4, u"A"},
+                                           StringCase{4, u"\u4e2d\u6587 AB"}, StringCase{5, u"A"},
+                                           StringCase{5, u"\ud55c\uae00 AB"}));
 
 struct IconvCase
 {
@@ -146,8 +153,7 @@ TEST_P(KestoStringFromIconv, DecodesTextEncodedElsewhere)
     testutil::WriteFile(dir.filePath("in.txt"), text.toUtf8());
     QByteArray encoded;
     ASSERT_EQ(testutil::RunProgram(u"iconv"_s,
-                                   {u"-f"_s, u"UTF-8"_s, u"-t"_s,
-                                    QLatin1String(c.charset), dir.filePath("in.txt")},
+                                   {u"-f"_s, u"UTF-8"_s, u"-t"_s, QLatin1String(c.charset), dir.filePath("in.txt")},
                                    &encoded),
               0);
     KestoResources resources;

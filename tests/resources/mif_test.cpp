@@ -1,8 +1,8 @@
 #include "resources/kestoresources.h"
 
+#include "bytes.h"
 #include "common/xmlwriter.h"
 #include "support/testutil.h"
-#include "bytes.h"
 
 #include <QDomDocument>
 
@@ -190,9 +190,9 @@ TEST(SysResource, ProgramRecordWithAnEightByteKey)
 {
     KestoResources resources;
     resources.AddBinary(0x6000, 1, SysBlock(8, 0x0102FAF7, QByteArray("tests\0\0\0", 8), {1, 2, 3, 4, 5, 6, 7, 8, 0}));
-    resources.AddBinary(0x6000, 2,
-                        SysBlock(8, 0x0102C305, QByteArray("other\0\0\0", 8), {1, 2, 3, 4, 5, 6, 7, 8, 6},
-                                 QByteArray("-v x\0\0", 6)));
+    resources.AddBinary(
+        0x6000, 2,
+        SysBlock(8, 0x0102C305, QByteArray("other\0\0\0", 8), {1, 2, 3, 4, 5, 6, 7, 8, 6}, QByteArray("-v x\0\0", 6)));
     SysResource record;
     ASSERT_TRUE(resources.GetSysResource(1, record));
     EXPECT_TRUE(record.IsProgram());
@@ -221,8 +221,9 @@ TEST(SysResource, DecodesEachKindOfRecord)
     KestoResources resources;
     resources.AddBinary(0x6000, 1, SysBlock(4, 0x0103C6D9, Hex("2A000000"), {3, 5}, "prog!"));
     resources.AddBinary(0x6000, 2, SysBlock(0, 0x01089D3C, {}, {1, 2, 3, 4, 5, 6, 7, 8, 9}));
-    resources.AddBinary(0x6000, 3, SysBlock(0, 0x0108AC1E, {}, {1, 2, 3, 2, 9, 3, 7, 10, 11, 20, 21, 30, 31},
-                                            QByteArray("ab\0junk", 7)));
+    resources.AddBinary(
+        0x6000, 3,
+        SysBlock(0, 0x0108AC1E, {}, {1, 2, 3, 2, 9, 3, 7, 10, 11, 20, 21, 30, 31}, QByteArray("ab\0junk", 7)));
     resources.AddBinary(0x6000, 4, SysBlock(0, 0x0108BFD2, {}, {12}));
     resources.AddBinary(0x6000, 5, SysBlock(10, 0x01010100, "a::prog:x", {}));
     resources.AddBinary(0x6000, 6, SysBlock(4, 0x01010100, "ab:c", {}));

@@ -14,7 +14,7 @@ TEST(MifBuilder, WritesWhatTheModuleInformationQueriesReadBack)
     mif.AddClass(0x10203040);
     mif.AddApplet(0x0A0B0C0D, 3, 1200);
     mif.AddProgram(u"ITimer_k"_s, u"-v -n 3"_s);
-    mif.AddProgram(u"abc"_s, QString(), SysResource::kTypeProgram);  // a key of four bytes with its NUL
+    mif.AddProgram(u"abc"_s, QString(), SysResource::kTypeProgram); // a key of four bytes with its NUL
     mif.AddSuiteProgram(u"oat:suite:AudioSuite"_s);
 
     KestoResources resources;

@@ -1,7 +1,7 @@
 #include "resources/resourcestream.h"
 
-#include "support/testutil.h"
 #include "bytes.h"
+#include "support/testutil.h"
 
 #include <QFile>
 #include <QRandomGenerator>
@@ -53,7 +53,10 @@ QByteArray RichFile()
 {
     // Map 4 entries (32 bytes) and 6 offsets (24 bytes): data at 88.
     return Compose({{1, 6, 0, 0}, {5, 10, 2, 1}, {5, 20, 0, 0}, {7, 1, 0, 4}}, {88, 91, 91, 95, 96, 96},
-                   "abc" "wxyz" "!", 5);
+                   "abc"
+                   "wxyz"
+                   "!",
+                   5);
 }
 
 // 20 map entries of 20 IDs each over 20 blocks, the last of `tail` bytes:
@@ -95,7 +98,7 @@ TEST(ResourceStream, OnePairOfFiveBytesSavesAs53Bytes)
     const QByteArray expected = Hex("11 00 0100 0100 0100 20000000 08000000 28000000 01000000 30000000 05000000"
                                     "0100 0100 0000 0000"
                                     "30000000 35000000")
-                                + "hello";
+        + "hello";
     ASSERT_EQ(expected.size(), 53);
     EXPECT_EQ(ReadFile(dir.filePath("one.kar")), expected);
     EXPECT_EQ(Save(stream), expected);
@@ -107,31 +110,31 @@ TEST(ResourceStream, DumpShowsTheStructuresAsWritten)
     stream.AddResource(1, 1, "hello");
     Save(stream);
     const QString expected = u"=== Header ===\n"
-        "   FileType:             17(0x      11)\n"
-        "   Version:              1(0x       1)\n"
-        "   Oldest Code Version:  1(0x       1)\n"
-        "   Number of Map Entries:1(0x       1)\n"
-        "   Offset to Map:        32(0x      20)\n"
-        "   Length of Map:        8(0x       8)\n"
-        "   Offset to Entries:    40(0x      28)\n"
-        "   Number of Resources:  1(0x       1)\n"
-        "   Offset to Resources:  48(0x      30)\n"
-        "   Length of Resources:  5(0x       5)\n"
-        "=== FileMap ===\n"
-        "   Entries:1\n"
-        "   === FileMapEntry ===\n"
-        "      Type:              1(0x       1)\n"
-        "      Beginning Res ID:  1(0x       1)\n"
-        "      Additional Res ID: 0(0x       0)\n"
-        "      Offset Index:      0(0x       0)\n"
-        "\n"
-        "   === Offset Table ===\n"
-        "      Count: 2\n"
-        "      Offset: 48 (0x      30)\n"
-        "      Offset: 53 (0x      35)\n"
-        "=== Resources ===\n"
-        "   Number of: 1\n"
-        "    Resource: 5\n"_s;
+                             "   FileType:             17(0x      11)\n"
+                             "   Version:              1(0x       1)\n"
+                             "   Oldest Code Version:  1(0x       1)\n"
+                             "   Number of Map Entries:1(0x       1)\n"
+                             "   Offset to Map:        32(0x      20)\n"
+                             "   Length of Map:        8(0x       8)\n"
+                             "   Offset to Entries:    40(0x      28)\n"
+                             "   Number of Resources:  1(0x       1)\n"
+                             "   Offset to Resources:  48(0x      30)\n"
+                             "   Length of Resources:  5(0x       5)\n"
+                             "=== FileMap ===\n"
+                             "   Entries:1\n"
+                             "   === FileMapEntry ===\n"
+                             "      Type:              1(0x       1)\n"
+                             "      Beginning Res ID:  1(0x       1)\n"
+                             "      Additional Res ID: 0(0x       0)\n"
+                             "      Offset Index:      0(0x       0)\n"
+                             "\n"
+                             "   === Offset Table ===\n"
+                             "      Count: 2\n"
+                             "      Offset: 48 (0x      30)\n"
+                             "      Offset: 53 (0x      35)\n"
+                             "=== Resources ===\n"
+                             "   Number of: 1\n"
+                             "    Resource: 5\n"_s;
     EXPECT_EQ(stream.Dump(), expected);
 }
 
@@ -144,7 +147,7 @@ TEST(ResourceStream, IdenticalBlocksAreStoredOnceAndTheOffsetTableRepeatsItsEnd)
                                     "0200 0100 0000 0000"
                                     "0200 0900 0000 0000"
                                     "3C000000 40000000 40000000")
-                                + "same";
+        + "same";
     EXPECT_EQ(Save(stream), expected);
 }
 
@@ -303,15 +306,14 @@ TEST_P(ResourceStreamCorrupt, IsRejectedAndChangesNothing)
 
 INSTANTIATE_TEST_SUITE_P(
     ResourceStream, ResourceStreamCorrupt,
-    ::testing::Values(
-        CorruptCase{"Empty", QByteArray()}, CorruptCase{"ShortHeader", QByteArray(31, '\0')},
-        CorruptCase{"HugeResourceCount", Compose({}, {}, QByteArray(), 0xFFFFFFFFu)},
-        CorruptCase{"MapCountPastInput", Compose({{1, 1, 0, 0}}, {48, 49}, "x", 1).left(40)},
-        CorruptCase{"OffsetsRunBackwards", Compose({{1, 1, 0, 0}, {1, 2, 0, 1}}, {60, 62, 61}, "xy", 2)},
-        CorruptCase{"OffsetPastInput", Compose({{1, 1, 0, 0}}, {48, 4000}, "x", 1)},
-        CorruptCase{"OffsetIndexPastBlocks", Compose({{1, 1, 0, 1}}, {48, 49}, "x", 1)},
-        CorruptCase{"RangePastBlocks", Compose({{5, 10, 3, 0}}, {52, 53, 55, 58}, "ABBCCC", 3)},
-        CorruptCase{"RangesCoverMoreIdsThanInputBytes", ManyRanges(123)}),
+    ::testing::Values(CorruptCase{"Empty", QByteArray()}, CorruptCase{"ShortHeader", QByteArray(31, '\0')},
+                      CorruptCase{"HugeResourceCount", Compose({}, {}, QByteArray(), 0xFFFFFFFFu)},
+                      CorruptCase{"MapCountPastInput", Compose({{1, 1, 0, 0}}, {48, 49}, "x", 1).left(40)},
+                      CorruptCase{"OffsetsRunBackwards", Compose({{1, 1, 0, 0}, {1, 2, 0, 1}}, {60, 62, 61}, "xy", 2)},
+                      CorruptCase{"OffsetPastInput", Compose({{1, 1, 0, 0}}, {48, 4000}, "x", 1)},
+                      CorruptCase{"OffsetIndexPastBlocks", Compose({{1, 1, 0, 1}}, {48, 49}, "x", 1)},
+                      CorruptCase{"RangePastBlocks", Compose({{5, 10, 3, 0}}, {52, 53, 55, 58}, "ABBCCC", 3)},
+                      CorruptCase{"RangesCoverMoreIdsThanInputBytes", ManyRanges(123)}),
     [](const ::testing::TestParamInfo<CorruptCase> &info) { return std::string(info.param.name); });
 
 TEST(ResourceStream, LoadsAsManyIdsAsInputBytesAndNoMore)

@@ -45,9 +45,7 @@ ResultsView ReadResults(const QString &path)
     return view;
 }
 
-KitRun::KitRun()
-    : m_env("KESTIX_DATA_ROOT", m_dir.filePath(u"data"_s))
-    , m_kit(m_dir.filePath(u"kit"_s))
+KitRun::KitRun() : m_env("KESTIX_DATA_ROOT", m_dir.filePath(u"data"_s)), m_kit(m_dir.filePath(u"kit"_s))
 {
     EXPECT_TRUE(m_dir.isValid());
 }

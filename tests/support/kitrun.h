@@ -115,7 +115,6 @@ private:
 // written, "done <module> <handset>" to runs.txt in the handsets folder. A
 // handset folder holding "drop-at" (a number n) goes offline in the n-th
 // module it starts, before that module writes its log.
-QStringList AddShardModules(kitbuilder::KitBuilder &kit, int ctfModules, int appletModules,
-                            const QString &seconds);
+QStringList AddShardModules(kitbuilder::KitBuilder &kit, int ctfModules, int appletModules, const QString &seconds);
 
 } // namespace testutil

@@ -10,7 +10,7 @@
 class MockDevice : public IKestoDevice
 {
 public:
-    MockDevice() : IKestoDevice(ConnectTarget(QStringLiteral("mock"), QStringLiteral("mock handset"))) {}
+    MockDevice() : IKestoDevice(ConnectTarget(QStringLiteral("mock"), QStringLiteral("mock handset"))) { }
 
     MOCK_METHOD(unsigned int, GetPlatformVersion, (QString &), (override));
     MOCK_METHOD(unsigned int, StartProgram, (const QString &, const QString &), (override));

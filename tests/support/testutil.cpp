@@ -47,8 +47,7 @@ void EnvGuard::Unset(const char *name)
     qunsetenv(name);
 }
 
-CurrentDirectory::CurrentDirectory(const QString &path)
-    : m_previous(QDir::currentPath())
+CurrentDirectory::CurrentDirectory(const QString &path) : m_previous(QDir::currentPath())
 {
     QDir::setCurrent(path);
 }
