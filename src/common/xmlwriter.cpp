@@ -109,14 +109,15 @@ void AppendEscaped(QString &out, const QString &text, bool attribute, bool ascii
     }
 }
 
-QString Quoted(const QString &value)
+} // namespace
+
+QString Escape(const QString &text, bool attribute, bool ascii)
 {
-    const QChar quote = value.contains(QLatin1Char('"')) ? QLatin1Char('\'') : QLatin1Char('"');
-    return quote + value + quote;
+    QString out;
+    AppendEscaped(out, text, attribute, ascii);
+    return out;
 }
 
-// The nodes of a map ordered by name: Qt keeps attributes and declarations
-// in a seeded hash, so their own order changes from run to run.
 std::vector<QDomNode> SortedByName(const QDomNamedNodeMap &map)
 {
     const int count = map.count();
@@ -138,6 +139,8 @@ std::vector<QDomNode> SortedByName(const QDomNamedNodeMap &map)
         sorted.push_back(std::move(entry.second));
     return sorted;
 }
+
+namespace {
 
 // Character data and entity references run inline: no indent or line end is
 // added around them.
@@ -185,7 +188,6 @@ public:
             SaveEntityReference(node.nodeName());
             break;
         case QDomNode::DocumentTypeNode:
-            SaveDocumentType(node.toDocumentType());
             break;
         default:
             break;
@@ -444,28 +446,14 @@ private:
             Save(child, depth);
     }
 
-    // Qt keeps a parsed document type declaration beside the document's
-    // children rather than among them; it is written where it stood: after
-    // the XML declaration, before everything else.
+    // A document type declaration is left to the one kind of document that
+    // keeps one, the flattened device pack (FlattenDeviceXml).
     void SaveDocument(const QDomDocument &document, int depth)
     {
-        const QDomDocumentType type = document.doctype();
-        bool typePending = !type.isNull() && !type.name().isEmpty();
         for (QDomNode child = document.firstChild(); !child.isNull(); child = child.nextSibling()) {
-            if (child.isDocumentType())
-                typePending = false;
+            if (!child.isDocumentType())
+                Save(child, depth);
         }
-        for (QDomNode child = document.firstChild(); !child.isNull(); child = child.nextSibling()) {
-            const bool declaration
-                = child.isProcessingInstruction() && child.toProcessingInstruction().target() == QLatin1String("xml");
-            if (typePending && !declaration) {
-                SaveDocumentType(type);
-                typePending = false;
-            }
-            Save(child, depth);
-        }
-        if (typePending)
-            SaveDocumentType(type);
     }
 
     void Indent(const QDomNode &node, int depth)
@@ -514,64 +502,6 @@ private:
             m_out += QLatin1String("/>");
         }
         LineEnd(element);
-    }
-
-    void SaveDocumentType(const QDomDocumentType &type)
-    {
-        m_out += QLatin1String("<!DOCTYPE ") + type.name();
-        if (!type.publicId().isEmpty()) {
-            m_out += QLatin1String(" PUBLIC ") + Quoted(type.publicId());
-            if (!type.systemId().isEmpty())
-                m_out += QLatin1Char(' ') + Quoted(type.systemId());
-        } else if (!type.systemId().isEmpty()) {
-            m_out += QLatin1String(" SYSTEM ") + Quoted(type.systemId());
-        }
-        const QDomNamedNodeMap entities = type.entities();
-        const QDomNamedNodeMap notations = type.notations();
-        if (entities.count() > 0 || notations.count() > 0) {
-            m_out += QLatin1String(" [\n");
-            for (const QDomNode &entity : SortedByName(entities))
-                SaveEntity(entity.toEntity());
-            for (const QDomNode &notation : SortedByName(notations))
-                SaveNotation(notation.toNotation());
-            m_out += QLatin1Char(']');
-        }
-        m_out += QLatin1String(">\n");
-    }
-
-    void SaveEntity(const QDomEntity &entity)
-    {
-        QString name = entity.nodeName();
-        if (name.startsWith(QLatin1Char('%')))
-            name = QLatin1String("% ") + name.mid(1);
-        m_out += QLatin1String("<!ENTITY ") + name + QLatin1Char(' ');
-        if (entity.systemId().isEmpty() && entity.publicId().isEmpty()) {
-            m_out += QLatin1Char('"');
-            AppendEscaped(m_out, entity.nodeValue(), true, m_ascii);
-            m_out += QLatin1Char('"');
-        } else {
-            if (entity.publicId().isEmpty())
-                m_out += QLatin1String("SYSTEM ") + Quoted(entity.systemId());
-            else
-                m_out += QLatin1String("PUBLIC ") + Quoted(entity.publicId()) + QLatin1Char(' ')
-                    + Quoted(entity.systemId());
-            if (!entity.notationName().isEmpty())
-                m_out += QLatin1String(" NDATA ") + entity.notationName();
-        }
-        m_out += QLatin1String(">\n");
-    }
-
-    void SaveNotation(const QDomNotation &notation)
-    {
-        m_out += QLatin1String("<!NOTATION ") + notation.nodeName() + QLatin1Char(' ');
-        if (!notation.publicId().isEmpty()) {
-            m_out += QLatin1String("PUBLIC ") + Quoted(notation.publicId());
-            if (!notation.systemId().isEmpty())
-                m_out += QLatin1Char(' ') + Quoted(notation.systemId());
-        } else {
-            m_out += QLatin1String("SYSTEM ") + Quoted(notation.systemId());
-        }
-        m_out += QLatin1String(">\n");
     }
 
     int m_indent;

@@ -8,6 +8,7 @@
 #include <QString>
 
 #include <memory>
+#include <vector>
 
 class QIODevice;
 class XmlNode;
@@ -16,7 +17,9 @@ class XmlNode;
 // attributes in a seeded hash, so QDomDocument::toString orders them
 // differently from run to run; this writer orders attributes by name, indents
 // each level by `indent` blanks and writes exactly the nodes the document
-// holds (no XML declaration unless the document has one).
+// holds (no XML declaration unless the document has one), except a document
+// type declaration: only a flattened device pack keeps one, and the
+// device-pack code writes it.
 namespace XmlWriter {
 
 HARNESS_EXPORT QString ToString(const QDomNode &node, int indent = 1);
@@ -26,6 +29,14 @@ HARNESS_EXPORT QString ToString(const QDomNode &node, int indent = 1);
 // text reads the same under any encoding its declaration names. Names,
 // comments and processing instructions are written as they are.
 HARNESS_EXPORT QString ToAsciiString(const QDomNode &node, int indent = 1);
+
+// Text as ToString writes it in character data (attribute false) or in a
+// double-quoted attribute or entity value (attribute true).
+HARNESS_EXPORT QString Escape(const QString &text, bool attribute, bool ascii);
+
+// The nodes of a map ordered by name: Qt keeps attributes and declarations
+// in a seeded hash, so their own order changes from run to run.
+HARNESS_EXPORT std::vector<QDomNode> SortedByName(const QDomNamedNodeMap &map);
 
 // UTF-8 bytes of ToString.
 HARNESS_EXPORT QByteArray Serialize(const QDomNode &node, int indent = 1);

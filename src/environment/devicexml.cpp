@@ -371,21 +371,72 @@ void MergeDuplicateSections(QDomDocument &document)
     }
 }
 
-// The document as 8-bit-safe text. A document type declaration with an
-// internal subset that follows other markup (the XML declaration) is dropped
-// with the line end before it, unless a reference it declares is still in
-// the document.
+QString Quoted(const QString &value)
+{
+    const QChar quote = value.contains(QLatin1Char('"')) ? QLatin1Char('\'') : QLatin1Char('"');
+    return quote + value + quote;
+}
+
+QString ExternalId(const QString &publicId, const QString &systemId)
+{
+    if (!publicId.isEmpty())
+        return QLatin1String("PUBLIC ") + Quoted(publicId)
+            + (systemId.isEmpty() ? QString() : QLatin1Char(' ') + Quoted(systemId));
+    return QLatin1String("SYSTEM ") + Quoted(systemId);
+}
+
+// A document type declaration on lines of its own, its entities and
+// notations in name order, every character beyond ASCII as a reference.
+QString DocumentTypeText(const QDomDocumentType &type)
+{
+    QString text = QLatin1String("<!DOCTYPE ") + type.name();
+    if (!type.publicId().isEmpty() || !type.systemId().isEmpty())
+        text += QLatin1Char(' ') + ExternalId(type.publicId(), type.systemId());
+    const QDomNamedNodeMap entities = type.entities();
+    const QDomNamedNodeMap notations = type.notations();
+    if (entities.count() > 0 || notations.count() > 0) {
+        text += QLatin1String(" [\n");
+        for (const QDomNode &node : XmlWriter::SortedByName(entities)) {
+            const QDomEntity entity = node.toEntity();
+            QString name = entity.nodeName();
+            if (name.startsWith(QLatin1Char('%')))
+                name = QLatin1String("% ") + name.mid(1);
+            text += QLatin1String("<!ENTITY ") + name + QLatin1Char(' ');
+            if (entity.systemId().isEmpty() && entity.publicId().isEmpty()) {
+                text += QLatin1Char('"') + XmlWriter::Escape(entity.nodeValue(), true, true) + QLatin1Char('"');
+            } else {
+                text += ExternalId(entity.publicId(), entity.systemId());
+                if (!entity.notationName().isEmpty())
+                    text += QLatin1String(" NDATA ") + entity.notationName();
+            }
+            text += QLatin1String(">\n");
+        }
+        for (const QDomNode &notation : XmlWriter::SortedByName(notations))
+            text += QLatin1String("<!NOTATION ") + notation.nodeName() + QLatin1Char(' ')
+                + ExternalId(notation.toNotation().publicId(), notation.toNotation().systemId()) + QLatin1String(">\n");
+        text += QLatin1Char(']');
+    }
+    return text + QLatin1String(">\n");
+}
+
+// The document as 8-bit-safe text, its document type declaration after the
+// XML declaration and before everything else. A declaration with an internal
+// subset that follows other markup (the XML declaration) is dropped, unless a
+// reference it declares is still in the document.
 QString SerializeFlattened(const Expansion &expansion)
 {
     QString text = XmlWriter::ToAsciiString(expansion.document, 1);
     const QDomDocumentType type = expansion.document.doctype();
-    if (expansion.unresolved || type.isNull() || type.name().isEmpty())
+    if (type.isNull() || type.name().isEmpty())
         return text;
-    const QString declaration = XmlWriter::ToAsciiString(type, 1);
-    const qsizetype at = text.indexOf(declaration);
-    const qsizetype close = declaration.lastIndexOf(QLatin1String("]>"));
-    if (at >= 1 && close >= 0)
-        text.remove(at - 1, close + 2 + 1);
+    const QDomNode first = expansion.document.firstChild();
+    const bool afterDeclaration
+        = first.isProcessingInstruction() && first.toProcessingInstruction().target() == QLatin1String("xml");
+    const qsizetype at = afterDeclaration ? text.indexOf(QLatin1Char('\n')) + 1 : 0;
+    const QString declaration = DocumentTypeText(type);
+    if (!expansion.unresolved && at >= 1 && declaration.contains(QLatin1String("]>")))
+        return text;
+    text.insert(at, declaration);
     return text;
 }
 
