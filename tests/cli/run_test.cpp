@@ -481,6 +481,32 @@ TEST_F(DemoRun, SharedRunsNameTheHandsetOfEachModule)
     EXPECT_TRUE(r.out.contains("Handset demo-phone3 could not be connected"));
 }
 
+TEST_F(DemoRun, RunAndProcessTakeTheKitPlatformAndLogTheyAreGiven)
+{
+    // Without the variables there is no kit; the options name it instead.
+    const QString kit = env.value(u"KESTIX_TESTSET"_s);
+    const QString platform = env.value(u"KESTIX_PLATFORM"_s);
+    for (const QString &name :
+         {u"KESTIX_TESTSET"_s, u"KESTIX_PLATFORM"_s, u"KESTIX_TESTSETS_ALL"_s, u"KESTIX_PLATFORMS_ALL"_s})
+        env.remove(name);
+    const QString log = dir.filePath(u"given.log"_s);
+    EXPECT_EQ(RunTool({u"run"_s, u"IClock"_s}, env, dir.path()).status, 2);
+    const ToolResult run = RunTool(
+        {u"run"_s, u"--kit"_s, kit, u"--platform"_s, platform, u"--log"_s, log, u"IClock"_s, u"PlatformVersion"_s}, env,
+        dir.path());
+    EXPECT_EQ(run.status, 0) << run.err.constData();
+    EXPECT_EQ(Rows(run.out).size(), 2) << run.out.constData(); // a kit module and a platform module
+    EXPECT_TRUE(testutil::ReadFile(log).contains("Running KVK test IClock"));
+
+    const QString logs = targets + u"/demo-phone/Logs"_s;
+    const QString processLog = dir.filePath(u"process.log"_s);
+    const ToolResult process = RunTool(
+        {u"process"_s, u"--kit"_s, kit, u"--platform"_s, platform, u"--log"_s, processLog, u"--log-dir"_s, logs}, env,
+        dir.path());
+    EXPECT_EQ(process.status, 0) << process.err.constData();
+    EXPECT_TRUE(testutil::ReadFile(processLog).contains("Process Complete"));
+}
+
 TEST_F(DemoRun, ShardsOfOneSelectionMergeIntoTheVerdictsOfOneRun)
 {
     // The plan touches no handset.

@@ -15,7 +15,8 @@ TEST(ToolUsage, BadUsageExitsWithTwoAndExplainsOnStandardError)
 {
     for (const QStringList &arguments :
          {QStringList{}, QStringList{QStringLiteral("no-such-command")}, QStringList{QStringLiteral("hash")},
-          QStringList{QStringLiteral("hash"), QStringLiteral("--bogus"), QStringLiteral("x")}}) {
+          QStringList{QStringLiteral("hash"), QStringLiteral("--bogus"), QStringLiteral("x")},
+          QStringList{QStringLiteral("manifest"), QStringLiteral("extra")}}) {
         const ToolResult r = RunTool(arguments);
         EXPECT_EQ(r.status, 2) << arguments.join(QLatin1Char(' ')).toStdString();
         EXPECT_TRUE(r.out.isEmpty());
