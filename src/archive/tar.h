@@ -94,10 +94,12 @@ public:
     // Copies the file name, the entry list and the members added for
     // writing; the copy starts closed.
     Tar(const Tar &other);
+    // Closes this archive's open file, then copies as the copy constructor does.
     Tar &operator=(const Tar &other);
 
     // The archive's path, used by the next Open.
     void SetFileName(const QString &name);
+    // The archive's path; empty until set or given to Open.
     QString FileName() const;
 
     // Opens the archive (path, when not empty, becomes the file name) and
@@ -130,6 +132,7 @@ public:
     // Members for Write, in the order added. A name ending in "/" given to
     // AddFile is refused by Write; AddDirectory adds the "/" itself.
     void AddFile(const QString &name, const QByteArray &data, unsigned int mode = 0644);
+    // Adds a directory member (type '5'), appending "/" to name when missing.
     void AddDirectory(const QString &name, unsigned int mode = 0755);
     // Drops the members added for writing.
     void ClearMembers();

@@ -33,6 +33,7 @@ public:
     ~Manifest();
     // Copies share the modules and frameworks of other.
     Manifest(const Manifest &other);
+    // Shares the modules and frameworks of other, as a copy does.
     Manifest &operator=(const Manifest &other);
 
     // The message sink (not owned; null silences).

@@ -46,6 +46,7 @@ public:
 
     // The range of the listed files, as begin() and end().
     const_iterator FirstFile() const { return files.cbegin(); }
+    // See FirstFile().
     const_iterator LastFile() const { return files.cend(); }
     // True when the directory holds a file.
     bool HasFiles() const { return !files.isEmpty(); }

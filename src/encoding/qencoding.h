@@ -50,6 +50,7 @@ public:
 
     // The most and the fewest bytes one character takes in the encoding.
     virtual unsigned int MaxCharSize() = 0;
+    // See MaxCharSize().
     virtual unsigned int MinCharSize() = 0;
 
     // Room UnicodeToChar needs: at most 4 bytes plus the terminating NUL.

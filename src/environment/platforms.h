@@ -18,6 +18,7 @@ public:
     Platform();
     // Records copy member by member.
     Platform(const Platform &other);
+    // Records copy member by member.
     Platform &operator=(const Platform &other);
 
     QString name; // directory name without its " pro" edition word
@@ -36,6 +37,7 @@ public:
     TestKit();
     // Records copy member by member.
     TestKit(const TestKit &other);
+    // Records copy member by member.
     TestKit &operator=(const TestKit &other);
     ~TestKit();
 

@@ -11,6 +11,7 @@ public:
     CtfAppletTestModule();
     ~CtfAppletTestModule() override;
 
+    // The kind's type word, "ctfapplet", as TestType() answers and manifests write it.
     static QString Type();
 
     QString TestType() override;

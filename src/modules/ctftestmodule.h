@@ -15,6 +15,7 @@ public:
     CtfTestModule();
     ~CtfTestModule() override;
 
+    // The kind's type word, "ctf", as TestType() answers and manifests write it.
     static QString Type();
 
     QString TestType() override;
@@ -51,7 +52,10 @@ public:
     bool ReadFromManifest(const XmlNode &element) override;
     void WriteToManifest(XmlNode &element) override;
 
+    // The program records read from the package or the manifest; the program
+    // run is the first whose "Key" contains the module name + "_k", else the first.
     QList<SysResource> programs;
+    // The handset logs found by the first GetLogFilePaths that found any; empty until then.
     QStringList logPaths;
 
 private:

@@ -8,6 +8,7 @@
 class HARNESS_EXPORT _OatFramework : public _Framework
 {
 public:
+    // The class ID of the OAT framework applet.
     static constexpr unsigned int kClassId = 0x01010001;
 
     _OatFramework();

@@ -15,6 +15,7 @@ public:
     OatTestModule();
     ~OatTestModule() override;
 
+    // The kind's type word, "oat", as TestType() answers and manifests write it.
     static QString Type();
 
     QString TestType() override;
@@ -62,7 +63,9 @@ public:
     // lower-cased.
     QString LogBasePath() const;
 
+    // The module information file name from the package or manifest; empty when none (see MifFileName()).
     QString mifname;
+    // The program records read from the package or the manifest; the first one is the module's program.
     QList<SysResource> programs;
 
 private:

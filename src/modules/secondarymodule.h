@@ -12,6 +12,7 @@ public:
     SecondaryModule();
     ~SecondaryModule() override;
 
+    // The kind's type word, "secondary", as TestType() answers and manifests write it.
     static QString Type();
 
     QString TestType() override;

@@ -11,6 +11,7 @@ public:
     UTTestModule();
     ~UTTestModule() override;
 
+    // The kind's type word, "uitf", as TestType() answers and manifests write it.
     static QString Type();
 
     QString TestType() override;

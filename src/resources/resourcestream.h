@@ -15,17 +15,17 @@ public:
     // Back to the values of a new header.
     void Reset() { *this = ResourceHeader(); }
 
-    quint8 fileType = 17;
-    quint8 reserved = 0;
-    quint16 version = 1;
-    quint16 oldestCodeVersion = 1;
-    quint16 mapEntries = 0;
-    quint32 offsetToMap = 32;
-    quint32 lengthOfMap = 0;
-    quint32 offsetToEntries = 0;
-    quint32 resourceCount = 0;
-    quint32 offsetToResources = 0;
-    quint32 lengthOfResources = 0;
+    quint8 fileType = 17; // the file type byte; 17 in a new header
+    quint8 reserved = 0; // carried as stored
+    quint16 version = 1; // the version field; 1 in a new header
+    quint16 oldestCodeVersion = 1; // the oldest code version field; 1 in a new header
+    quint16 mapEntries = 0; // number of map entries
+    quint32 offsetToMap = 32; // file offset of the map, in bytes (32: just after the header)
+    quint32 lengthOfMap = 0; // size of the map in bytes (8 per entry)
+    quint32 offsetToEntries = 0; // file offset of the offset table, in bytes
+    quint32 resourceCount = 0; // number of (type, ID) pairs; the offset table holds one offset more
+    quint32 offsetToResources = 0; // file offset of the first block, in bytes
+    quint32 lengthOfResources = 0; // total size of the stored blocks, in bytes
 };
 
 // One entry of a resource file's map: the IDs beginningResId ...
@@ -33,19 +33,19 @@ public:
 // index offsetIndex + k.
 struct HARNESS_EXPORT FileMapEntry
 {
-    quint16 type = 0;
-    quint16 beginningResId = 0;
-    quint16 additionalResId = 0;
-    quint16 offsetIndex = 0;
+    quint16 type = 0; // the resource type of the range
+    quint16 beginningResId = 0; // the first ID of the range
+    quint16 additionalResId = 0; // the number of IDs after the first (0 for one ID)
+    quint16 offsetIndex = 0; // the index in the offset table of the first ID's block
 };
 
 // One (type, ID, block) of a resource table.
 struct HARNESS_EXPORT ResourceEntry
 {
-    quint32 compareMode = 0;
-    quint16 type = 0;
-    quint16 id = 0;
-    QByteArray data;
+    quint32 compareMode = 0; // how operator< compares; 0 (by type, then ID) unless set
+    quint16 type = 0; // the resource type
+    quint16 id = 0; // the resource ID within type
+    QByteArray data; // the block's bytes
 
     // With compareMode 1 on the left: by the block bytes as C strings;
     // otherwise by type, then ID.
@@ -70,7 +70,9 @@ class HARNESS_EXPORT ResourceStream
 public:
     ResourceStream();
     ~ResourceStream();
+    // Copies the name, the table, the header and the file structures.
     ResourceStream(const ResourceStream &other);
+    // Replaces everything by a copy of other's.
     ResourceStream &operator=(const ResourceStream &other);
 
     // Reads a resource file. False when path is empty, the file cannot be
@@ -95,13 +97,20 @@ public:
     void DeleteResource(quint16 type, quint16 id);
     // The block under (type, id), or a null array.
     QByteArray GetResource(quint16 type, quint16 id) const;
+    // Replaces types by the types in the table, ascending (also those left
+    // with no ID); returns their count.
     unsigned int GetResourceTypes(QVector<quint16> &types) const;
+    // Replaces ids by the IDs of type, ascending; returns their count (0 for an unknown type).
     unsigned int GetResourceIDs(quint16 type, QVector<quint16> &ids) const;
+    // Replaces entries by every (type, ID, block) of the table in type, then
+    // ID order (compareMode 0); returns their count.
     unsigned int GetResources(QVector<ResourceEntry> &entries) const;
 
     // Empties the name, the table and the file structures; default header.
     void Clear();
+    // The path last loaded or saved; empty when none.
     QString Name() const { return m_name; }
+    // The header as last read or written (a new header's values after Clear); never null.
     const ResourceHeader *GetResourceHeader() const { return &m_header; }
     // A text rendering of the header, map, offset table and blocks as last
     // read or written.
