@@ -715,8 +715,11 @@ TEST_F(DemoRun, TheHtmlReportOfARunCutShortShowsItsNotRunModules)
     EXPECT_TRUE(page.contains(QStringLiteral("Not finished: not run: every handset was lost")));
     EXPECT_EQ(page.count(QStringLiteral("<tr class=\"module\"")), 6);
     EXPECT_EQ(page.count(QStringLiteral("<span class=\"outcome notfinished\">not finished</span>")), 6);
-    // Self-contained: nothing is fetched from anywhere.
+    // Self-contained: its style is inline and nothing is fetched from anywhere.
+    EXPECT_TRUE(page.contains(QStringLiteral("<style>")));
     EXPECT_FALSE(page.contains(QRegularExpression(QStringLiteral("(src|href)=\"(https?:|//)"))));
+    // A run's page has the columns of a run; the history's has not (below).
+    EXPECT_TRUE(page.contains(QStringLiteral(">Duration</th>")));
 }
 
 TEST_F(DemoRun, TheHtmlReportEscapesNamesAndSaysThatNoHistoryIsRecorded)
@@ -737,6 +740,7 @@ TEST_F(DemoRun, TheHtmlReportEscapesNamesAndSaysThatNoHistoryIsRecorded)
     EXPECT_FALSE(page.contains(QStringLiteral("<img")));
     EXPECT_EQ(page.count(QStringLiteral("<script>")), 1); // the page's own
     EXPECT_TRUE(page.contains(QStringLiteral("no history across runs is recorded")));
+    EXPECT_FALSE(page.contains(QStringLiteral(">Duration</th>")));
 }
 
 // Headless Chromium renders the report of a run shared by two handsets.

@@ -149,6 +149,10 @@ TEST_F(LogFiles, UtReadsTheResultTableAndDropsTheUtPrefix)
     EXPECT_EQ(results.timeStamp, QDateTime(QDate(2026, 12, 3), QTime(14, 5, 9)));
     EXPECT_EQ(PairsOf(results), (Pairs{{"t1", "pass"}, {"t3", "fail"}, {"t4", "unsupported"}, {"t5", "unexecuted"}}));
     EXPECT_FALSE(module.ParseLog(Write(u"ut.xml"_s, "<TestRunLog/>"), results));
+    // Without its closing line the run did not complete.
+    TestResults cut;
+    ASSERT_TRUE(module.ParseLog(Write(u"cut.txt"_s, "Kesto unit test run\nSuiteName: UTTimer\n"), cut));
+    EXPECT_FALSE(cut.complete);
 }
 
 TEST_F(LogFiles, BaseParseStopsAtTheFirstRecognisedLogAndSecondaryModulesParseNothing)
