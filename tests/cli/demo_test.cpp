@@ -35,8 +35,12 @@ TEST_F(DemoInit, PrintsTheVariablesThatPointAtIt)
         << env.toStdString();
     EXPECT_TRUE(env.contains(QStringLiteral("export KESTIX_PLATFORM='%1/platforms/Kesto5 Pro/'\n").arg(root)));
     EXPECT_EQ(testutil::ReadFile(root + QStringLiteral("/env.sh")), env.toUtf8());
-    // A second init into the same folder is refused rather than mixed in.
+    // A second init into the same folder is refused rather than mixed in;
+    // an empty folder is taken.
     EXPECT_EQ(RunTool({QStringLiteral("demo"), QStringLiteral("init"), root}).status, 2);
+    const QString empty = root + QStringLiteral("-empty");
+    ASSERT_TRUE(QDir().mkpath(empty));
+    EXPECT_EQ(RunTool({QStringLiteral("demo"), QStringLiteral("init"), empty}).status, 0);
 }
 
 TEST_F(DemoInit, PackagesAreTarArchivesWithReadableModuleInformation)

@@ -9,6 +9,8 @@ TEST(ToolUsage, HashPrintsTheStoredHashName)
     const ToolResult r = RunTool({QStringLiteral("hash"), QStringLiteral("abcdefgh")});
     EXPECT_EQ(r.status, 0);
     EXPECT_EQ(r.out, QByteArray("#144355384\n"));
+    // An argument that names a command is still an argument.
+    EXPECT_EQ(RunTool({QStringLiteral("hash"), QStringLiteral("run")}).out, QByteArray("#31166\n"));
 }
 
 TEST(ToolUsage, BadUsageExitsWithTwoAndExplainsOnStandardError)
