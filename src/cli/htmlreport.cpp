@@ -114,11 +114,6 @@ QString OutcomeWord(const QString &outcome)
     return outcome;
 }
 
-QString Seconds(qint64 ms)
-{
-    return ms < 0 ? QString() : QString::number(double(ms) / 1000.0, 'f', 1) + QStringLiteral(" s");
-}
-
 QString Number(double value)
 {
     return QString::number(value, 'f', 1);
@@ -247,10 +242,10 @@ void Timeline(HtmlWriter &html, const RunReport &report)
                        {"y", QString::number(y + (kLaneHeight - kBarHeight) / 2)},
                        {"width", Number(qMax(width - 1.0, 2.0))},
                        {"height", QString::number(kBarHeight)}});
-            html.Element(
-                "title",
-                QStringLiteral("%1 on %2: %3, %4")
-                    .arg(bar.module->name, bar.module->handset, OutcomeWord(outcome), Seconds(bar.module->durationMs)));
+            html.Element("title",
+                         QStringLiteral("%1 on %2: %3, %4")
+                             .arg(bar.module->name, bar.module->handset, OutcomeWord(outcome),
+                                  DurationText(bar.module->durationMs)));
             html.Close();
             // The name inside the bar when it fits (about 7 pixels a letter).
             if (width > 7.0 * double(bar.module->name.size()) + 8.0)
@@ -264,7 +259,7 @@ void Timeline(HtmlWriter &html, const RunReport &report)
     }
     html.Element("text", QStringLiteral("0 s"),
                  {{"x", QString::number(kLabelWidth)}, {"y", QString::number(height - 4)}});
-    html.Element("text", Seconds(span),
+    html.Element("text", DurationText(span),
                  {{"x", QString::number(kLabelWidth + kPlotWidth)},
                   {"y", QString::number(height - 4)},
                   {"text-anchor", QStringLiteral("end")}});
@@ -330,7 +325,7 @@ void ModuleTable(HtmlWriter &html, const RunReport &report)
         if (withHandset)
             Cell(html, module.handset, module.handset);
         if (withDuration)
-            Cell(html, Seconds(module.durationMs), QString::number(module.durationMs), true);
+            Cell(html, DurationText(module.durationMs), QString::number(module.durationMs), true);
         for (const QString &word : {kPass, kFail, kUnsupported, kUnexecuted}) {
             const QString count = QString::number(module.Count(word));
             Cell(html, count, count, true);
@@ -412,8 +407,8 @@ QByteArray RunReport::Html(const QString &folder) const
     } else {
         html.Element("p",
                      QStringLiteral("Started %1 UTC on %2, %3, handsets: %4%5")
-                         .arg(start.toUTC().toString(QStringLiteral("yyyy-MM-dd HH:mm:ss")), host, Seconds(durationMs),
-                              handsets.join(QStringLiteral(", ")),
+                         .arg(start.toUTC().toString(QStringLiteral("yyyy-MM-dd HH:mm:ss")), host,
+                              DurationText(durationMs), handsets.join(QStringLiteral(", ")),
                               interrupted ? QStringLiteral(" (stopped by a signal)") : QString()),
                      {{"class", QStringLiteral("meta")}});
     }

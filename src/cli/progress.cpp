@@ -3,6 +3,8 @@
 
 #include "cli/progress.h"
 
+#include "cli/report.h"
+
 #include <QRegularExpression>
 
 #include <cstdlib>
@@ -20,11 +22,6 @@ const char *const kClearLine = "\r\033[K";
 // heartbeat line.
 constexpr qint64 kStatusAfterMs = 3000;
 constexpr qint64 kHeartbeatMs = 60000;
-
-QString Duration(qint64 ms)
-{
-    return QStringLiteral("%1 s").arg(double(qMax<qint64>(ms, 0)) / 1000.0, 0, 'f', 1);
-}
 
 QString Elapsed(qint64 ms)
 {
@@ -172,8 +169,8 @@ void ProgressPrinter::ModuleEnded(const ModuleRecord &record)
     const QString count = QStringLiteral("[%1/%2]").arg(m_done, digits).arg(m_total);
     ClearStatus();
     Write(m_stream,
-          Columns(count, record.handset, record.name) + verdicts + QStringLiteral("  ") + Duration(record.durationMs)
-              + QLatin1Char('\n'));
+          Columns(count, record.handset, record.name) + verdicts + QStringLiteral("  ")
+              + DurationText(qMax<qint64>(record.durationMs, 0)) + QLatin1Char('\n'));
     DrawStatus();
 }
 

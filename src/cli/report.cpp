@@ -42,7 +42,8 @@ QString Plural(int count, const char *noun)
     return QStringLiteral("%1 %2%3").arg(count).arg(QLatin1String(noun)).arg(count == 1 ? "" : "s");
 }
 
-QString Seconds(qint64 ms)
+// JUnit's "time": seconds with three decimals.
+QString JUnitSeconds(qint64 ms)
 {
     return QString::number(double(qMax<qint64>(ms, 0)) / 1000.0, 'f', 3);
 }
@@ -85,6 +86,14 @@ QString VerdictLines(const QString &logPath, const QString &testCase, const QStr
         }
     }
     return {};
+}
+
+QString DurationText(qint64 ms)
+{
+    if (ms < 0)
+        return QString();
+    const double seconds = double(ms) / 1000.0;
+    return QString::number(seconds, 'f', seconds < 10 ? 1 : 0) + QStringLiteral(" s");
 }
 
 QHash<QString, qint64> CaseTimes(const QString &logPath)
@@ -246,7 +255,7 @@ QByteArray RunReport::JUnit() const
             element.setAttribute(QStringLiteral("name"), testCase.name);
             element.setAttribute(QStringLiteral("classname"), className);
             if (testCase.timeMs >= 0)
-                element.setAttribute(QStringLiteral("time"), Seconds(testCase.timeMs));
+                element.setAttribute(QStringLiteral("time"), JUnitSeconds(testCase.timeMs));
             if (!module.Finished()) {
                 QDomElement error = document.createElement(QStringLiteral("error"));
                 error.setAttribute(QStringLiteral("message"), module.reason);
@@ -281,7 +290,7 @@ QByteArray RunReport::JUnit() const
         suite.setAttribute(QStringLiteral("failures"), failures);
         suite.setAttribute(QStringLiteral("errors"), errors);
         suite.setAttribute(QStringLiteral("skipped"), skipped);
-        suite.setAttribute(QStringLiteral("time"), Seconds(module.durationMs));
+        suite.setAttribute(QStringLiteral("time"), JUnitSeconds(module.durationMs));
         if (module.start.isValid())
             suite.setAttribute(QStringLiteral("timestamp"), JUnitTime(module.start));
         if (!module.handset.isEmpty())
@@ -294,7 +303,7 @@ QByteArray RunReport::JUnit() const
     suites.setAttribute(QStringLiteral("failures"), totalFailures);
     suites.setAttribute(QStringLiteral("errors"), Errors());
     if (durationMs >= 0)
-        suites.setAttribute(QStringLiteral("time"), Seconds(durationMs));
+        suites.setAttribute(QStringLiteral("time"), JUnitSeconds(durationMs));
     return XmlWriter::Serialize(document, 1);
 }
 

@@ -88,6 +88,10 @@ QString VerdictLines(const QString &logPath, const QString &testCase, const QStr
 // or "... 1.5 s"), in milliseconds by test case name.
 QHash<QString, qint64> CaseTimes(const QString &logPath);
 
+// A duration as people read it: "4.2 s", "95 s" from ten seconds on;
+// empty when unknown (negative).
+QString DurationText(qint64 ms);
+
 // The --junit FILE, --json FILE and --html FILE options of the commands that
 // report.
 const QCommandLineOption &JUnitOption();

@@ -241,11 +241,6 @@ QList<QSharedPointer<_TestModule>> RunOrder(QList<QSharedPointer<_TestModule>> m
     return order;
 }
 
-QString Seconds(double seconds)
-{
-    return QString::number(seconds, 'f', seconds < 10 ? 1 : 0) + QStringLiteral(" s");
-}
-
 // What a dry run prints: the handsets, the modules in run order and what
 // the options change about them.
 QString Plan(const QList<QSharedPointer<_TestModule>> &order, const QStringList &handsets, const QStringList &retried,
@@ -279,7 +274,8 @@ QString Plan(const QList<QSharedPointer<_TestModule>> &order, const QStringList 
         text += QStringLiteral("Test cases of %1: %2\n")
                     .arg(order.constFirst()->moduleName, testCases.join(QStringLiteral(", ")));
     if (timeoutSeconds > 0)
-        text += QStringLiteral("A module still running after %1 is stopped.\n").arg(Seconds(timeoutSeconds));
+        text += QStringLiteral("A module still running after %1 is stopped.\n")
+                    .arg(DurationText(qint64(timeoutSeconds * 1000.0)));
     return text;
 }
 
@@ -295,7 +291,7 @@ QString Slowest(const RunReport &report, int count)
                      [](const ModuleReport *a, const ModuleReport *b) { return a->durationMs > b->durationMs; });
     QStringList parts;
     for (qsizetype i = 0; i < qMin<qsizetype>(count, timed.size()); ++i)
-        parts.append(QStringLiteral("%1 %2").arg(timed.at(i)->name, Seconds(double(timed.at(i)->durationMs) / 1000.0)));
+        parts.append(QStringLiteral("%1 %2").arg(timed.at(i)->name, DurationText(timed.at(i)->durationMs)));
     return parts.isEmpty() ? QString() : QStringLiteral("Slowest: %1\n").arg(parts.join(QStringLiteral(", ")));
 }
 
@@ -586,7 +582,7 @@ int RunCommand(const QStringList &arguments)
         report.modules.append(RowOf(result, module, run.Stopped()));
     }
     status = PublishReport(report, parser, true, [&] {
-        return QStringLiteral("Elapsed: %1\n").arg(Seconds(double(report.durationMs) / 1000.0)) + Slowest(report, 3);
+        return QStringLiteral("Elapsed: %1\n").arg(DurationText(report.durationMs)) + Slowest(report, 3);
     });
 
     QString text;
