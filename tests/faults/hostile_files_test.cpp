@@ -13,11 +13,6 @@
 
 using namespace Qt::StringLiterals;
 
-namespace {
-
-using testutil::DataPath;
-using testutil::ReadFile;
-
 // A cached catalogue written and read back keeps every module, and from the
 // second write on its bytes no longer change, so a catalogue never drifts from
 // run to run. Properties without values are written as an empty list once
@@ -25,31 +20,27 @@ using testutil::ReadFile;
 TEST(HostileManifest, ProgramWhosePropertiesHaveNoValuesSettlesAfterOneWrite)
 {
     QTemporaryDir dir;
-    const QString kit = dir.filePath(u"kit"_s);
-    Manifest catalogue(kit, false);
-    catalogue.cacheFile = DataPath(u"manifest/program-properties-without-values.xml"_s);
+    Manifest catalogue(dir.filePath(u"kit"_s), false);
+    catalogue.cacheFile = testutil::DataPath(u"manifest/program-properties-without-values.xml"_s);
     ASSERT_TRUE(catalogue.ReadManifest());
     ASSERT_EQ(catalogue.testModules.size(), 1);
 
+    // Each generation is written, read back, and written again.
     QByteArray written[3];
-    Manifest *current = &catalogue;
-    Manifest copies[] = {Manifest(kit, false), Manifest(kit, false), Manifest(kit, false)};
     for (int i = 0; i < 3; ++i) {
         const QString path = dir.filePath(u"written%1.xml"_s.arg(i));
-        ASSERT_TRUE(current->WriteManifest(path));
-        written[i] = ReadFile(path);
-        copies[i].cacheFile = path;
-        ASSERT_TRUE(copies[i].ReadManifest());
-        current = &copies[i];
+        ASSERT_TRUE(catalogue.WriteManifest(path));
+        written[i] = testutil::ReadFile(path);
+        catalogue = Manifest(dir.filePath(u"kit"_s), false);
+        catalogue.cacheFile = path;
+        ASSERT_TRUE(catalogue.ReadManifest());
     }
     EXPECT_TRUE(written[0].contains("<properties/>"));
     EXPECT_EQ(written[1], written[2]);
 
-    auto *timer = dynamic_cast<CtfTestModule *>(copies[2].FindTestModule(u"timer"_s).data());
+    auto *timer = dynamic_cast<CtfTestModule *>(catalogue.FindTestModule(u"timer"_s).data());
     ASSERT_NE(timer, nullptr);
     ASSERT_EQ(timer->programs.size(), 1);
     EXPECT_EQ(timer->programs.first().type, 16972535u);
     EXPECT_EQ(timer->programs.first().keysize, 8);
 }
-
-} // namespace

@@ -62,6 +62,17 @@ protected:
         module.PostProcess(env);
     }
 
+    // The verdicts of the module's copied logs, which must name manifestName
+    // and be complete.
+    Pairs Verdicts(_TestModule &module, const QString &manifestName)
+    {
+        TestResults results;
+        EXPECT_TRUE(module.ParseLog(results));
+        EXPECT_EQ(results.manifestName, manifestName);
+        EXPECT_TRUE(results.complete);
+        return PairsOf(results);
+    }
+
     testutil::KitRun run;
     testutil::HandsetFixture &fixture = run.Handsets();
     testutil::HandsetFixture::Device device;
@@ -103,20 +114,12 @@ TEST_F(EndToEnd, CtfModuleRunsItsProgramAndLeavesNothingBehind)
     EXPECT_EQ(lines.first(), u"Suite: ITimer"_s);
     EXPECT_TRUE(lines.contains(u"Args: -suite all"_s));
 
+    EXPECT_EQ(Verdicts(module, u"ITimer"_s), (Pairs{{"t1", "pass"}, {"t2", "fail"}}));
     TestResults results;
     ASSERT_TRUE(module.ParseLog(results));
-    EXPECT_EQ(results.manifestName, u"ITimer"_s);
     EXPECT_EQ(results.idHash, module.IDHash());
-    EXPECT_TRUE(results.complete);
-    EXPECT_EQ(PairsOf(results), (Pairs{{"t1", "pass"}, {"t2", "fail"}}));
-
     EXPECT_FALSE(OnHandset(u"fs:/usermods/ITimer"_s));
     EXPECT_FALSE(OnHandset(u"fs:/usermods/CTF/CTF.log"_s));
-
-    // The programs survive the manifest.
-    CtfTestModule back;
-    EXPECT_TRUE(back.ReadFromManifest(entry));
-    EXPECT_EQ(back.ModuleName(), u"ITimer_k_main"_s);
 }
 
 TEST_F(EndToEnd, CtfAppletModuleRunsByClassId)
@@ -138,10 +141,7 @@ TEST_F(EndToEnd, CtfAppletModuleRunsByClassId)
     RunModule(module);
 
     ASSERT_EQ(module.desktopLogFiles.size(), 1);
-    TestResults results;
-    ASSERT_TRUE(module.ParseLog(results));
-    EXPECT_EQ(results.manifestName, u"Suite"_s);
-    EXPECT_EQ(PairsOf(results), (Pairs{{"t1", "pass"}}));
+    EXPECT_EQ(Verdicts(module, u"Suite"_s), (Pairs{{"t1", "pass"}}));
     EXPECT_FALSE(OnHandset(u"fs:/usermods/suite"_s));
 }
 
@@ -150,11 +150,12 @@ TEST_F(EndToEnd, OatModuleRunsInTheFrameworkAndIsPostProcessed)
     if (!testutil::HaveProgram(u"perl"_s))
         GTEST_SKIP() << "perl is not installed";
 
-    // The framework applet runs the suite named in its arguments.
+    // The framework applet runs the suite named in its arguments, once the
+    // test data and the module's published information file are in place.
     testutil::ModuleSpec frameworkSpec;
     frameworkSpec.directory = u"oat"_s;
     frameworkSpec.appletIds = {0x01010001};
-    frameworkSpec.behaviour = "[ -f usermods/oat/testdata.kar ] || exit 5\n"
+    frameworkSpec.behaviour = "[ -f usermods/oat/testdata.kar ] && [ -f mif/oattimer.mif ] || exit 5\n"
                               "mkdir -p shared/pek/log\n"
                               "{ echo \"@Timer\"; echo \"Args: $3 $4 $5\"; echo \"ModuleVer: 1.0\";\n"
                               "  echo \"@1: t1\"; echo \"Status: Success\"; echo \"@2: t2\"; echo \"@3: t3\";\n"
@@ -179,47 +180,27 @@ TEST_F(EndToEnd, OatModuleRunsInTheFrameworkAndIsPostProcessed)
     module.targets.insert(u"t"_s, Target(package));
     module.SetTestCases({u"t1"_s, u"t3"_s});
 
-    testutil::WriteFile(fixture.WorkFolder() + u"/td.kar"_s, "test data");
-    env.insert(u"TestDataCachePath"_s, fixture.WorkFolder() + u"/td.kar"_s);
+    const QString work = fixture.WorkFolder();
+    testutil::WriteFile(work + u"/td.kar"_s, "test data");
+    testutil::WriteFile(work + u"/perl/PostProcess3.pl"_s, moduletest::kPostProcessScript);
+    env.insert(u"TestDataCachePath"_s, work + u"/td.kar"_s);
+    env.insert(u"PerlCache"_s, work + u"/perl"_s);
+    env.insert(u"DSOCacheFilePath"_s, u"/cache/dso"_s);
+    env.insert(u"Platform"_s, u"/sdk/pvs/platform"_s);
     ASSERT_FALSE(framework.IsLoaded(device.get()));
     ASSERT_TRUE(framework.Load(device.get(), env));
     ASSERT_TRUE(framework.IsLoaded(device.get()));
+    RunModule(module);
 
-    const QString perlCache = fixture.WorkFolder() + u"/perl"_s;
-    testutil::WriteFile(perlCache + u"/PostProcess3.pl"_s,
-                        "my ($source, $temp) = @ARGV;\n"
-                        "opendir(my $dh, $source) or die;\n"
-                        "for my $n (grep { /\\.oat$/ } readdir($dh)) {\n"
-                        "  open(my $i, '<', \"$source/$n\") or die; open(my $o, '>', \"$temp/pp-$n\") or die;\n"
-                        "  print {$o} <$i>; print \"processed $n\\n\";\n"
-                        "}\n");
-    env.insert(u"PerlCache"_s, perlCache);
-    env.insert(u"DevicePack"_s, u"/kit/deviceref.dso"_s);
-    env.insert(u"DSOCacheFilePath"_s, u"/cache/dso"_s);
-    env.insert(u"Platform"_s, u"/sdk/pvs/platform"_s);
-
-    module.SetLogger(run.log());
-    ASSERT_TRUE(module.Run(device.get(), env));
-    EXPECT_TRUE(OnHandset(u"fs:/mif/oattimer.mif"_s));
-    ASSERT_TRUE(module.IsLogComplete(device.get()));
-    ASSERT_TRUE(module.CopyLog(device.get(), env));
     EXPECT_EQ(env.value(u"OatRawLogPath"_s), logs + u"/oatRawLogs"_s);
     ASSERT_EQ(module.desktopLogFiles.size(), 1);
-    const QString raw = module.desktopLogFiles.first();
-    module.RemoveTest(device.get());
-    module.PostProcess(env);
-
-    EXPECT_TRUE(Lines(raw).contains(u"Args: -dk -rs OatSuite1,t1,t3"_s));
-    ASSERT_EQ(module.desktopLogFiles.size(), 1);
-    EXPECT_EQ(QFileInfo(module.desktopLogFiles[0]).absolutePath(), logs);
-    EXPECT_TRUE(QFileInfo(module.desktopLogFiles[0]).fileName().startsWith(u"pp-timer_u"_s));
-    EXPECT_TRUE(run.LogText().contains(u"processed timer_u"_s));
-
-    TestResults results;
-    ASSERT_TRUE(module.ParseLog(results));
-    EXPECT_EQ(results.manifestName, u"OatTimer"_s);
-    EXPECT_TRUE(results.complete);
-    EXPECT_EQ(PairsOf(results), (Pairs{{"t1", "pass"}, {"t2", "unexecuted"}, {"t3", "fail"}}));
+    const QFileInfo processed(module.desktopLogFiles.first());
+    EXPECT_EQ(processed.absolutePath(), logs);
+    EXPECT_TRUE(processed.fileName().startsWith(u"pp-timer_u"_s));
+    const QStringList lines = Lines(processed.filePath());
+    EXPECT_EQ(lines.first(), u"processed with /cache/dso on /sdk/pvs/platform"_s);
+    EXPECT_TRUE(lines.contains(u"Args: -dk -rs OatSuite1,t1,t3"_s));
+    EXPECT_EQ(Verdicts(module, u"OatTimer"_s), (Pairs{{"t1", "pass"}, {"t2", "unexecuted"}, {"t3", "fail"}}));
 
     EXPECT_FALSE(OnHandset(u"fs:/usermods/oattimer"_s));
     EXPECT_FALSE(OnHandset(u"fs:/shared/pek/log/timer_u.oat"_s));
@@ -252,12 +233,10 @@ TEST_F(EndToEnd, UtModuleReadsItsConfigurationAndWritesBothLogs)
     module.applets << AppletWithId(0x20002000);
     module.targets.insert(u"t"_s, Target(package));
     module.SetTestCases({u"t1"_s, u"t2"_s});
-    const auto scratch = [] {
-        return QDir::temp().entryList({u"test_*.dat"_s}, QDir::Files);
-    };
-    const QStringList before = scratch();
+    // The configuration's way to the handset leaves nothing behind.
+    const QStringList before = QDir::temp().entryList({u"test_*.dat"_s}, QDir::Files);
     RunModule(module);
-    EXPECT_EQ(scratch(), before); // the configuration's way to the handset leaves nothing behind
+    EXPECT_EQ(QDir::temp().entryList({u"test_*.dat"_s}, QDir::Files), before);
 
     EXPECT_EQ(
         testutil::ReadFile(fixture.HostPath(u"phone"_s, u"fs:/mod/ututtimer/utconfig.dat"_s)),
@@ -278,12 +257,7 @@ TEST_F(EndToEnd, UtModuleReadsItsConfigurationAndWritesBothLogs)
         EXPECT_EQ(testutil::RunProgram(u"xmllint"_s, {u"--noout"_s, xml}), 0);
     }
 
-    TestResults results;
-    ASSERT_TRUE(module.ParseLog(results));
-    EXPECT_EQ(results.manifestName, u"Timer"_s);
-    EXPECT_TRUE(results.complete);
-    EXPECT_EQ(results.timeStamp, QDateTime(QDate(2026, 12, 3), QTime(14, 5, 9)));
-    EXPECT_EQ(PairsOf(results), (Pairs{{"t1", "pass"}, {"t2", "pass"}}));
+    EXPECT_EQ(Verdicts(module, u"Timer"_s), (Pairs{{"t1", "pass"}, {"t2", "pass"}}));
     EXPECT_FALSE(OnHandset(u"fs:/usermods/uttimer"_s));
 }
 

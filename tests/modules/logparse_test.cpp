@@ -30,18 +30,11 @@ TEST_F(LogFiles, CtfPairsResultsWithTestNamesInEitherOrder)
 {
     CtfTestModule module;
     TestResults results;
-    const QString path = Write(u"a.LOG"_s,
-                               "Suite: A\r\n"
-                               "Time: 2026/12/03 14:05:09\r\n"
-                               "Result: PASS\r\n"
-                               "Test: t1\r\n"
-                               "test:  t2 with words \r\n"
-                               "RESULT: Failed\r\n"
-                               "Suite: ignored\r\n"
-                               "Manifest Name: B\r\n"
-                               "ID Hash: #123\r\n"
-                               "[/verbose]\r\n");
-    ASSERT_TRUE(module.ParseLog(path, results));
+    ASSERT_TRUE(module.ParseLog(Write(u"a.LOG"_s,
+                                      "Suite: A\r\nTime: 2026/12/03 14:05:09\r\nResult: PASS\r\nTest: t1\r\n"
+                                      "test:  t2 with words \r\nRESULT: Failed\r\nSuite: ignored\r\n"
+                                      "Manifest Name: B\r\nID Hash: #123\r\n[/verbose]\r\n"),
+                                results));
     EXPECT_EQ(results.manifestName, u"B"_s);
     EXPECT_EQ(results.idHash, u"#123"_s);
     EXPECT_TRUE(results.complete);
@@ -95,20 +88,9 @@ TEST_F(LogFiles, OatMapsStatusWordsAndMarksUnfinishedCasesUnexecuted)
     OatTestModule module;
     TestResults results;
     ASSERT_TRUE(module.ParseLog(Write(u"timer_u.OAT"_s,
-                                      "@#OatTimer#\n"
-                                      "@Another\n"
-                                      "TimeStamp: 14:05:09 12-03-2026\n"
-                                      "@1: #t1@\n"
-                                      "@2: t2\n"
-                                      "Status: Success\n"
-                                      "@3: t3\n"
-                                      "status: FAILED\n"
-                                      "@4: t4\n"
-                                      "Status: unsupported\n"
-                                      "@5: t5\n"
-                                      "Status: error\n"
-                                      "@6: t6\n"
-                                      "ID Hash: #9\n"
+                                      "@#OatTimer#\n@Another\nTimeStamp: 14:05:09 12-03-2026\n@1: #t1@\n"
+                                      "@2: t2\nStatus: Success\n@3: t3\nstatus: FAILED\n@4: t4\n"
+                                      "Status: unsupported\n@5: t5\nStatus: error\n@6: t6\nID Hash: #9\n"
                                       "TEST RESULT: done\n"),
                                 results));
     EXPECT_EQ(results.manifestName, u"OatTimer"_s);
@@ -131,16 +113,9 @@ TEST_F(LogFiles, UtReadsTheResultTableAndDropsTheUtPrefix)
     UTTestModule module;
     TestResults results;
     ASSERT_TRUE(module.ParseLog(Write(u"ut.TXT"_s,
-                                      "SuiteName: UTTimer 14:05:09 03-Dec-2026 extra\n"
-                                      "ID Hash: #77\n"
-                                      "---- results\n"
-                                      "t1 PASSED 12 ms\n"
-                                      "t2 FAILED\n"
-                                      "t3 Failed 1 ms\n"
-                                      "t4 UNSUPPORTED 0 ms\n"
-                                      "t5 skipped 0 ms\n"
-                                      "----------\n"
-                                      "t6 PASSED 1 ms\n"
+                                      "SuiteName: UTTimer 14:05:09 03-Dec-2026 extra\nID Hash: #77\n"
+                                      "---- results\nt1 PASSED 12 ms\nt2 FAILED\nt3 Failed 1 ms\n"
+                                      "t4 UNSUPPORTED 0 ms\nt5 skipped 0 ms\n----------\nt6 PASSED 1 ms\n"
                                       "Elapsed Time: 12s\n"),
                                 results));
     EXPECT_EQ(results.manifestName, u"Timer"_s);

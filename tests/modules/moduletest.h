@@ -62,6 +62,23 @@ protected:
     Log log;
 };
 
+// A stand-in for the kit's post-processing script: it records its arguments
+// and working folder, prints on both channels and leaves "pp-<name>" for each
+// raw log in the temporary folder, headed by the device pack and platform.
+inline const QByteArray kPostProcessScript = R"perl(use strict;
+use Cwd;
+my ($source, $temp, $pack, $platform) = @ARGV;
+print "args:", join("|", @ARGV), "\n";
+print STDERR "cwd:", getcwd(), "\n";
+opendir(my $dh, $source) or die "no source $source";
+for my $name (grep { /\.oat$/ } readdir($dh)) {
+    open(my $in, "<", "$source/$name") or die;
+    open(my $out, ">", "$temp/pp-$name") or die;
+    print $out "processed with $pack on $platform\n", <$in>;
+    close($out);
+}
+)perl";
+
 inline Applet AppletWithId(unsigned int id)
 {
     Applet applet;

@@ -200,23 +200,6 @@ TEST(OatFramework, IsLoadedUsesTheFixedClassIdAndUnloadRemovesEveryOatFolder)
 
 namespace {
 
-// A stand-in for the kit's post-processing script: it records its arguments
-// and working folder, prints on both channels and leaves one output file per
-// raw log in the temporary folder.
-const QByteArray kScript = R"perl(use strict;
-use Cwd;
-my ($source, $temp, $pack, $platform) = @ARGV;
-print "args:", join("|", @ARGV), "\n";
-print STDERR "cwd:", getcwd(), "\n";
-opendir(my $dh, $source) or die "no source $source";
-for my $name (grep { /\.oat$/ } readdir($dh)) {
-    open(my $in, "<", "$source/$name") or die;
-    open(my $out, ">", "$temp/$name.html") or die;
-    print $out "processed with $pack on $platform\n", <$in>;
-    close($out);
-}
-)perl";
-
 class OatPostProcess : public moduletest::ModuleFolder
 {
 protected:
@@ -225,7 +208,7 @@ protected:
         perlCache = dir.filePath(u"perl"_s);
         logs = dir.filePath(u"logs"_s);
         raw = logs + u"/oatRawLogs"_s;
-        testutil::WriteFile(perlCache + u"/PostProcess3.pl"_s, kScript);
+        testutil::WriteFile(perlCache + u"/PostProcess3.pl"_s, moduletest::kPostProcessScript);
         testutil::WriteFile(raw + u"/timer-2026.oat"_s, "@Timer\nModuleVer: 1\n");
         module.SetLogger(&log);
         module.moduleName = u"Timer"_s;
@@ -253,7 +236,7 @@ TEST_F(OatPostProcess, RunsTheScriptAndCollectsItsOutput)
         GTEST_SKIP() << "perl is not installed";
     module.PostProcess(env);
 
-    const QString output = logs + u"/timer-2026.oat.html"_s;
+    const QString output = logs + u"/pp-timer-2026.oat"_s;
     EXPECT_EQ(module.desktopLogFiles, QStringList{output});
     EXPECT_EQ(testutil::ReadFile(output),
               QByteArray("processed with /cache/dp.dso on /sdk/pvs/platform\n@Timer\n"
@@ -276,7 +259,7 @@ TEST_F(OatPostProcess, FrameworkPostProcessCoversTheWholeRawFolder)
     framework.SetLogger(&log);
     framework.PostProcess(env);
     EXPECT_FALSE(env.contains(u"OatRawLogPath"_s));
-    EXPECT_TRUE(QFileInfo::exists(logs + u"/timer-2026.oat.html"_s));
+    EXPECT_TRUE(QFileInfo::exists(logs + u"/pp-timer-2026.oat"_s));
     // Reprocessing stamps nothing: the raw log is as it was.
     EXPECT_EQ(testutil::ReadFile(raw + u"/timer-2026.oat"_s), QByteArray("@Timer\nModuleVer: 1\n"));
 }

@@ -21,8 +21,6 @@ HandsetFixture::HandsetFixture()
     m_env.Set("KESTIX_HANDSETS", HandsetsFolder());
 }
 
-HandsetFixture::~HandsetFixture() = default;
-
 QString HandsetFixture::HandsetsFolder() const
 {
     return m_dir.filePath(u"handsets"_s);
@@ -70,7 +68,7 @@ QString HandsetFixture::MakePackage(const QString &fileName, const ModuleSpec &l
 QString HandsetFixture::MakePackage(const QString &fileName, const Members &members) const
 {
     const QString path = WorkFolder() + u'/' + fileName;
-    if (!WritePackage(path, members)) {
+    if (!KitWriter::WritePackage(path, members)) {
         ADD_FAILURE() << "cannot write package " << path.toStdString();
         return QString();
     }

@@ -14,48 +14,29 @@
 #include <memory>
 
 class IKestoDevice;
-
 class Log;
 
 namespace testutil {
 
 // Packages of modules for the emulated handset, as the library's kit writer
-// makes them (modules/kitwriter.h).
-using MifProgram = KitProgram;
+// makes them: the layout's module information file and package members.
 using ModuleSpec = KitPackage;
 using Members = KitMembers;
-
-// The bytes of the layout's module information file.
 inline QByteArray BuildMif(const ModuleSpec &layout)
 {
     return layout.Mif();
 }
-
-// The members of the module's package.
 inline Members ModuleMembers(const ModuleSpec &layout)
 {
     return layout.Members();
 }
 
-// Writes a tar package of the members; false when it cannot be written.
-inline bool WritePackage(const QString &path, const Members &members)
-{
-    return KitWriter::WritePackage(path, members);
-}
-
 // A private handsets folder: sets KESTIX_HANDSETS to a temporary folder for
 // the fixture's lifetime, creates handsets in it and packages beside it.
-//
-//   testutil::HandsetFixture fixture;
-//   fixture.AddHandset("phone", "Test phone", "arm", "1.2");
-//   QString package = fixture.MakePackage("ctf.kestix", layout);
-//   auto device = fixture.Connect("phone");
-//   device->InstallPackage(package);
 class HandsetFixture
 {
 public:
     HandsetFixture();
-    ~HandsetFixture();
     HandsetFixture(const HandsetFixture &) = delete;
     HandsetFixture &operator=(const HandsetFixture &) = delete;
 

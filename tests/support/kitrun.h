@@ -8,9 +8,6 @@
 //     run.AddHandset("phone");
 //     ASSERT_TRUE(run.RunModules(run.NewHarness("phone"), {"Audio"}));
 //     EXPECT_EQ(run.Verdicts("phone").value("Audio/play"), "pass");
-//
-// Used by the controller, fault and module tests and by the sharded-run
-// benchmark.
 
 #include "support/kitbuilder.h"
 
