@@ -33,38 +33,27 @@ SysResource Program(const QByteArray &name)
     return program;
 }
 
-struct NameCase
-{
-    const char *moduleName;
-    const char *mifname;
-    const char *directory;
-    const char *mif;
-    const char *logBase;
-};
-
-class OatNames : public ::testing::TestWithParam<NameCase>
-{
-};
-
 } // namespace
 
-TEST_P(OatNames, DerivesHandsetNamesFromTheModuleName)
+TEST(OatNames, DerivesHandsetNamesFromTheModuleName)
 {
-    const NameCase &c = GetParam();
-    OatTestModule module;
-    module.moduleName = QString::fromLatin1(c.moduleName);
-    module.mifname = QString::fromLatin1(c.mifname);
-    EXPECT_EQ(module.HandsetDirectoryName(), QLatin1String(c.directory));
-    EXPECT_EQ(module.MifFileName(), QLatin1String(c.mif));
-    EXPECT_EQ(module.LogBasePath(), QLatin1String(c.logBase));
+    // Module name, information file name; handset folder, information file, log base.
+    const char *rows[][5] = {
+        {"OatTimer", "", "oattimer", "oattimer.mif", "fs:/shared/pek/log/timer"},
+        {"Timer", "", "oattimer", "oattimer.mif", "fs:/shared/pek/log/timer"},
+        {"OATNet", "Net_Suite.mif", "oatnet", "Net_Suite.mif", "fs:/shared/pek/log/net"},
+        {"", "", "oat", "oat.mif", "fs:/shared/pek/log/"},
+    };
+    for (const auto &row : rows) {
+        SCOPED_TRACE(row[0]);
+        OatTestModule module;
+        module.moduleName = QString::fromLatin1(row[0]);
+        module.mifname = QString::fromLatin1(row[1]);
+        EXPECT_EQ(module.HandsetDirectoryName(), QLatin1String(row[2]));
+        EXPECT_EQ(module.MifFileName(), QLatin1String(row[3]));
+        EXPECT_EQ(module.LogBasePath(), QLatin1String(row[4]));
+    }
 }
-
-INSTANTIATE_TEST_SUITE_P(
-    Modules, OatNames,
-    ::testing::Values(NameCase{"OatTimer", "", "oattimer", "oattimer.mif", "fs:/shared/pek/log/timer"},
-                      NameCase{"Timer", "", "oattimer", "oattimer.mif", "fs:/shared/pek/log/timer"},
-                      NameCase{"OATNet", "Net_Suite.mif", "oatnet", "Net_Suite.mif", "fs:/shared/pek/log/net"},
-                      NameCase{"", "", "oat", "oat.mif", "fs:/shared/pek/log/"}));
 
 namespace {
 
@@ -264,34 +253,26 @@ TEST_F(OatPostProcess, FrameworkPostProcessCoversTheWholeRawFolder)
     EXPECT_EQ(testutil::ReadFile(raw + u"/timer-2026.oat"_s), QByteArray("@Timer\nModuleVer: 1\n"));
 }
 
-struct MissingEntry
-{
-    const char *key;
-    const char *message;
-};
-
-class OatPostProcessMissing : public OatPostProcess, public ::testing::WithParamInterface<MissingEntry>
-{
-};
-
-TEST_P(OatPostProcessMissing, StopsWithItsMessageAndKeepsTheRawLogs)
+TEST_F(OatPostProcess, MissingEntryStopsWithItsMessageAndKeepsTheRawLogs)
 {
     if (!testutil::HaveProgram(u"perl"_s))
         GTEST_SKIP() << "perl is not installed";
-    env.remove(QLatin1String(GetParam().key));
-    module.PostProcess(env);
-    EXPECT_TRUE(LogText().contains(QLatin1String(GetParam().message))) << LogText().toStdString();
-    EXPECT_EQ(module.desktopLogFiles, QStringList{raw + u"/timer-2026.oat"_s});
+    const char *rows[][2] = {
+        {"OatRawLogPath", "OatTestModule::PostProcess missing oat source log directory"},
+        {"LogPath", "OatTestModule::PostProcess missing destination log directory"},
+        {"DSOCacheFilePath", "OatTestModule::PostProcess missing devicePack file."},
+        {"Platform", "OatTestModule::PostProcess missing platform directory."},
+    };
+    for (const auto &[key, message] : rows) {
+        QMap<QString, QString> partial = env;
+        partial.remove(QLatin1String(key));
+        module.PostProcess(partial);
+        EXPECT_TRUE(LogText().contains(QLatin1String(message))) << LogText().toStdString();
+        EXPECT_EQ(module.desktopLogFiles, QStringList{raw + u"/timer-2026.oat"_s});
+    }
     EXPECT_FALSE(LogText().contains(u"args:"_s));
     EXPECT_FALSE(QFileInfo::exists(logs + u"/tempPPLogs"_s));
 }
-
-INSTANTIATE_TEST_SUITE_P(
-    Entries, OatPostProcessMissing,
-    ::testing::Values(MissingEntry{"OatRawLogPath", "OatTestModule::PostProcess missing oat source log directory"},
-                      MissingEntry{"LogPath", "OatTestModule::PostProcess missing destination log directory"},
-                      MissingEntry{"DSOCacheFilePath", "OatTestModule::PostProcess missing devicePack file."},
-                      MissingEntry{"Platform", "OatTestModule::PostProcess missing platform directory."}));
 
 TEST_F(OatPostProcess, WithoutScriptOrPerlOnlyStamps)
 {

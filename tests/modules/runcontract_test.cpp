@@ -107,6 +107,7 @@ TEST_F(RunContract, KindsRenameTheirLogsOnTheHost)
 
     CtfAppletTestModule applet;
     applet.applets << AppletWithId(0x20);
+    EXPECT_EQ(applet.ModuleName(), u"0X00000020"_s);
     EXPECT_CALL(device, FindModule(0x20u, _)).WillRepeatedly(DoAll(SetArgReferee<1>(u"fs:/usermods/a/"_s), Return(0u)));
     EXPECT_CALL(device, ListDirectory(u"fs:/usermods/a/"_s, _))
         .WillRepeatedly(ListingOf(
