@@ -4,26 +4,22 @@
 
 #include "moduletest.h"
 
-#include "log/log.h"
 #include "modules/ctfapplettestmodule.h"
 #include "modules/ctftestmodule.h"
 #include "modules/oattestmodule.h"
 #include "modules/secondarymodule.h"
 #include "modules/uttestmodule.h"
 #include "support/mockdevice.h"
-#include "support/testutil.h"
 
 #include <QDir>
 #include <QDomDocument>
 #include <QRegularExpression>
-#include <QTemporaryDir>
 
 #include <gtest/gtest.h>
 
 using namespace Qt::StringLiterals;
 
 using ::testing::_;
-using ::testing::AnyNumber;
 using ::testing::DoAll;
 using ::testing::Invoke;
 using ::testing::NiceMock;
@@ -32,16 +28,19 @@ using ::testing::SetArgReferee;
 
 namespace {
 
-const QString kStamp = u"-\\d{4}-\\d\\d-\\d\\d-\\d\\d-\\d\\d-\\d\\d\\."_s;
+// True when the file name of path matches pattern, in which '@' stands for
+// a copy's time stamp ("-2026-12-03-14-05-09.").
+bool Named(const QString &path, QString pattern)
+{
+    pattern.replace(u'@', u"-\\d{4}-\\d\\d-\\d\\d-\\d\\d-\\d\\d-\\d\\d\\."_s);
+    return QFileInfo(path).fileName().contains(QRegularExpression(u'^' + pattern + u'$'));
+}
 
 // A CopyFileFromDevice action that writes content to the host path.
 auto CopiesContent(const QByteArray &content)
 {
     return [content](const QString &, const QString &host) -> unsigned int {
-        QFile file(host);
-        if (!file.open(QIODevice::WriteOnly))
-            return 1;
-        file.write(content);
+        testutil::WriteFile(host, content);
         return 0;
     };
 }
@@ -81,9 +80,7 @@ TEST_F(RunContract, CopyLogSkipsMalformedPathsAndStampsEveryDot)
     ASSERT_TRUE(module.CopyLog(&device, env));
     ASSERT_EQ(module.desktopLogFiles.size(), 1);
     const QString copied = module.desktopLogFiles.first();
-    EXPECT_TRUE(
-        QFileInfo(copied).fileName().contains(QRegularExpression(u"^run"_s + kStamp + u"1"_s + kStamp + u"xml$"_s)))
-        << copied.toStdString();
+    EXPECT_TRUE(Named(copied, u"run@1@xml"_s)) << copied.toStdString();
     EXPECT_EQ(QFileInfo(copied).absolutePath(), env.value(u"LogPath"_s));
     const QString text = LogText();
     EXPECT_TRUE(text.contains(u"   Malformed source path nodirectory.txt\n"_s));
@@ -99,11 +96,8 @@ TEST_F(RunContract, KindsRenameTheirLogsOnTheHost)
     EXPECT_CALL(device, CopyFileFromDevice(_, _)).WillRepeatedly(Invoke(CopiesContent("x")));
     ASSERT_TRUE(ctf.CopyLog(&device, env));
     ASSERT_EQ(ctf.desktopLogFiles.size(), 2);
-    EXPECT_TRUE(QFileInfo(ctf.desktopLogFiles[0])
-                    .fileName()
-                    .contains(QRegularExpression(u"^ITimer-CTF"_s + kStamp + u"log$"_s)));
-    EXPECT_TRUE(
-        QFileInfo(ctf.desktopLogFiles[1]).fileName().contains(QRegularExpression(u"^ctf"_s + kStamp + u"log$"_s)));
+    EXPECT_TRUE(Named(ctf.desktopLogFiles[0], u"ITimer-CTF@log"_s));
+    EXPECT_TRUE(Named(ctf.desktopLogFiles[1], u"ctf@log"_s));
 
     CtfAppletTestModule applet;
     applet.applets << AppletWithId(0x20);
@@ -115,9 +109,8 @@ TEST_F(RunContract, KindsRenameTheirLogsOnTheHost)
     ASSERT_TRUE(applet.CopyLog(&device, env));
     ASSERT_EQ(applet.desktopLogFiles.size(), 2);
     // "_K." passes the test but only the exact "_k." is replaced.
-    EXPECT_TRUE(QFileInfo(applet.desktopLogFiles[0]).fileName().startsWith(u"suite_K-"_s));
-    EXPECT_TRUE(
-        QFileInfo(applet.desktopLogFiles[1]).fileName().contains(QRegularExpression(u"^other"_s + kStamp + u"log$"_s)));
+    EXPECT_TRUE(Named(applet.desktopLogFiles[0], u"suite_K@LOG"_s));
+    EXPECT_TRUE(Named(applet.desktopLogFiles[1], u"other@log"_s));
 }
 
 TEST_F(RunContract, RemoveTestFallsBackToTheNamedDirectory)
@@ -152,65 +145,60 @@ TEST_F(RunContract, InstallTestNeedsATargetForThePlatform)
     EXPECT_CALL(device, FindModule(0u, _)).WillOnce(DoAll(SetArgReferee<1>(u"fs:/usermods/h/"_s), Return(0u)));
     EXPECT_TRUE(module.InstallTest(&device));
     EXPECT_EQ(module.deviceDirectory, u"fs:/usermods/h/"_s);
+    // A secondary module is never run itself.
     EXPECT_FALSE(module.Run(&device, env));
-    EXPECT_TRUE(module.IsLogComplete(&device));
 }
 
-TEST_F(RunContract, StampingPutsTheHeaderBeforeTheAnchorAndKeepsTheBytes)
+TEST_F(RunContract, EachKindStampsItsHeaderAtItsAnchorAndKeepsTheBytes)
 {
     CtfTestModule ctf;
-    ctf.moduleName = u"ITimer"_s;
-    ctf.idHash = u"#42"_s;
-    const QByteArray latin = "Suite: caf\xe9\r\n";
-    ctf.AddDesktopLogFile(Write(u"a.log"_s, latin + "Test: t1\nResult: pass\nTest: t2\n"));
-    ctf.AddDesktopLogFile(Write(u"b.log"_s, "no anchor"));
-    ctf.PostProcess(env);
-    EXPECT_EQ(testutil::ReadFile(ctf.desktopLogFiles[0]),
-              latin + "GUID:{run-1}\nManifest Name:ITimer\nID Hash:#42\nTest: t1\nResult: pass\nTest: t2\n\n");
-    EXPECT_EQ(testutil::ReadFile(ctf.desktopLogFiles[1]),
-              QByteArray("no anchor\nGUID:{run-1}\nManifest Name:ITimer\nID Hash:#42\n"));
-
-    // A second stamping finds the first header and appends another at the end.
-    ctf.PostProcess(env);
-    const QByteArray twice = testutil::ReadFile(ctf.desktopLogFiles[0]);
-    EXPECT_EQ(twice.count("GUID:{run-1}"), 2);
-    EXPECT_TRUE(twice.endsWith("Test: t2\n\n\nGUID:{run-1}\nManifest Name:ITimer\nID Hash:#42\n"));
-    TestResults results;
-    ASSERT_TRUE(ctf.ParseLog(ctf.desktopLogFiles[0], results));
-    EXPECT_EQ(results.manifestName, u"ITimer"_s);
-    EXPECT_EQ(results.idHash, u"#42"_s);
-}
-
-TEST_F(RunContract, OatStampsBeforeTheLastModuleVerLine)
-{
     OatTestModule oat;
-    oat.moduleName = u"Timer"_s;
-    oat.AddDesktopLogFile(Write(u"t.oat"_s, "@Timer\nModuleVer: 1\nModuleVer: 2\nGUID:old\nModuleVer: 3\n"));
-    oat.PostProcess(env); // no Perl cache: stamping only
-    EXPECT_EQ(testutil::ReadFile(oat.desktopLogFiles[0]),
-              QByteArray("@Timer\nModuleVer: 1\nGUID:{run-1}\nManifest Name:Timer\nID Hash:\nModuleVer: "
-                         "2\nGUID:old\nModuleVer: 3\n\n"));
-}
-
-TEST_F(RunContract, UtStampsTextAfterTheFirstLineAndXmlOnTheRoot)
-{
     UTTestModule ut;
-    ut.moduleName = u"UTTimer"_s;
-    ut.idHash = u"#5"_s;
-    ut.AddDesktopLogFile(Write(u"r.TXT"_s, "first\nsecond\n"));
+    const QByteArray header = "GUID:{run-1}\nManifest Name:Timer\nID Hash:#5\n";
+    const QByteArray latin = "Suite: caf\xe9\r\n";
+    // Module, log file, its text, and the text once stamped: CTF after the
+    // suite line or at the end, OAT before the last module version line ahead
+    // of any header, UT text after the first line. No Perl cache: OAT logs are
+    // only stamped.
+    const std::tuple<_TestModule *, QString, QByteArray, QByteArray> rows[] = {
+        {&ctf, u"a.log"_s, latin + "Test: t1\nTest: t2\n", latin + header + "Test: t1\nTest: t2\n\n"},
+        {&ctf, u"b.log"_s, "no anchor", "no anchor\n" + header},
+        {&oat, u"t.oat"_s, "@Timer\nModuleVer: 1\nModuleVer: 2\nGUID:old\nModuleVer: 3\n",
+         "@Timer\nModuleVer: 1\n" + header + "ModuleVer: 2\nGUID:old\nModuleVer: 3\n\n"},
+        {&ut, u"r.TXT"_s, "first\nsecond\n", "first\n" + header + "second\n\n"},
+    };
+    for (const auto &[module, file, text, stamped] : rows) {
+        module->moduleName = u"Timer"_s;
+        module->idHash = u"#5"_s;
+        module->AddDesktopLogFile(Write(file, text));
+    }
     ut.AddDesktopLogFile(Write(u"r.xml"_s, "<TestRunLog guid='old'><case name='t1'/></TestRunLog>"));
     ut.AddDesktopLogFile(Write(u"bad.xml"_s, "<TestRunLog>"));
+    ctf.PostProcess(env);
+    oat.PostProcess(env);
     ut.PostProcess(env);
-    EXPECT_EQ(testutil::ReadFile(ut.desktopLogFiles[0]),
-              QByteArray("first\nGUID:{run-1}\nManifest Name:UTTimer\nID Hash:#5\nsecond\n\n"));
+    for (const auto &[module, file, text, stamped] : rows)
+        EXPECT_EQ(testutil::ReadFile(dir.filePath(file)), stamped) << file.toStdString();
+
     QDomDocument document;
-    ASSERT_TRUE(document.setContent(testutil::ReadFile(ut.desktopLogFiles[1])));
+    ASSERT_TRUE(document.setContent(testutil::ReadFile(dir.filePath(u"r.xml"_s))));
     const QDomElement root = document.documentElement();
     EXPECT_EQ(root.attribute(u"guid"_s), u"{run-1}"_s);
-    EXPECT_EQ(root.attribute(u"manifest_name"_s), u"UTTimer"_s);
+    EXPECT_EQ(root.attribute(u"manifest_name"_s), u"Timer"_s);
     EXPECT_EQ(root.attribute(u"id_hash"_s), u"#5"_s);
     EXPECT_EQ(root.firstChildElement().attribute(u"name"_s), u"t1"_s);
-    EXPECT_EQ(testutil::ReadFile(ut.desktopLogFiles[2]), QByteArray("<TestRunLog>"));
+    EXPECT_EQ(testutil::ReadFile(dir.filePath(u"bad.xml"_s)), QByteArray("<TestRunLog>"));
+
+    // A second stamping finds the first header and appends another at the
+    // end; the parser reads the header back.
+    ctf.PostProcess(env);
+    const QByteArray twice = testutil::ReadFile(dir.filePath(u"a.log"_s));
+    EXPECT_EQ(twice.count("GUID:{run-1}"), 2);
+    EXPECT_TRUE(twice.endsWith("Test: t2\n\n\n" + header));
+    TestResults results;
+    ASSERT_TRUE(ctf.ParseLog(dir.filePath(u"a.log"_s), results));
+    EXPECT_EQ(results.manifestName, u"Timer"_s);
+    EXPECT_EQ(results.idHash, u"#5"_s);
 }
 
 TEST_F(RunContract, LogWaitsGiveUpWhenTheEndMarkerNeverComes)
@@ -298,13 +286,8 @@ TEST_F(RunContract, AppletsThatNeverStopTimeOut)
     applet.targets.insert(u"t"_s, Target(u"/a.kestix"_s, IKestoDevice::PLATFORM_UNKNOWN));
     EXPECT_CALL(device, InstallPackage(_)).WillRepeatedly(Return(0u));
     EXPECT_CALL(device, StartApplet(0xffu, QString())).WillOnce(Return(0u)).WillOnce(Return(3u));
-    int polls = 0;
-    EXPECT_CALL(device, IsAppletRunning(0xffu)).WillRepeatedly(Invoke([&polls](unsigned int) {
-        ++polls;
-        return true;
-    }));
+    EXPECT_CALL(device, IsAppletRunning(0xffu)).Times(660001).WillRepeatedly(Return(true));
     EXPECT_FALSE(applet.Run(&device, env));
-    EXPECT_EQ(polls, 660001);
 
     device.lastError = 255;
     EXPECT_FALSE(applet.Run(&device, env));
