@@ -24,10 +24,7 @@ using namespace Qt::StringLiterals;
 
 namespace {
 
-using moduletest::AppletWithId;
-using moduletest::Pairs;
-using moduletest::PairsOf;
-using moduletest::Target;
+using namespace moduletest;
 
 // The lines of a host file, without line ends.
 QStringList Lines(const QString &path)

@@ -3,20 +3,17 @@
 
 #include "moduletest.h"
 
-#include "log/log.h"
 #include "modules/oatframework.h"
 #include "modules/oattestmodule.h"
 #include "support/mockdevice.h"
-#include "support/testutil.h"
 
 #include <QDir>
-#include <QTemporaryDir>
 
 #include <gtest/gtest.h>
 
 using namespace Qt::StringLiterals;
 
-using moduletest::Target;
+using namespace moduletest;
 using ::testing::_;
 using ::testing::DoAll;
 using ::testing::NiceMock;
@@ -128,18 +125,13 @@ TEST_F(OatRun, WithoutAProgramNothingIsInstalledAndStartFailuresAreReported)
     EXPECT_TRUE(LogText().contains(u"OatTestModule::Run error: 2147500037(0x80004005)"_s));
 }
 
-TEST_F(OatRun, PrefersTheULogAndRemovesLogsAndPublishedFile)
+TEST_F(OatRun, PrefersTheULog)
 {
     EXPECT_CALL(device, FileExists(u"fs:/shared/pek/log/timer_u.oat"_s)).WillRepeatedly(Return(true));
     EXPECT_CALL(device, FileExists(u"fs:/shared/pek/log/timer.oat"_s)).Times(0);
     QStringList paths{u"stale"_s};
     ASSERT_TRUE(module.GetLogFilePaths(&device, paths));
     EXPECT_EQ(paths, QStringList{u"fs:/shared/pek/log/timer_u.oat"_s});
-
-    EXPECT_CALL(device, RemoveDirectory(u"fs:/usermods/OatTimer"_s)).WillOnce(Return(0u));
-    EXPECT_CALL(device, DeleteFile(u"fs:/shared/pek/log/timer_u.oat"_s)).WillOnce(Return(0u));
-    EXPECT_CALL(device, DeleteFile(u"fs:/mif/oattimer.mif"_s)).WillOnce(Return(0u));
-    EXPECT_FALSE(module.RemoveTest(&device));
 }
 
 TEST(OatFramework, LoadPushesBothCachesAndRestoresTheFlags)

@@ -45,8 +45,7 @@ auto CopiesContent(const QByteArray &content)
     };
 }
 
-using moduletest::AppletWithId;
-using moduletest::Target;
+using namespace moduletest;
 
 class RunContract : public moduletest::ModuleFolder
 {
