@@ -134,14 +134,12 @@ TEST_F(OatRun, PrefersTheULog)
     EXPECT_EQ(paths, QStringList{u"fs:/shared/pek/log/timer_u.oat"_s});
 }
 
-TEST(OatFramework, LoadPushesBothCachesAndRestoresTheFlags)
+TEST_F(OatRun, FrameworkLoadPushesBothCachesAndRestoresTheFlags)
 {
-    NiceMock<MockDevice> device;
-    device.platform = IKestoDevice::PLATFORM_WIN32;
     _OatFramework framework;
-    QMap<QString, QString> env{{u"TestDataSpecified"_s, u"false"_s},
-                               {u"TestDataCachePath"_s, u"/cache/td.kar"_s},
-                               {u"DevicePackCachePath"_s, u"/cache/dp.kar"_s}};
+    env = {{u"TestDataSpecified"_s, u"false"_s},
+           {u"TestDataCachePath"_s, u"/cache/td.kar"_s},
+           {u"DevicePackCachePath"_s, u"/cache/dp.kar"_s}};
     EXPECT_FALSE(framework.Load(&device, env));
 
     framework.variants.insert(u"v"_s, Target(u"/oat.kestix"_s));
@@ -162,9 +160,8 @@ TEST(OatFramework, LoadPushesBothCachesAndRestoresTheFlags)
     EXPECT_TRUE(framework.PostLoad(&device, env));
 }
 
-TEST(OatFramework, IsLoadedUsesTheFixedClassIdAndUnloadRemovesEveryOatFolder)
+TEST_F(OatRun, FrameworkIsLoadedUsesTheFixedClassIdAndUnloadRemovesEveryOatFolder)
 {
-    NiceMock<MockDevice> device;
     _OatFramework framework;
     framework.classId = 5;
     EXPECT_CALL(device, FindModule(0x01010001u, _)).WillRepeatedly(Return(1u));
@@ -172,7 +169,6 @@ TEST(OatFramework, IsLoadedUsesTheFixedClassIdAndUnloadRemovesEveryOatFolder)
     EXPECT_TRUE(framework.IsLoaded(&device));
 
     ::testing::InSequence order;
-    QMap<QString, QString> env;
     EXPECT_CALL(device, RemoveDirectory(u"fs:/usermods/oat/"_s));
     EXPECT_CALL(device, RemoveDirectory(u"fs:/usermods/oatinterfaceext/"_s));
     EXPECT_CALL(device, RemoveDirectory(u"fs:/usermods/oatresourceext/"_s));
@@ -186,6 +182,8 @@ class OatPostProcess : public moduletest::ModuleFolder
 protected:
     void SetUp() override
     {
+        if (!testutil::HaveProgram(u"perl"_s))
+            GTEST_SKIP() << "perl is not installed";
         perlCache = dir.filePath(u"perl"_s);
         logs = dir.filePath(u"logs"_s);
         raw = logs + u"/oatRawLogs"_s;
@@ -213,8 +211,6 @@ protected:
 
 TEST_F(OatPostProcess, RunsTheScriptAndCollectsItsOutput)
 {
-    if (!testutil::HaveProgram(u"perl"_s))
-        GTEST_SKIP() << "perl is not installed";
     module.PostProcess(env);
 
     const QString output = logs + u"/pp-timer-2026.oat"_s;
@@ -233,8 +229,6 @@ TEST_F(OatPostProcess, RunsTheScriptAndCollectsItsOutput)
 
 TEST_F(OatPostProcess, FrameworkPostProcessCoversTheWholeRawFolder)
 {
-    if (!testutil::HaveProgram(u"perl"_s))
-        GTEST_SKIP() << "perl is not installed";
     env.remove(u"OatRawLogPath"_s);
     _OatFramework framework;
     framework.SetLogger(&log);
@@ -247,8 +241,6 @@ TEST_F(OatPostProcess, FrameworkPostProcessCoversTheWholeRawFolder)
 
 TEST_F(OatPostProcess, MissingEntryStopsWithItsMessageAndKeepsTheRawLogs)
 {
-    if (!testutil::HaveProgram(u"perl"_s))
-        GTEST_SKIP() << "perl is not installed";
     const char *rows[][2] = {
         {"OatRawLogPath", "OatTestModule::PostProcess missing oat source log directory"},
         {"LogPath", "OatTestModule::PostProcess missing destination log directory"},
