@@ -98,18 +98,6 @@ TEST_F(OatRun, ArgumentsNameTheModeTheProgramAndTheCases)
     EXPECT_TRUE(LogText().contains(u"OatTestModule::Unknown Run Optionsometimes"_s));
 }
 
-TEST_F(OatRun, PublishesTheModuleInformationFileBeforeStarting)
-{
-    module.programs << Program("OatSuite1");
-    ::testing::InSequence order;
-    EXPECT_CALL(device, InstallPackage(u"/oattimer.kestix"_s)).WillOnce(Return(0u));
-    EXPECT_CALL(device, CopyOnDevice(u"fs:/usermods/oattimer/oattimer.mif"_s, u"fs:/mif/oattimer.mif"_s))
-        .WillOnce(Return(true));
-    EXPECT_CALL(device, StartApplet(0x01010001u, _)).WillOnce(Return(0u));
-    EXPECT_CALL(device, IsAppletRunning(0x01010001u)).WillOnce(Return(true)).WillOnce(Return(false));
-    EXPECT_TRUE(module.Run(&device, env));
-}
-
 TEST_F(OatRun, WithoutAProgramNothingIsInstalledAndStartFailuresAreReported)
 {
     module.SetRunOption(u"auto"_s);

@@ -9,8 +9,6 @@
 
 #include <gtest/gtest.h>
 
-using namespace Qt::StringLiterals;
-
 namespace testutil {
 
 HandsetFixture::HandsetFixture()
@@ -19,16 +17,6 @@ HandsetFixture::HandsetFixture()
     QDir().mkpath(HandsetsFolder());
     QDir().mkpath(WorkFolder());
     m_env.Set("KESTIX_HANDSETS", HandsetsFolder());
-}
-
-QString HandsetFixture::HandsetsFolder() const
-{
-    return m_dir.filePath(u"handsets"_s);
-}
-
-QString HandsetFixture::WorkFolder() const
-{
-    return m_dir.filePath(u"work"_s);
 }
 
 QString HandsetFixture::AddHandset(const QString &name, const QString &description, const QString &platform,
@@ -48,11 +36,6 @@ QString HandsetFixture::AddHandset(const QString &name, const QString &descripti
     settings.sync();
     EXPECT_EQ(settings.status(), QSettings::NoError);
     return folder;
-}
-
-QString HandsetFixture::HandsetFolder(const QString &name) const
-{
-    return HandsetsFolder() + u'/' + name;
 }
 
 QString HandsetFixture::HostPath(const QString &name, const QString &handsetPath) const

@@ -41,15 +41,15 @@ public:
     HandsetFixture &operator=(const HandsetFixture &) = delete;
 
     // The handsets folder (KESTIX_HANDSETS).
-    QString HandsetsFolder() const;
+    QString HandsetsFolder() const { return m_dir.filePath(u"handsets"_s); }
     // A folder for packages and host files, outside the handsets folder.
-    QString WorkFolder() const;
+    QString WorkFolder() const { return m_dir.filePath(u"work"_s); }
 
     // Creates <handsets>/<name>/handset.ini holding the keys given (empty
     // ones are left out) and an empty fs folder; returns the handset folder.
     QString AddHandset(const QString &name, const QString &description = QString(), const QString &platform = QString(),
                        const QString &version = QString());
-    QString HandsetFolder(const QString &name) const;
+    QString HandsetFolder(const QString &name) const { return HandsetsFolder() + u'/' + name; }
     // The host path of a handset path ("fs:/a/b") of handset name.
     QString HostPath(const QString &name, const QString &handsetPath) const;
 

@@ -9,19 +9,7 @@
 
 #include <gtest/gtest.h>
 
-using namespace Qt::StringLiterals;
-
 namespace testutil {
-
-CapturedLog::CapturedLog()
-{
-    m_log.SetLogPath(m_dir.filePath(u"log.txt"_s));
-}
-
-QString CapturedLog::Text() const
-{
-    return QString::fromLatin1(ReadFile(m_dir.filePath(u"log.txt"_s)));
-}
 
 ResultsView ReadResults(const QString &path)
 {
@@ -56,20 +44,10 @@ KitRun::~KitRun()
         harness->DisconnectTarget();
 }
 
-QString KitRun::Path(const QString &relative) const
-{
-    return m_dir.filePath(relative);
-}
-
 bool KitRun::KitOk() const
 {
     EXPECT_TRUE(m_kit.Ok()) << m_kit.Errors().join(u'\n').toStdString();
     return m_kit.Ok();
-}
-
-QString KitRun::AddHandset(const QString &name)
-{
-    return m_handsets.AddHandset(name, u"Emulated "_s + name, u"win32"_s);
 }
 
 QStringList KitRun::AddHandsets(int count, const QString &prefix)
@@ -80,11 +58,6 @@ QStringList KitRun::AddHandsets(int count, const QString &prefix)
         AddHandset(names.last());
     }
     return names;
-}
-
-QString KitRun::LogFolder(const QString &handset) const
-{
-    return m_dir.filePath(u"logs/"_s + handset);
 }
 
 void KitRun::Configure(Harness &harness, const QString &handset, Log *log) const
@@ -129,11 +102,6 @@ bool KitRun::RunModules(Harness &harness, const QStringList &names)
 QString KitRun::ResultsPath(const QString &handset) const
 {
     return TestDirectories::GetProcessResultsPath(handset);
-}
-
-QMap<QString, QString> KitRun::Verdicts(const QString &handset) const
-{
-    return ReadResults(ResultsPath(handset)).verdicts;
 }
 
 QStringList KitRun::Runs() const

@@ -32,9 +32,9 @@ namespace testutil {
 class CapturedLog
 {
 public:
-    CapturedLog();
+    CapturedLog() { m_log.SetLogPath(m_dir.filePath(u"log.txt"_s)); }
     Log *log() { return &m_log; }
-    QString Text() const;
+    QString Text() const { return QString::fromLatin1(ReadFile(m_dir.filePath(u"log.txt"_s))); }
 
 private:
     QTemporaryDir m_dir;
@@ -62,20 +62,20 @@ public:
     KitRun &operator=(const KitRun &) = delete;
 
     // A path in the run's temporary folder.
-    QString Path(const QString &relative) const;
+    QString Path(const QString &relative) const { return m_dir.filePath(relative); }
     kitbuilder::KitBuilder &Kit() { return m_kit; }
     HandsetFixture &Handsets() { return m_handsets; }
     // Fails the test (and returns false) when the kit could not be written.
     bool KitOk() const;
 
     // Adds a win32 handset; returns its folder.
-    QString AddHandset(const QString &name);
+    QString AddHandset(const QString &name) { return m_handsets.AddHandset(name, u"Emulated "_s + name, u"win32"_s); }
     // Adds handsets "<prefix>1" ... "<prefix>count"; returns their names.
     QStringList AddHandsets(int count, const QString &prefix = QStringLiteral("h"));
     QString HandsetFolder(const QString &name) const { return m_handsets.HandsetFolder(name); }
 
     // Where the logs of runs on the handset are copied.
-    QString LogFolder(const QString &handset) const;
+    QString LogFolder(const QString &handset) const { return m_dir.filePath(u"logs/"_s + handset); }
     // Sets harness up for the kit and handset, logging to log.
     void Configure(Harness &harness, const QString &handset, Log *log) const;
     // A harness set up for the handset, logging to the run's log unless told
@@ -91,7 +91,7 @@ public:
     QString LogText() const { return m_log.Text(); }
     // The verdicts of the handset's processed-results file.
     QString ResultsPath(const QString &handset) const;
-    QMap<QString, QString> Verdicts(const QString &handset) const;
+    QMap<QString, QString> Verdicts(const QString &handset) const { return ReadResults(ResultsPath(handset)).verdicts; }
     // The lines the shard kit's behaviours wrote to runs.txt.
     QStringList Runs() const;
 

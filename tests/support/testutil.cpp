@@ -12,8 +12,6 @@
 
 #include <cstdlib>
 
-using namespace Qt::StringLiterals;
-
 namespace testutil {
 
 EnvGuard::~EnvGuard()
@@ -47,16 +45,6 @@ void EnvGuard::Unset(const char *name)
     qunsetenv(name);
 }
 
-CurrentDirectory::CurrentDirectory(const QString &path) : m_previous(QDir::currentPath())
-{
-    QDir::setCurrent(path);
-}
-
-CurrentDirectory::~CurrentDirectory()
-{
-    QDir::setCurrent(m_previous);
-}
-
 void WriteFile(const QString &path, const QByteArray &bytes)
 {
     QDir().mkpath(QFileInfo(path).absolutePath());
@@ -78,8 +66,7 @@ int RunProgram(const QString &program, const QStringList &arguments, QByteArray 
 {
     QProcess process;
     process.setProcessChannelMode(QProcess::MergedChannels);
-    if (!workingDirectory.isEmpty())
-        process.setWorkingDirectory(workingDirectory);
+    process.setWorkingDirectory(workingDirectory); // empty: the current one
     process.start(program, arguments);
     if (!process.waitForStarted(30000))
         return -1;
@@ -87,9 +74,7 @@ int RunProgram(const QString &program, const QStringList &arguments, QByteArray 
     process.waitForFinished(300000);
     if (output)
         *output = process.readAll();
-    if (process.exitStatus() != QProcess::NormalExit)
-        return -1;
-    return process.exitCode();
+    return process.exitStatus() == QProcess::NormalExit ? process.exitCode() : -1;
 }
 
 bool HaveProgram(const QString &program)

@@ -1,12 +1,15 @@
 #pragma once
 
 #include <QByteArray>
+#include <QDir>
 #include <QMap>
 #include <QString>
 #include <QStringList>
 #include <QTemporaryDir>
 
 namespace testutil {
+
+using namespace Qt::StringLiterals;
 
 // Sets environment variables for the lifetime of the object and restores the
 // previous values (or their absence) afterwards.
@@ -32,8 +35,8 @@ private:
 class CurrentDirectory
 {
 public:
-    explicit CurrentDirectory(const QString &path);
-    ~CurrentDirectory();
+    explicit CurrentDirectory(const QString &path) : m_previous(QDir::currentPath()) { QDir::setCurrent(path); }
+    ~CurrentDirectory() { QDir::setCurrent(m_previous); }
     CurrentDirectory(const CurrentDirectory &) = delete;
     CurrentDirectory &operator=(const CurrentDirectory &) = delete;
 
