@@ -89,14 +89,13 @@ TEST_F(EndToEnd, CtfModuleRunsItsProgramAndLeavesNothingBehind)
                        "{ echo \"Suite: ITimer\"; echo \"Args: $3 $4\"; echo \"Time: 2026/12/03 14:05:09\";\n"
                        "  echo \"Test: t1\"; echo \"Result: PASS\"; echo \"Result: Fail\"; echo \"Test: t2\";\n"
                        "  echo \"[/VERBOSE]\"; } >> \"$log\"\n";
-    const QString package = fixture.MakePackage(u"ITimer_Win32_Release.kestix"_s, layout);
 
     CtfTestModule module;
     module.moduleName = u"ITimer"_s;
+    module.targets.insert(u"t"_s, Target(fixture.MakePackage(u"ITimer_Win32_Release.kestix"_s, layout)));
     EXPECT_FALSE(module.ProcessPackage(fixture.WorkFolder()));
     ASSERT_EQ(module.programs.size(), 2);
     EXPECT_EQ(module.ModuleName(), u"ITimer_k_main"_s);
-    module.targets.insert(u"t"_s, Target(package));
     // A stale log from an earlier run is replaced by the empty template.
     testutil::WriteFile(fixture.HostPath(u"phone"_s, u"fs:/usermods/CTF/CTF.log"_s), "Suite: stale\n");
     RunModule(module);
@@ -176,7 +175,6 @@ TEST_F(EndToEnd, UtModuleReadsItsConfigurationAndWritesBothLogs)
           "  echo \"------------\"; for t in $(echo $allow | tr , ' '); do echo \"$t PASSED 12 ms\"; done;\n"
           "  echo \"t9 Failed\"; echo \"------------\"; echo \"Elapsed Time: 1s\"; } > usermods/uttimer/log/run.txt\n"
           "echo '<TestRunLog cases=\"'$allow'\"></TestRunLog>' > usermods/uttimer/log/run.xml\n";
-    const QString package = fixture.MakePackage(u"UTTimer_Win32_Release.kestix"_s, layout);
     const QString source = fixture.WorkFolder() + u"/src"_s;
     testutil::WriteFile(source + u"/utconfig.dat"_s, "[Defaults]\nLevel=2");
 
@@ -184,7 +182,7 @@ TEST_F(EndToEnd, UtModuleReadsItsConfigurationAndWritesBothLogs)
     module.moduleName = u"UTTimer"_s;
     module.sourcePath = source;
     module.applets << AppletWithId(0x20002000);
-    module.targets.insert(u"t"_s, Target(package));
+    module.targets.insert(u"t"_s, Target(fixture.MakePackage(u"UTTimer_Win32_Release.kestix"_s, layout)));
     module.SetTestCases({u"t1"_s, u"t2"_s});
     // The configuration's way to the handset leaves nothing behind.
     const QStringList before = QDir::temp().entryList({u"test_*.dat"_s}, QDir::Files);

@@ -207,9 +207,8 @@ TEST_F(RunContract, LogWaitsGiveUpWhenTheEndMarkerNeverComes)
     ctf.logPaths << u"fs:/usermods/CTF/CTF.log"_s;
     int copies = 0;
     EXPECT_CALL(device, CopyFileFromDevice(u"fs:/usermods/CTF/CTF.log"_s, _))
-        .WillRepeatedly(Invoke([&copies](const QString &, const QString &host) -> unsigned int {
-            ++copies;
-            return CopiesContent(QByteArray(copies, 'x'))(QString(), host);
+        .WillRepeatedly(Invoke([&copies](const QString &, const QString &host) {
+            return CopiesContent(QByteArray(++copies, 'x'))(QString(), host);
         }));
     EXPECT_FALSE(ctf.IsLogComplete(&device));
     // Delays of 100, 200, ... 2000 ms, then 2000 ms each, until ten minutes.
@@ -256,8 +255,8 @@ TEST_F(RunContract, UtCompletionNeedsBothMarkers)
         .WillOnce(Invoke(CopiesContent("<TestRunLog></TestRunLog>")));
     EXPECT_CALL(device, CopyFileFromDevice(u"fs:/usermods/ut/log/r.txt"_s, _))
         .WillRepeatedly(Invoke([&textCopies](const QString &, const QString &host) {
-            return CopiesContent(++textCopies < 4 ? "elapsed time: lower case\n" : "Elapsed Time: 1s\n")(QString(),
-                                                                                                         host);
+            const QByteArray text = ++textCopies < 4 ? "elapsed time: lower case\n" : "Elapsed Time: 1s\n";
+            return CopiesContent(text)(QString(), host);
         }));
     EXPECT_TRUE(ut.IsLogComplete(&device));
     EXPECT_EQ(textCopies, 4);
