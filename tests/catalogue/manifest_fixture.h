@@ -28,7 +28,7 @@ protected:
         logger.SetLogPath(m_dir.path() + u"/log.txt"_s);
     }
 
-    QString TempPath(const QString &relative) const { return m_dir.path() + QLatin1Char('/') + relative; }
+    QString TempPath(const QString &relative) const { return m_dir.path() + u'/' + relative; }
 
     static kitbuilder::Module MakeModule(const QString &kind, const QString &name)
     {
@@ -42,7 +42,7 @@ protected:
     // Scans the kit from scratch into manifest.
     void Scan(Manifest &manifest)
     {
-        ASSERT_TRUE(kit->Ok()) << kit->Errors().join(QLatin1Char('\n')).toStdString();
+        ASSERT_TRUE(kit->Ok()) << kit->Errors().join(u'\n').toStdString();
         manifest.SetLogger(&logger);
         ASSERT_TRUE(manifest.GenerateManifest(true));
     }

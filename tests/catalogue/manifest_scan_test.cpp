@@ -112,7 +112,7 @@ TEST_F(ManifestScanTest, FamiliesComeFromTheDescriptionOrElseFromThePath)
 
     const auto family = [&](const char *name) {
         const auto module = manifest.FindTestModule(QLatin1String(name));
-        return module ? module->family + QLatin1Char('/') + module->subFamily : u"missing"_s;
+        return module ? module->family + u'/' + module->subFamily : u"missing"_s;
     };
     EXPECT_EQ(family("audio"), u"multimedia/audio"_s);
     EXPECT_EQ(family("socket"), u"net/socket"_s);

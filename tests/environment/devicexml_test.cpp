@@ -1,7 +1,5 @@
 #include "environment/devicexml.h"
 
-#include "currentdirectory.h"
-
 #include "support/testutil.h"
 
 #include <QDir>
@@ -31,7 +29,7 @@ protected:
 
     QString Write(const QString &name, const QByteArray &bytes)
     {
-        const QString path = pack + QLatin1Char('/') + name;
+        const QString path = pack + u'/' + name;
         testutil::WriteFile(path, bytes);
         return path;
     }
@@ -40,7 +38,7 @@ protected:
     // found beside the device pack.
     QByteArray Flatten(const QString &source)
     {
-        CurrentDirectory cd(elsewhere);
+        testutil::CurrentDirectory cd(elsewhere);
         EXPECT_TRUE(FlattenDeviceXml(source, output));
         return testutil::ReadFile(output);
     }
@@ -61,139 +59,73 @@ protected:
     testutil::EnvGuard env;
 };
 
-TEST_F(FlattenDeviceXmlTest, IncludesEntityFilesBesideThePackAndDropsTheDoctype)
+struct FlattenCase
 {
-    Write(u"keys.xml"_s, "<?xml version=\"1.0\"?>\n<include>\n  <keys><key code=\"1\"/></keys>\n</include>\n");
-    Write(u"sub/extra.xml"_s, "<include><extra/><more n=\"2\"/></include>");
-    const QString device = Write(u"device.xml"_s,
-                                 "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n"
-                                 "<!DOCTYPE devicepack [\n"
-                                 "  <!ENTITY keys SYSTEM \"keys.xml\">\n"
-                                 "  <!ENTITY extra SYSTEM \"sub/extra.xml\">\n"
-                                 "  <!ENTITY name \"Phone &amp; Co\">\n"
-                                 "]>\n"
-                                 "<devicepack>\n"
-                                 "  <display width=\"176\"/>\n"
-                                 "  &keys;\n"
-                                 "  <!-- &keys; in a comment stays -->\n"
-                                 "  <misc label=\"&name;\">&extra;<![CDATA[&keys;]]></misc>\n"
-                                 "</devicepack>\n");
+    const char *what;
+    std::vector<std::pair<QString, QByteArray>> includes; // written beside the pack first
+    QByteArray source;
+    QByteArray expected;
+};
 
-    EXPECT_EQ(Flatten(device),
-              QByteArray("<?xml version='1.0' encoding='UTF-8'?>\n"
-                         "<devicepack>\n"
-                         " <display width=\"176\"/>\n"
-                         " <keys>\n"
-                         "  <key code=\"1\"/>\n"
-                         " </keys>\n"
-                         " <!-- &keys; in a comment stays -->\n"
-                         " <misc label=\"Phone &amp; Co\">\n"
-                         "  <extra/>\n"
-                         "  <more n=\"2\"/><![CDATA[&keys;]]></misc>\n"
-                         "</devicepack>\n"));
-    ExpectWellFormed();
-}
-
-TEST_F(FlattenDeviceXmlTest, MergesSectionsOfTheSameNameInDocumentOrder)
+TEST_F(FlattenDeviceXmlTest, ExpandsIncludesAndMergesSections)
 {
-    Write(u"more.xml"_s, "<x><display><mode n=\"3\"/></display></x>");
-    const QString device = Write(u"device.xml"_s,
-                                 "<?xml version=\"1.0\"?>\n"
-                                 "<!DOCTYPE pack [<!ENTITY more SYSTEM \"more.xml\">]>\n"
-                                 "<pack>\n"
-                                 "  <display a=\"first\"><mode n=\"1\"/>text</display>\n"
-                                 "  <keys><k/></keys>\n"
-                                 "  <display a=\"second\"><mode n=\"2\"/><!--c--></display>\n"
-                                 "  &more;\n"
-                                 "  <keys/>\n"
-                                 "</pack>\n");
-
-    EXPECT_EQ(Flatten(device),
-              QByteArray("<?xml version='1.0'?>\n"
-                         "<pack>\n"
-                         " <display a=\"first\">\n"
-                         "  <mode n=\"1\"/>text<mode n=\"2\"/>\n"
-                         "  <!--c-->\n"
-                         "  <mode n=\"3\"/>\n"
-                         " </display>\n"
-                         " <keys>\n"
-                         "  <k/>\n"
-                         " </keys>\n"
-                         "</pack>\n"));
-    ExpectWellFormed();
-}
-
-TEST_F(FlattenDeviceXmlTest, PackWithoutXmlDeclarationKeepsItsDoctype)
-{
-    Write(u"keys.xml"_s, "<i><keys/></i>");
-    const QString device
-        = Write(u"device.xml"_s, "<!DOCTYPE pack [<!ENTITY keys SYSTEM \"keys.xml\">]>\n<pack>&keys;</pack>\n");
-
-    EXPECT_EQ(Flatten(device),
-              QByteArray("<!DOCTYPE pack [\n"
-                         "<!ENTITY keys SYSTEM \"keys.xml\">\n"
-                         "]>\n"
-                         "<pack>\n"
-                         " <keys/>\n"
-                         "</pack>\n"));
-}
-
-TEST_F(FlattenDeviceXmlTest, DoctypeWithoutInternalSubsetStays)
-{
-    // "]>" further on belongs to the body, not to the declaration.
-    const QString device
-        = Write(u"device.xml"_s,
-                "<?xml version=\"1.0\"?>\n<!DOCTYPE pack SYSTEM \"pack.dtd\">\n<pack><!-- ]> --><a/></pack>\n");
-    EXPECT_EQ(Flatten(device),
-              QByteArray("<?xml version='1.0'?>\n"
-                         "<!DOCTYPE pack SYSTEM \"pack.dtd\">\n"
-                         "<pack>\n"
-                         " <!-- ]> -->\n"
-                         " <a/>\n"
-                         "</pack>\n"));
-}
-
-TEST_F(FlattenDeviceXmlTest, MissingOrMalformedIncludesKeepTheirReferences)
-{
-    Write(u"broken.xml"_s, "<i><unclosed></i>");
-    Write(u"good.xml"_s, "<i><good/></i>");
-    const QString device = Write(u"device.xml"_s,
-                                 "<?xml version=\"1.0\"?>\n"
-                                 "<!DOCTYPE pack [\n"
-                                 "<!ENTITY gone SYSTEM \"gone.xml\">\n"
-                                 "<!ENTITY broken SYSTEM \"broken.xml\">\n"
-                                 "<!ENTITY good SYSTEM \"good.xml\">\n"
-                                 "]>\n"
-                                 "<pack><a>&gone;</a><b>x&broken;y</b>&good;</pack>\n");
-
-    // The declarations stay with the references, so the file stays well-formed.
-    EXPECT_EQ(Flatten(device),
-              QByteArray("<?xml version='1.0'?>\n"
-                         "<!DOCTYPE pack [\n"
-                         "<!ENTITY broken SYSTEM \"broken.xml\">\n"
-                         "<!ENTITY gone SYSTEM \"gone.xml\">\n"
-                         "<!ENTITY good SYSTEM \"good.xml\">\n"
-                         "]>\n"
-                         "<pack>\n"
-                         " <a>&gone;</a>\n"
-                         " <b>x&broken;y</b>\n"
-                         " <good/>\n"
-                         "</pack>\n"));
-    ExpectWellFormed();
+    const FlattenCase rows[] = {
+        {"IncludesEntityFilesBesideThePackAndDropsTheDoctype",
+         {{u"keys.xml"_s, "<?xml version=\"1.0\"?>\n<include>\n  <keys><key code=\"1\"/></keys>\n</include>\n"},
+          {u"sub/extra.xml"_s, "<include><extra/><more n=\"2\"/></include>"}},
+         "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<!DOCTYPE devicepack [\n"
+         "  <!ENTITY keys SYSTEM \"keys.xml\">\n  <!ENTITY extra SYSTEM \"sub/extra.xml\">\n"
+         "  <!ENTITY name \"Phone &amp; Co\">\n]>\n"
+         "<devicepack>\n  <display width=\"176\"/>\n  &keys;\n  <!-- &keys; in a comment stays -->\n"
+         "  <misc label=\"&name;\">&extra;<![CDATA[&keys;]]></misc>\n</devicepack>\n",
+         "<?xml version='1.0' encoding='UTF-8'?>\n<devicepack>\n <display width=\"176\"/>\n"
+         " <keys>\n  <key code=\"1\"/>\n </keys>\n <!-- &keys; in a comment stays -->\n"
+         " <misc label=\"Phone &amp; Co\">\n  <extra/>\n  <more n=\"2\"/><![CDATA[&keys;]]></misc>\n</devicepack>\n"},
+        {"MergesSectionsOfTheSameNameInDocumentOrder",
+         {{u"more.xml"_s, "<x><display><mode n=\"3\"/></display></x>"}},
+         "<?xml version=\"1.0\"?>\n<!DOCTYPE pack [<!ENTITY more SYSTEM \"more.xml\">]>\n<pack>\n"
+         "  <display a=\"first\"><mode n=\"1\"/>text</display>\n  <keys><k/></keys>\n"
+         "  <display a=\"second\"><mode n=\"2\"/><!--c--></display>\n  &more;\n  <keys/>\n</pack>\n",
+         "<?xml version='1.0'?>\n<pack>\n <display a=\"first\">\n  <mode n=\"1\"/>text<mode n=\"2\"/>\n"
+         "  <!--c-->\n  <mode n=\"3\"/>\n </display>\n <keys>\n  <k/>\n </keys>\n</pack>\n"},
+        // Without an XML declaration the doctype stays.
+        {"PackWithoutXmlDeclarationKeepsItsDoctype",
+         {{u"keys.xml"_s, "<i><keys/></i>"}},
+         "<!DOCTYPE pack [<!ENTITY keys SYSTEM \"keys.xml\">]>\n<pack>&keys;</pack>\n",
+         "<!DOCTYPE pack [\n<!ENTITY keys SYSTEM \"keys.xml\">\n]>\n<pack>\n <keys/>\n</pack>\n"},
+        // "]>" further on belongs to the body, not to the declaration.
+        {"DoctypeWithoutInternalSubsetStays",
+         {},
+         "<?xml version=\"1.0\"?>\n<!DOCTYPE pack SYSTEM \"pack.dtd\">\n<pack><!-- ]> --><a/></pack>\n",
+         "<?xml version='1.0'?>\n<!DOCTYPE pack SYSTEM \"pack.dtd\">\n<pack>\n <!-- ]> -->\n <a/>\n</pack>\n"},
+        // The declarations stay with the references, so the file stays well-formed.
+        {"MissingOrMalformedIncludesKeepTheirReferences",
+         {{u"broken.xml"_s, "<i><unclosed></i>"}, {u"good.xml"_s, "<i><good/></i>"}},
+         "<?xml version=\"1.0\"?>\n<!DOCTYPE pack [\n<!ENTITY gone SYSTEM \"gone.xml\">\n"
+         "<!ENTITY broken SYSTEM \"broken.xml\">\n<!ENTITY good SYSTEM \"good.xml\">\n]>\n"
+         "<pack><a>&gone;</a><b>x&broken;y</b>&good;</pack>\n",
+         "<?xml version='1.0'?>\n<!DOCTYPE pack [\n<!ENTITY broken SYSTEM \"broken.xml\">\n"
+         "<!ENTITY gone SYSTEM \"gone.xml\">\n<!ENTITY good SYSTEM \"good.xml\">\n]>\n"
+         "<pack>\n <a>&gone;</a>\n <b>x&broken;y</b>\n <good/>\n</pack>\n"},
+    };
+    for (const FlattenCase &row : rows) {
+        SCOPED_TRACE(row.what);
+        for (const auto &[name, bytes] : row.includes)
+            Write(name, bytes);
+        EXPECT_EQ(Flatten(Write(u"device.xml"_s, row.source)), row.expected);
+        ExpectWellFormed();
+    }
 }
 
 TEST_F(FlattenDeviceXmlTest, TextOutsideAsciiSurvivesAsCharacterReferences)
 {
     Write(u"names.xml"_s, "<i><name>\xe6\x97\xa5\xe6\x9c\xac</name></i>");
-    const QString device
-        = Write(u"device.xml"_s,
-                "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n"
-                "<!DOCTYPE pack [<!ENTITY names SYSTEM \"names.xml\">]>\n"
-                "<pack title=\"Caf\xc3\xa9\">&names;<c><![CDATA[\xc3\xa9<\xf0\x9f\x98\x80>]]></c></pack>\n");
-
-    const QByteArray flattened = Flatten(device);
+    const QByteArray flattened = Flatten(
+        Write(u"device.xml"_s,
+              "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<!DOCTYPE pack [<!ENTITY names SYSTEM \"names.xml\">]>\n"
+              "<pack title=\"Caf\xc3\xa9\">&names;<c><![CDATA[\xc3\xa9<\xf0\x9f\x98\x80>]]></c></pack>\n"));
     for (const char byte : flattened)
-        ASSERT_GE(static_cast<unsigned char>(byte), 0) << "not ASCII";
+        ASSERT_LT(static_cast<unsigned char>(byte), 0x80u) << "not ASCII";
     EXPECT_TRUE(flattened.contains("Caf&#xe9;"));
     ExpectWellFormed();
 
@@ -220,8 +152,7 @@ TEST_F(FlattenDeviceXmlTest, PacksInOtherEncodingsAreExpandedToo)
         ASSERT_EQ(testutil::RunProgram(u"iconv"_s, {u"-f"_s, u"UTF-8"_s, u"-t"_s, QString::fromLatin1(encoding), plain},
                                        &converted),
                   0);
-        const QString device = Write(u"device.xml"_s, converted);
-        const QByteArray flattened = Flatten(device);
+        const QByteArray flattened = Flatten(Write(u"device.xml"_s, converted));
         EXPECT_TRUE(flattened.contains("<pack name=\"T&#xe9;l&#xe9;phone\">\n <keys/>\n</pack>"))
             << flattened.toStdString();
     }
@@ -246,7 +177,7 @@ TEST_F(FlattenDeviceXmlTest, FailsWithoutWritingOnBadSourceOrDestinationAndReads
     // A relative source is found from the current directory.
     Write(u"keys.xml"_s, "<i><keys/></i>");
     Write(u"device.xml"_s, "<!DOCTYPE p [<!ENTITY k SYSTEM \"keys.xml\">]><p>&k;</p>");
-    CurrentDirectory cd(temp.path());
+    testutil::CurrentDirectory cd(temp.path());
     ASSERT_TRUE(FlattenDeviceXml(u"pack/device.xml"_s, output));
     EXPECT_TRUE(testutil::ReadFile(output).contains("<p>\n <keys/>\n</p>"));
 }

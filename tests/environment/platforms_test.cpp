@@ -28,7 +28,7 @@ protected:
     void MakeDirs(const QString &parent, const QStringList &names)
     {
         for (const QString &name : names)
-            ASSERT_TRUE(QDir().mkpath(parent + QLatin1Char('/') + name));
+            ASSERT_TRUE(QDir().mkpath(parent + u'/' + name));
     }
 
     QTemporaryDir temp;
@@ -76,7 +76,7 @@ TEST_F(PlatformsTest, ListsSubDirectoriesByNameStrippingTheProWord)
     for (int i = 0; i < 7; ++i) {
         SCOPED_TRACE(expected[i].entry);
         EXPECT_EQ(platforms[i].name, QString::fromUtf8(expected[i].name));
-        EXPECT_EQ(platforms[i].path, root + QLatin1Char('/') + QString::fromUtf8(expected[i].entry));
+        EXPECT_EQ(platforms[i].path, root + u'/' + QString::fromUtf8(expected[i].entry));
         EXPECT_EQ(platforms[i].isPro, expected[i].pro);
         EXPECT_FALSE(platforms[i].isDefault);
     }
@@ -94,7 +94,7 @@ TEST_F(PlatformsTest, DefaultPlatformIsMatchedIgnoringCase)
     EXPECT_FALSE(platforms[1].isDefault);
 
     // A root written with a trailing separator still finds its default.
-    env.Set("KESTIX_PLATFORMS_ALL", root + QLatin1Char('/'));
+    env.Set("KESTIX_PLATFORMS_ALL", root + u'/');
     env.Set("KESTIX_PLATFORM", root + u"/Foo Pro/bin"_s);
     ASSERT_EQ(GetPlatforms(platforms), 2u);
     EXPECT_EQ(platforms[1].path, root + u"//Foo Pro"_s);
@@ -158,7 +158,7 @@ TEST_F(PlatformsTest, TestKitsDefaultToTestsBesidePlatformsRoot)
 {
     MakeDirs(root, {"abc"});
     MakeDirs(kits, {"kitB", "kitA"});
-    env.Set("KESTIX_PLATFORMS_ALL", root + QLatin1Char('/'));
+    env.Set("KESTIX_PLATFORMS_ALL", root + u'/');
 
     EXPECT_EQ(GetTestSetsRoot(), kits);
     QList<TestKit> found{TestKit()};
@@ -211,7 +211,7 @@ TEST_F(PlatformsTest, TestSetEndingInSeparatorPicksTheGreatestName)
     // Ordinal comparison: lower-case names sort after upper-case ones.
     MakeDirs(kits, {"alpha", "Zeta", "beta"});
     env.Set("KESTIX_TESTSETS_ALL", kits);
-    env.Set("KESTIX_TESTSET", kits + QLatin1Char('/'));
+    env.Set("KESTIX_TESTSET", kits + u'/');
     EXPECT_EQ(GetDefaultTestKitName(), QString());
 
     TestKit kit;

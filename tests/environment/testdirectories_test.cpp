@@ -1,7 +1,5 @@
 #include "environment/testdirectories.h"
 
-#include "currentdirectory.h"
-
 #include "support/testutil.h"
 
 #include <QDir>
@@ -22,7 +20,7 @@ protected:
     {
         ASSERT_TRUE(temp.isValid());
         base = temp.path() + u"/data"_s;
-        env.Set("KESTIX_DATA_ROOT", base + QLatin1Char('/'));
+        env.Set("KESTIX_DATA_ROOT", base + u'/');
         env.Unset("KESTIX_TESTSET");
         env.Unset("KESTIX_PLATFORMS_ALL");
         env.Unset("KESTIX_PLATFORM");
@@ -87,7 +85,7 @@ TEST_P(TargetNameTest, BecomesOneFolderBelowTargets)
 {
     const QString targets = base + u"/Norvane/Targets"_s;
     const QString directory = TestDirectories::GetTargetDirectory(QString::fromUtf8(GetParam().target));
-    EXPECT_EQ(directory, targets + QLatin1Char('/') + QString::fromLatin1(GetParam().folder));
+    EXPECT_EQ(directory, targets + u'/' + QString::fromLatin1(GetParam().folder));
     EXPECT_EQ(QFileInfo(directory).path(), targets);
     EXPECT_TRUE(QFileInfo(directory).isDir());
 }
@@ -142,7 +140,7 @@ TEST_F(TestDirectoriesTest, GenerateProPlatformMatchesNameThenDefault)
 {
     const QString root = temp.path() + u"/platforms"_s;
     for (const char *name : {"Alpha Pro", "beta pro", "Gamma"})
-        ASSERT_TRUE(QDir().mkpath(root + QLatin1Char('/') + QString::fromUtf8(name)));
+        ASSERT_TRUE(QDir().mkpath(root + u'/' + QString::fromUtf8(name)));
     env.Set("KESTIX_PLATFORMS_ALL", root);
 
     Platform found = TestDirectories::GenerateProPlatform(u"BETA"_s);
@@ -175,7 +173,7 @@ TEST_F(TestDirectoriesTest, ResolveXmlPathSearchOrder)
     testutil::WriteFile(pack + u"/flat.xml"_s, "<a/>");
     ASSERT_TRUE(QDir().mkpath(work + u"/folder"_s));
     env.Set("HOME", home);
-    CurrentDirectory cd(work);
+    testutil::CurrentDirectory cd(work);
     const QString reference = pack + u"/device.xml"_s;
 
     EXPECT_EQ(ResolveXmlPath(u"/no/such/file.xml"_s, reference), u"/no/such/file.xml"_s);
@@ -199,7 +197,7 @@ protected:
         TestDirectoriesTest::SetUp();
         bin = temp.path() + u"/bin"_s;
         for (const char *program : {"perl", "python3", "sh"})
-            MakeExecutable(bin + QLatin1Char('/') + QString::fromLatin1(program));
+            MakeExecutable(bin + u'/' + QString::fromLatin1(program));
         env.Set("PATH", bin);
     }
 

@@ -19,7 +19,7 @@ QStringList Names(const QList<ConnectTarget> &targets)
 {
     QStringList names;
     for (const ConnectTarget &target : targets)
-        names.append(target.name + QLatin1Char('|') + target.description);
+        names.append(target.name + u'|' + target.description);
     return names;
 }
 

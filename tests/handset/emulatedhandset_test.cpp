@@ -37,7 +37,7 @@ protected:
     }
 
     QString Host(const char *handsetPath) const { return fixture.HostPath(u"phone"_s, QString::fromUtf8(handsetPath)); }
-    QString Work(const char *name) const { return fixture.WorkFolder() + QLatin1Char('/') + QString::fromUtf8(name); }
+    QString Work(const char *name) const { return fixture.WorkFolder() + u'/' + QString::fromUtf8(name); }
 
     HandsetFixture fixture;
     QString folder;
@@ -97,7 +97,7 @@ struct FailureCase
 {
     const char *what;
     unsigned int error;
-    std::function<unsigned int(IKestoDevice &, const QString &work)> call;
+    std::function<unsigned int(IKestoDevice &, const QString &)> call;
 };
 
 class EmulatedHandsetFailure : public EmulatedHandsetTest, public ::testing::WithParamInterface<FailureCase>
@@ -122,117 +122,61 @@ unsigned int List(IKestoDevice &d, const QString &path)
     return info && !info->HasFiles() ? result : 99u;
 }
 
+// The error of a module search, or 99 when a failed search left the folder set.
+unsigned int Find(IKestoDevice &d, unsigned int classId)
+{
+    QString directory = u"stale"_s;
+    const unsigned int result = d.FindModule(classId, directory);
+    return directory.isEmpty() ? result : 99u;
+}
+
 // The error a false result left, or 99 for a true one.
 unsigned int ErrorOf(IKestoDevice &d, bool result)
 {
     return result ? 99u : d.lastError;
 }
 
+using D = IKestoDevice &;
+using Work = const QString &;
+FailureCase Case(const char *what, unsigned int error, std::function<unsigned int(D, Work)> call)
+{
+    return {what, error, std::move(call)};
+}
+
 const QString kOut = u"fs:/../../../work/outside/keep.txt"_s;
 constexpr unsigned int kNotFound = HANDSET_ERROR_NOT_FOUND;
 constexpr unsigned int kBadPath = HANDSET_ERROR_BAD_PATH;
-using Work = const QString &;
 
 const FailureCase kFailures[] = {
-    {"ListMissing", kNotFound,
-     [](IKestoDevice &d, Work) {
-         return List(d, u"fs:/none"_s);
-     }},
-    {"ListAFile", kNotFound,
-     [](IKestoDevice &d, Work) {
-         return List(d, u"fs:/file"_s);
-     }},
-    {"ListOutside", kBadPath,
-     [](IKestoDevice &d, Work) {
-         return List(d, u"fs:/../../../work/outside"_s);
-     }},
-    {"ListNoPrefix", kBadPath,
-     [](IKestoDevice &d, Work work) {
-         return List(d, work);
-     }},
-    {"ListUnknownClass", kNotFound,
-     [](IKestoDevice &d, Work) {
-         return List(d, u"fs:/~0x01010001"_s);
-     }},
-    {"DeleteMissing", kNotFound,
-     [](IKestoDevice &d, Work) {
-         return d.DeleteFile(u"fs:/none"_s);
-     }},
-    {"DeleteOutside", kBadPath,
-     [](IKestoDevice &d, Work) {
-         return d.DeleteFile(kOut);
-     }},
-    {"RemoveMissing", kNotFound,
-     [](IKestoDevice &d, Work) {
-         return d.RemoveDirectory(u"fs:/none"_s);
-     }},
-    {"RemoveParent", kBadPath,
-     [](IKestoDevice &d, Work) {
-         return d.RemoveDirectory(u"fs:/.."_s);
-     }},
-    {"CopyFromMissingHostFile", kNotFound,
-     [](IKestoDevice &d, Work work) {
-         return d.CopyFileToDevice(work + u"/none"_s, u"fs:/x"_s);
-     }},
-    {"CopyToOutside", kBadPath,
-     [](IKestoDevice &d, Work work) {
-         return d.CopyFileToDevice(work + u"/outside/keep.txt"_s, kOut);
-     }},
-    {"CopyMissingFromDevice", kNotFound,
-     [](IKestoDevice &d, Work work) {
-         return d.CopyFileFromDevice(u"fs:/none"_s, work + u"/x"_s);
-     }},
-    {"CopyFromOutsideOfDevice", kBadPath,
-     [](IKestoDevice &d, Work work) {
-         return d.CopyFileFromDevice(u"fs:/../handset.ini"_s, work + u"/x"_s);
-     }},
-    {"ExistsOutside", kBadPath,
-     [](IKestoDevice &d, Work) {
-         return ErrorOf(d, d.FileExists(u"fs:/../handset.ini"_s));
-     }},
-    {"ExistsMissing", kNotFound,
-     [](IKestoDevice &d, Work) {
-         return ErrorOf(d, d.FileExists(u"fs:/none"_s));
-     }},
-    {"CopyOnDeviceMissing", kNotFound,
-     [](IKestoDevice &d, Work) {
-         return ErrorOf(d, d.CopyOnDevice(u"fs:/none"_s, u"fs:/y"_s));
-     }},
-    {"CopyOnDeviceToOutside", kBadPath,
-     [](IKestoDevice &d, Work) {
-         return ErrorOf(d, d.CopyOnDevice(u"fs:/file"_s, kOut));
-     }},
-    {"FindModuleNone", kNotFound,
-     [](IKestoDevice &d, Work) {
-         QString directory = u"stale"_s;
-         const unsigned int result = d.FindModule(0x01010001, directory);
-         return directory.isEmpty() ? result : 99u;
-     }},
-    {"FindModuleZero", kNotFound,
-     [](IKestoDevice &d, Work) {
-         QString directory;
-         return d.FindModule(0, directory);
-     }},
-    {"DeleteDirectoryUnknownClass", kNotFound,
-     [](IKestoDevice &d, Work) {
-         return d.DeleteDirectory(0x01010001);
-     }},
-    {"StartUnknownProgram", kNotFound,
-     [](IKestoDevice &d, Work) {
-         return d.StartProgram(u"nothing"_s, QString());
-     }},
-    {"StartUnknownApplet", kNotFound,
-     [](IKestoDevice &d, Work) {
-         return d.StartApplet(0x1234, QString());
-     }},
-    {"InstallMissingPackage", kNotFound,
-     [](IKestoDevice &d, Work work) {
-         return d.InstallPackage(work + u"/none.kestix"_s);
-     }},
-    {"InstallNotATar", HANDSET_ERROR_BAD_PACKAGE,
-     [](IKestoDevice &d, Work work) {
-         return d.InstallPackage(work + u"/outside/keep.txt"_s);
-     }},
+    Case("ListMissing", kNotFound, [](D d, Work) { return List(d, u"fs:/none"_s); }),
+    Case("ListAFile", kNotFound, [](D d, Work) { return List(d, u"fs:/file"_s); }),
+    Case("ListOutside", kBadPath, [](D d, Work) { return List(d, u"fs:/../../../work/outside"_s); }),
+    Case("ListNoPrefix", kBadPath, [](D d, Work work) { return List(d, work); }),
+    Case("ListUnknownClass", kNotFound, [](D d, Work) { return List(d, u"fs:/~0x01010001"_s); }),
+    Case("DeleteMissing", kNotFound, [](D d, Work) { return d.DeleteFile(u"fs:/none"_s); }),
+    Case("DeleteOutside", kBadPath, [](D d, Work) { return d.DeleteFile(kOut); }),
+    Case("RemoveMissing", kNotFound, [](D d, Work) { return d.RemoveDirectory(u"fs:/none"_s); }),
+    Case("RemoveParent", kBadPath, [](D d, Work) { return d.RemoveDirectory(u"fs:/.."_s); }),
+    Case("CopyFromMissingHostFile", kNotFound,
+         [](D d, Work w) { return d.CopyFileToDevice(w + u"/none"_s, u"fs:/x"_s); }),
+    Case("CopyToOutside", kBadPath, [](D d, Work w) { return d.CopyFileToDevice(w + u"/outside/keep.txt"_s, kOut); }),
+    Case("CopyMissingFromDevice", kNotFound,
+         [](D d, Work w) { return d.CopyFileFromDevice(u"fs:/none"_s, w + u"/x"_s); }),
+    Case("CopyFromOutsideOfDevice", kBadPath,
+         [](D d, Work w) { return d.CopyFileFromDevice(u"fs:/../handset.ini"_s, w + u"/x"_s); }),
+    Case("ExistsOutside", kBadPath, [](D d, Work) { return ErrorOf(d, d.FileExists(u"fs:/../handset.ini"_s)); }),
+    Case("ExistsMissing", kNotFound, [](D d, Work) { return ErrorOf(d, d.FileExists(u"fs:/none"_s)); }),
+    Case("CopyOnDeviceMissing", kNotFound,
+         [](D d, Work) { return ErrorOf(d, d.CopyOnDevice(u"fs:/none"_s, u"fs:/y"_s)); }),
+    Case("CopyOnDeviceToOutside", kBadPath, [](D d, Work) { return ErrorOf(d, d.CopyOnDevice(u"fs:/file"_s, kOut)); }),
+    Case("FindModuleNone", kNotFound, [](D d, Work) { return Find(d, 0x01010001); }),
+    Case("FindModuleZero", kNotFound, [](D d, Work) { return Find(d, 0); }),
+    Case("DeleteDirectoryUnknownClass", kNotFound, [](D d, Work) { return d.DeleteDirectory(0x01010001); }),
+    Case("StartUnknownProgram", kNotFound, [](D d, Work) { return d.StartProgram(u"nothing"_s, QString()); }),
+    Case("StartUnknownApplet", kNotFound, [](D d, Work) { return d.StartApplet(0x1234, QString()); }),
+    Case("InstallMissingPackage", kNotFound, [](D d, Work w) { return d.InstallPackage(w + u"/none.kestix"_s); }),
+    Case("InstallNotATar", HANDSET_ERROR_BAD_PACKAGE,
+         [](D d, Work w) { return d.InstallPackage(w + u"/outside/keep.txt"_s); }),
 };
 
 INSTANTIATE_TEST_SUITE_P(Operations, EmulatedHandsetFailure, ::testing::ValuesIn(kFailures),

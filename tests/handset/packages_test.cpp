@@ -98,7 +98,7 @@ TEST_F(PackageTest, PackageMadeByTheTarProgramInstalls)
         GTEST_SKIP() << "tar is not installed";
     const QString source = fixture.WorkFolder() + u"/src"_s;
     for (const auto &member : testutil::ModuleMembers(layout))
-        testutil::WriteFile(source + QLatin1Char('/') + member.first, member.second);
+        testutil::WriteFile(source + u'/' + member.first, member.second);
     // Two links to one file: GNU tar stores the second as a hard link.
     ASSERT_EQ(::link(QFile::encodeName(source + u"/ctfmod/data/table.txt"_s).constData(),
                      QFile::encodeName(source + u"/ctfmod/data/same.txt"_s).constData()),
@@ -202,7 +202,7 @@ TEST_F(PackageTest, DamagedPackageIsRefusedWithItsReasonAndInstallsNothing)
         {"text.kestix", QByteArray("m/a.txt\n").repeated(100), "does not look like a tar archive"},
     };
     for (const auto &c : damaged) {
-        const QString path = fixture.WorkFolder() + QLatin1Char('/') + QLatin1String(c.name);
+        const QString path = fixture.WorkFolder() + u'/' + QLatin1String(c.name);
         testutil::WriteFile(path, c.bytes);
         EXPECT_EQ(device->InstallPackage(path), HANDSET_ERROR_BAD_PACKAGE) << c.name;
         EXPECT_TRUE(Tree(Fs()).isEmpty()) << c.name;
