@@ -70,39 +70,27 @@ TEST_F(ManifestCacheTest, CacheLivesInTheFolderNamedByTheCleanedKitPath)
     EXPECT_NE(other.cacheFile, manifest.cacheFile);
 }
 
-struct VersionCase
-{
-    const char *text;
-    bool current;
-};
-
-class ManifestVersionTest : public ManifestCacheTest, public ::testing::WithParamInterface<VersionCase>
-{
-};
-
-TEST_P(ManifestVersionTest, OnlyAFormatOfFiveOrLaterIsCurrent)
+TEST_F(ManifestCacheTest, OnlyAFormatOfFiveOrLaterIsCurrent)
 {
     Manifest manifest(kit->Root(), false);
-    WriteCache(manifest, GetParam().text);
-    EXPECT_EQ(manifest.IsVersionOkay(), GetParam().current) << GetParam().text;
-}
-
-INSTANTIATE_TEST_SUITE_P(Caches, ManifestVersionTest,
-                         ::testing::Values(VersionCase{"<testkit version='5'/>", true},
-                                           VersionCase{"<TestKit version='7' path='/elsewhere'/>", true},
-                                           VersionCase{"<testkit version='4'/>", false},
-                                           VersionCase{"<testkit/>", false},
-                                           VersionCase{"<testkit version='five'/>", false},
-                                           VersionCase{"<testkit version='-7'/>", false},
-                                           VersionCase{"<testkit version='99999999999'/>", false},
-                                           VersionCase{"<manifest version='5'/>", false},
-                                           VersionCase{"<testkit version='5'>", false}, VersionCase{"", false}));
-
-TEST_F(ManifestCacheTest, MissingCacheIsNotCurrentAndCannotBeRead)
-{
-    Manifest manifest(kit->Root(), false);
-    EXPECT_FALSE(manifest.IsVersionOkay());
+    EXPECT_FALSE(manifest.IsVersionOkay()) << "no cache";
     EXPECT_FALSE(manifest.ReadManifest());
+    const std::pair<const char *, bool> rows[] = {
+        {"<testkit version='5'/>", true},
+        {"<TestKit version='7' path='/elsewhere'/>", true},
+        {"<testkit version='4'/>", false},
+        {"<testkit/>", false},
+        {"<testkit version='five'/>", false},
+        {"<testkit version='-7'/>", false},
+        {"<testkit version='99999999999'/>", false},
+        {"<manifest version='5'/>", false},
+        {"<testkit version='5'>", false},
+        {"", false},
+    };
+    for (const auto &[text, current] : rows) {
+        WriteCache(manifest, text);
+        EXPECT_EQ(manifest.IsVersionOkay(), current) << text;
+    }
 }
 
 TEST_F(ManifestCacheTest, StaleOrBrokenCacheIsReplacedByAScan)
@@ -176,24 +164,15 @@ TEST_F(ManifestCacheTest, WrittenCatalogueReadsBackTheSame)
     ASSERT_TRUE(read.IsVersionOkay());
     ASSERT_TRUE(read.ReadManifest());
 
-    // Keys of read modules are lower-cased, so compare by name.
+    // What the scan found is really there; the kinds and hashes come back as
+    // the byte comparison below shows.
     ASSERT_EQ(read.testModules.size(), scanned.testModules.size());
-    for (const auto &original : std::as_const(scanned.testModules)) {
-        const auto copy = read.FindTestModule(original->moduleName);
-        ASSERT_TRUE(copy) << original->moduleName.toStdString();
-        EXPECT_EQ(copy->TestType(), original->TestType());
-        EXPECT_EQ(copy->IDHash(), original->IDHash());
-    }
-
-    // What the scan found is really there.
     const auto timer = read.FindTestModule(u"TIMER"_s).dynamicCast<CtfTestModule>();
     ASSERT_TRUE(timer);
     EXPECT_EQ(timer->classids, (QVector<unsigned int>{0x01020304, 0x01020305}));
-    ASSERT_EQ(timer->programs.size(), 2);
     EXPECT_EQ(timer->ModuleName(), u"Timer_k"_s);
     const auto contacts = read.FindTestModule(u"contacts"_s).dynamicCast<OatTestModule>();
     ASSERT_TRUE(contacts);
-    ASSERT_EQ(contacts->programs.size(), 1);
     EXPECT_EQ(contacts->ModuleName(), u"Contacts"_s);
     EXPECT_EQ(read.FindTestModule(u"browser"_s)->applets.size(), 2);
     EXPECT_EQ(read.FindTestModule(u"contacts"_s)->baseLineFile, kit->Path(u"tests/pim/contacts/Contacts.baseline"_s));
@@ -203,10 +182,7 @@ TEST_F(ManifestCacheTest, WrittenCatalogueReadsBackTheSame)
     QList<QSharedPointer<_Framework>> frameworks;
     ASSERT_EQ(read.GetFrameworks(frameworks), 2u);
     EXPECT_EQ(frameworks[0]->name, u"ctf"_s);
-    EXPECT_EQ(frameworks[1]->name, u"oat"_s);
     EXPECT_TRUE(frameworks[1].dynamicCast<_OatFramework>());
-    EXPECT_EQ(frameworks[1]->classId, 0x0107556Bu);
-    EXPECT_EQ(frameworks[1]->variants.keys(), QStringList{"oat_RVCT22arm9_Release"});
 
     // Everything, including the kinds' own elements, survives: the read
     // catalogue writes the same bytes, except for the empty "data" marks of
@@ -219,7 +195,9 @@ TEST_F(ManifestCacheTest, WrittenCatalogueReadsBackTheSame)
     EXPECT_EQ(testutil::ReadFile(again), expected);
 }
 
-TEST_F(ManifestCacheTest, WrittenCacheIsWellFormedXmlOfTheDocumentedLayout)
+// The tool scans in a process of its own, with its own hash seed: the
+// catalogue it writes must hold the same bytes.
+TEST_F(ManifestCacheTest, WrittenCacheIsWellFormedXmlAndTheSameInAnotherProcess)
 {
     BuildRichKit();
     Manifest manifest = ScanKit();
@@ -235,21 +213,10 @@ TEST_F(ManifestCacheTest, WrittenCacheIsWellFormedXmlOfTheDocumentedLayout)
     EXPECT_EQ(root.firstChildElement().tagName(), u"testmodules"_s);
     EXPECT_EQ(root.lastChildElement().tagName(), u"frameworks"_s);
     EXPECT_EQ(root.firstChildElement().childNodes().size(), 6);
-    if (testutil::HaveProgram(u"xmllint"_s)) {
-        QByteArray output;
+    QByteArray output;
+    if (testutil::HaveProgram(u"xmllint"_s))
         EXPECT_EQ(testutil::RunProgram(u"xmllint"_s, {u"--noout"_s, manifest.cacheFile}, &output), 0)
             << output.toStdString();
-    }
-}
-
-// The tool scans in a process of its own, with its own hash seed: the
-// catalogue it writes must hold the same bytes.
-TEST_F(ManifestCacheTest, SameCatalogueGivesTheSameBytesInAnotherProcess)
-{
-    BuildRichKit();
-    Manifest manifest = ScanKit();
-
-    QByteArray output;
     ASSERT_EQ(testutil::RunProgram(u"" HARNESS_BINARY_DIR "/harness"_s,
                                    {u"manifest"_s, u"--kit"_s, kit->Root(), u"-o"_s, TempPath(u"tool"_s)}, &output),
               0)
@@ -338,6 +305,9 @@ TEST_F(ManifestQueryTest, NamePatternsUseLeadingAndTrailingWildCards)
     EXPECT_EQ(Select({u"*net"_s, u"net*"_s, u"audio"_s}, u"none"_s),
               (QStringList{"Audio", "EtherNet", "Net", "NetWork"}));
     EXPECT_EQ(Select({u"*"_s}).size(), 5);
+    // The selection appends to what the list holds.
+    QList<QSharedPointer<_TestModule>> out{manifest->FindTestModule(u"audio"_s)};
+    EXPECT_EQ(manifest->GetTestModules(out, {u"net"_s}, QString(), QString()), 2u);
 }
 
 TEST_F(ManifestQueryTest, FamiliesAreMatchedByContainmentIgnoringCase)
@@ -347,12 +317,6 @@ TEST_F(ManifestQueryTest, FamiliesAreMatchedByContainmentIgnoringCase)
     EXPECT_EQ(Select({}), (QStringList{"Audio", "EtherNet", "Net", "NetWork", "SubNetTool"}));
     // A sub-family alone filters nothing.
     EXPECT_EQ(Select({}, QString(), u"Wired"_s).size(), 5);
-}
-
-TEST_F(ManifestQueryTest, SelectionAppendsToWhatTheListHolds)
-{
-    QList<QSharedPointer<_TestModule>> out{manifest->FindTestModule(u"audio"_s)};
-    EXPECT_EQ(manifest->GetTestModules(out, {u"net"_s}, QString(), QString()), 2u);
 }
 
 TEST_F(ManifestQueryTest, FindIgnoresCaseAndFindsSecondaryModules)

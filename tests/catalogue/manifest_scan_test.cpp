@@ -21,9 +21,7 @@ namespace {
 
 using kitbuilder::Module;
 
-class ManifestScanTest : public ManifestFixture
-{
-};
+using ManifestScanTest = ManifestFixture;
 
 TEST_F(ManifestScanTest, FrameworkPackagesInRunFolderGiveFrameworksWithVariantsAndClassIds)
 {
@@ -67,7 +65,7 @@ TEST_F(ManifestScanTest, KindFoldersOfTestframeworksGivePlainFrameworksWithoutVa
 {
     kit->AddSourceModule(u"tests/a"_s, MakeModule(u"ctf"_s, u"A"_s));
     for (const char *folder : {"oat", "CTF", "ctfapplet", "tools", "uitf2"})
-        kit->AddDirectory(u"TestFrameworks/"_s + QLatin1String(folder));
+        kit->AddDirectory(u"TestFrameworks/"_s + QString::fromLatin1(folder));
     // A description inside a kit's testframeworks folder is not a module.
     kit->AddSourceModule(u"TestFrameworks/oat/selftest"_s, MakeModule(u"oat"_s, u"Hidden"_s));
 
@@ -111,7 +109,7 @@ TEST_F(ManifestScanTest, FamiliesComeFromTheDescriptionOrElseFromThePath)
     Manifest manifest = ScanKit();
 
     const auto family = [&](const char *name) {
-        const auto module = manifest.FindTestModule(QLatin1String(name));
+        const auto module = manifest.FindTestModule(QString::fromLatin1(name));
         return module ? module->family + u'/' + module->subFamily : u"missing"_s;
     };
     EXPECT_EQ(family("audio"), u"multimedia/audio"_s);
@@ -181,41 +179,38 @@ TEST_F(ManifestScanTest, SourceModulesGetTargetsAndPrebuiltOnesDoNot)
 }
 
 // The last entry in name order that says "source" or "prebuilt" decides.
-struct KindCase
+TEST_F(ManifestScanTest, LastClassifyingEntryDecidesBetweenSourceAndPrebuilt)
 {
-    const char *entry;
-    bool isDirectory;
-    bool expectSource;
-};
-
-class ManifestKindTest : public ManifestFixture, public ::testing::WithParamInterface<KindCase>
-{
-};
-
-TEST_P(ManifestKindTest, LastClassifyingEntryDecides)
-{
-    const KindCase &kind = GetParam();
-    Module module = MakeModule(u"ctf"_s, u"Mixed"_s);
-    kit->AddDescription(u"tests/m/mixed"_s, module);
-    kit->AddModulePackages(u"tests/m/mixed/package"_s, module);
-    if (kind.isDirectory)
-        kit->AddDirectory(u"tests/m/mixed/"_s + QLatin1String(kind.entry));
-    else
-        kit->AddFile(u"tests/m/mixed/"_s + QLatin1String(kind.entry), "x");
-    kit->AddFile(u"tests/m/mixed/m.MOD"_s, "x");
-
+    const struct
+    {
+        const char *entry;
+        bool isDirectory;
+        bool source;
+    } rows[] = {
+        {"src", true, true}, // "src" after "m.MOD"
+        {"a.c", false, false}, // before it
+        {"Include", true, false}, // "include" < "m.mod"
+        {"z_inc", true, true},
+    };
+    for (int i = 0; i < 4; ++i) {
+        const QString folder = u"tests/m/mixed%1"_s.arg(i);
+        const Module module = MakeModule(u"ctf"_s, u"Mixed%1"_s.arg(i));
+        kit->AddDescription(folder, module);
+        kit->AddModulePackages(folder + u"/package"_s, module);
+        if (rows[i].isDirectory)
+            kit->AddDirectory(folder + u'/' + QString::fromLatin1(rows[i].entry));
+        else
+            kit->AddFile(folder + u'/' + QString::fromLatin1(rows[i].entry), "x");
+        kit->AddFile(folder + u"/m.MOD"_s, "x");
+    }
     Manifest manifest = ScanKit();
-    const auto found = manifest.FindTestModule(u"mixed"_s);
-    ASSERT_TRUE(found);
-    EXPECT_EQ(!found->targets.isEmpty(), kind.expectSource);
-    EXPECT_EQ(!found->sourcePath.isEmpty(), true) << "a source entry was seen in every case";
+    for (int i = 0; i < 4; ++i) {
+        const auto found = manifest.FindTestModule(u"mixed%1"_s.arg(i));
+        ASSERT_TRUE(found) << rows[i].entry;
+        EXPECT_EQ(!found->targets.isEmpty(), rows[i].source) << rows[i].entry;
+        EXPECT_FALSE(found->sourcePath.isEmpty()) << "a source entry was seen in every case";
+    }
 }
-
-INSTANTIATE_TEST_SUITE_P(Entries, ManifestKindTest,
-                         ::testing::Values(KindCase{"src", true, true}, // "src" after "m.MOD"
-                                           KindCase{"a.c", false, false}, // before it
-                                           KindCase{"Include", true, false}, // "include" < "m.mod"
-                                           KindCase{"z_inc", true, true}));
 
 TEST_F(ManifestScanTest, OatModulesFindTheirBaseLineFile)
 {
@@ -348,32 +343,19 @@ TEST_F(ManifestScanTest, CurrentCacheIsReadInsteadOfScanning)
     EXPECT_EQ(rescanned.testModules.keys(), (QStringList{"first", "second"}));
 }
 
-struct LogCase
+TEST(ManifestLogKind, ModuleKindFollowsTheLogName)
 {
-    const char *path;
-    const char *type; // empty: no module
-};
-
-class ManifestLogKindTest : public ::testing::TestWithParam<LogCase>
-{
-};
-
-TEST_P(ManifestLogKindTest, ModuleKindFollowsTheLogName)
-{
-    const auto module = Manifest::CreateTestModuleFromLog(QLatin1String(GetParam().path));
-    if (*GetParam().type == '\0') {
-        EXPECT_FALSE(module);
-        return;
+    const std::pair<const char *, const char *> rows[] = {
+        {"Run-CTF-1.LOG", "ctf"}, {"/logs/Timer-ctf-2026.log", "ctf"},
+        {"run.log", "ctfapplet"}, {"result.TXT", "uitf"},
+        {"/a/b.xml", "uitf"},     {"module.oat", "oat"},
+        {"x.bin", nullptr},       {"noextension", nullptr},
+    };
+    for (const auto &[path, type] : rows) {
+        const auto module = Manifest::CreateTestModuleFromLog(QString::fromLatin1(path));
+        EXPECT_EQ(module ? module->TestType() : QString(), QString::fromLatin1(type)) << path;
+        EXPECT_TRUE(!module || module->moduleName.isEmpty());
     }
-    ASSERT_TRUE(module);
-    EXPECT_EQ(module->TestType(), QLatin1String(GetParam().type));
-    EXPECT_TRUE(module->moduleName.isEmpty());
 }
-
-INSTANTIATE_TEST_SUITE_P(Names, ManifestLogKindTest,
-                         ::testing::Values(LogCase{"Run-CTF-1.LOG", "ctf"}, LogCase{"/logs/Timer-ctf-2026.log", "ctf"},
-                                           LogCase{"run.log", "ctfapplet"}, LogCase{"result.TXT", "uitf"},
-                                           LogCase{"/a/b.xml", "uitf"}, LogCase{"module.oat", "oat"},
-                                           LogCase{"x.bin", ""}, LogCase{"noextension", ""}));
 
 } // namespace
