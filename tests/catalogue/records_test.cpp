@@ -23,13 +23,17 @@ QDomElement Parse(QDomDocument &document, const QString &xml)
     return document.documentElement();
 }
 
-QSharedPointer<_CompilerVariant> Variant(const QString &name, IKestoDevice::Platform arch,
-                                         const QString &package = QString())
+// An element of that tag as the document's root.
+QDomElement RootElement(QDomDocument &document, const QString &tag)
+{
+    return document.appendChild(document.createElement(tag)).toElement();
+}
+
+QSharedPointer<_CompilerVariant> Variant(const QString &name, IKestoDevice::Platform arch = IKestoDevice::PLATFORM_ARM)
 {
     QSharedPointer<_CompilerVariant> variant(new _CompilerVariant);
     variant->name = name;
     variant->arch = arch;
-    variant->packagePath = package;
     return variant;
 }
 
@@ -68,8 +72,7 @@ TEST(CompilerVariant, WritesEveryAttributeAndReadsBackTheSame)
     variant.arch = IKestoDevice::PLATFORM_ARM;
     variant.files << u"/x/1"_s << u"/x/2"_s;
     QDomDocument document;
-    QDomElement element = document.createElement(u"target"_s);
-    document.appendChild(element);
+    QDomElement element = RootElement(document, u"target"_s);
     variant.WriteToXML(element);
     EXPECT_EQ(XmlWriter::ToString(document, 0),
               u"<target arch=\"arm\" binpath=\"\" build=\"\" name=\"m_RVCT22arm9_Release\" "
@@ -84,15 +87,11 @@ TEST(CompilerVariant, WritesEveryAttributeAndReadsBackTheSame)
 
 TEST(CompilerVariant, ToListSortsByName)
 {
-    QMap<QString, QSharedPointer<_CompilerVariant>> map;
-    map.insert(u"1"_s, Variant(u"c"_s, IKestoDevice::PLATFORM_ARM));
-    map.insert(u"2"_s, Variant(u"a"_s, IKestoDevice::PLATFORM_ARM));
-    map.insert(u"3"_s, Variant(u"B"_s, IKestoDevice::PLATFORM_ARM));
-    QList<QSharedPointer<_CompilerVariant>> out{Variant(u"old"_s, IKestoDevice::PLATFORM_ARM)};
+    const QMap<QString, QSharedPointer<_CompilerVariant>> map{
+        {u"1"_s, Variant(u"c"_s)}, {u"2"_s, Variant(u"a"_s)}, {u"3"_s, Variant(u"B"_s)}};
+    QList<QSharedPointer<_CompilerVariant>> out{Variant(u"old"_s)};
     ASSERT_EQ(ToList(map, out), 3u);
-    EXPECT_EQ(out[0]->name, u"B"_s);
-    EXPECT_EQ(out[1]->name, u"a"_s);
-    EXPECT_EQ(out[2]->name, u"c"_s);
+    EXPECT_EQ((QStringList{out[0]->name, out[1]->name, out[2]->name}), (QStringList{"B", "a", "c"}));
 }
 
 TEST(TestCaseRecord, ReadsMissingAttributesAsEmpty)
@@ -127,16 +126,13 @@ TEST(Framework, WritesClassIdInDecimalAndPaddedHex)
     _Framework framework;
     framework.name = u"oat"_s;
     framework.classId = 16;
-    framework.variants.insert(u"z"_s, Variant(u"z"_s, IKestoDevice::PLATFORM_ARM));
+    framework.variants.insert(u"z"_s, Variant(u"z"_s));
     framework.variants.insert(u"a"_s, Variant(u"a"_s, IKestoDevice::PLATFORM_WIN32));
     QDomDocument document;
-    QDomElement element = document.createElement(u"framework"_s);
-    document.appendChild(element);
+    QDomElement element = RootElement(document, u"framework"_s);
     framework.WriteToManifest(element);
-    const QDomElement id = element.lastChildElement();
-    EXPECT_EQ(id.tagName(), u"classid"_s);
-    EXPECT_EQ(id.attribute(u"value"_s), u"16"_s);
-    EXPECT_EQ(id.attribute(u"valuehex"_s), u"0x00000010"_s);
+    const QDomElement id = element.lastChildElement(u"classid"_s);
+    EXPECT_EQ(id.attribute(u"value"_s) + u' ' + id.attribute(u"valuehex"_s), u"16 0x00000010"_s);
     EXPECT_EQ(element.firstChildElement().attribute(u"name"_s), u"a"_s);
 
     _Framework back;
@@ -148,8 +144,8 @@ TEST(Framework, WritesClassIdInDecimalAndPaddedHex)
 TEST(Framework, GetVariantTakesTheFirstByNameForThePlatform)
 {
     _Framework framework;
-    framework.variants.insert(u"b"_s, Variant(u"b"_s, IKestoDevice::PLATFORM_ARM));
-    framework.variants.insert(u"a"_s, Variant(u"a"_s, IKestoDevice::PLATFORM_ARM));
+    framework.variants.insert(u"b"_s, Variant(u"b"_s));
+    framework.variants.insert(u"a"_s, Variant(u"a"_s));
     framework.variants.insert(u"0"_s, Variant(u"0"_s, IKestoDevice::PLATFORM_WIN32));
     EXPECT_EQ(framework.GetVariant(IKestoDevice::PLATFORM_ARM)->name, u"a"_s);
     EXPECT_TRUE(framework.GetVariant(IKestoDevice::PLATFORM_UNKNOWN).isNull());
@@ -180,7 +176,7 @@ TEST(Framework, LoadHandsThePackagePathOverUnchangedEvenWhenEmpty)
     _Framework framework;
     EXPECT_FALSE(framework.Load(&device, env));
 
-    framework.variants.insert(u"a"_s, Variant(u"a"_s, IKestoDevice::PLATFORM_ARM));
+    framework.variants.insert(u"a"_s, Variant(u"a"_s));
     EXPECT_CALL(device, InstallPackage(QString())).WillOnce(Return(0u)).WillOnce(Return(7u));
     EXPECT_TRUE(framework.Load(&device, env));
     EXPECT_FALSE(framework.Load(&device, env));

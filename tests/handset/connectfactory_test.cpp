@@ -42,32 +42,28 @@ TEST(ConnectFactory, ListsHandsetsSortedByNameIgnoringCaseWithTheirDescriptions)
 TEST(ConnectFactory, ReadsPlatformAndVersionWithDefaults)
 {
     testutil::HandsetFixture fixture;
-    fixture.AddHandset(u"plain"_s);
-    fixture.AddHandset(u"arm"_s, QString(), u"ARM"_s, u"4.1.7"_s);
-    fixture.AddHandset(u"odd"_s, QString(), u"z80"_s);
-
-    auto plain = fixture.Connect(u"plain"_s);
-    ASSERT_TRUE(plain);
-    EXPECT_EQ(plain->platform, IKestoDevice::PLATFORM_WIN32);
-    QString version = u"stale"_s;
-    EXPECT_EQ(plain->GetPlatformVersion(version), 0u);
-    EXPECT_TRUE(version.isEmpty());
-
-    auto arm = fixture.Connect(u"arm"_s);
-    ASSERT_TRUE(arm);
-    EXPECT_EQ(arm->platform, IKestoDevice::PLATFORM_ARM);
-    EXPECT_EQ(arm->GetPlatformVersion(version), 0u);
-    EXPECT_EQ(version, u"4.1.7"_s);
-    EXPECT_EQ(arm->GetConnectTarget().name, u"arm"_s);
-
-    auto odd = fixture.Connect(u"odd"_s);
-    ASSERT_TRUE(odd);
-    EXPECT_EQ(odd->platform, IKestoDevice::PLATFORM_UNKNOWN);
-
-    testutil::WriteFile(fixture.HandsetFolder(u"odd"_s) + u"/handset.ini"_s, "platform=\nversion=\n");
-    auto blank = fixture.Connect(u"odd"_s);
-    ASSERT_TRUE(blank);
-    EXPECT_EQ(blank->platform, IKestoDevice::PLATFORM_WIN32);
+    const QString ini = fixture.AddHandset(u"phone"_s) + u"/handset.ini"_s;
+    const struct
+    {
+        QByteArray ini;
+        IKestoDevice::Platform platform;
+        const char *version;
+    } rows[] = {
+        {"", IKestoDevice::PLATFORM_WIN32, ""},
+        {"platform=ARM\nversion=4.1.7\n", IKestoDevice::PLATFORM_ARM, "4.1.7"},
+        {"platform=z80\n", IKestoDevice::PLATFORM_UNKNOWN, ""},
+        {"platform=\nversion=\n", IKestoDevice::PLATFORM_WIN32, ""},
+    };
+    for (const auto &row : rows) {
+        testutil::WriteFile(ini, row.ini);
+        auto device = fixture.Connect(u"phone"_s);
+        ASSERT_TRUE(device) << row.ini.constData();
+        EXPECT_EQ(device->platform, row.platform) << row.ini.constData();
+        QString version = u"stale"_s;
+        EXPECT_EQ(device->GetPlatformVersion(version), 0u);
+        EXPECT_EQ(version, QString::fromLatin1(row.version));
+        EXPECT_EQ(device->GetConnectTarget().name, u"phone"_s);
+    }
 }
 
 TEST(ConnectFactory, DefaultHandsetsFolderLiesBelowTheDataRoot)
