@@ -43,25 +43,21 @@ TEST(ConnectFactory, ReadsPlatformAndVersionWithDefaults)
 {
     testutil::HandsetFixture fixture;
     const QString ini = fixture.AddHandset(u"phone"_s) + u"/handset.ini"_s;
-    const struct
-    {
-        QByteArray ini;
-        IKestoDevice::Platform platform;
-        const char *version;
-    } rows[] = {
-        {"", IKestoDevice::PLATFORM_WIN32, ""},
-        {"platform=ARM\nversion=4.1.7\n", IKestoDevice::PLATFORM_ARM, "4.1.7"},
-        {"platform=z80\n", IKestoDevice::PLATFORM_UNKNOWN, ""},
-        {"platform=\nversion=\n", IKestoDevice::PLATFORM_WIN32, ""},
+    using P = IKestoDevice::Platform;
+    const std::tuple<QByteArray, P, const char *> rows[] = {
+        {"", P::PLATFORM_WIN32, ""},
+        {"platform=ARM\nversion=4.1.7\n", P::PLATFORM_ARM, "4.1.7"},
+        {"platform=z80\n", P::PLATFORM_UNKNOWN, ""},
+        {"platform=\nversion=\n", P::PLATFORM_WIN32, ""},
     };
-    for (const auto &row : rows) {
-        testutil::WriteFile(ini, row.ini);
+    for (const auto &[text, platform, expectedVersion] : rows) {
+        testutil::WriteFile(ini, text);
         auto device = fixture.Connect(u"phone"_s);
-        ASSERT_TRUE(device) << row.ini.constData();
-        EXPECT_EQ(device->platform, row.platform) << row.ini.constData();
+        ASSERT_TRUE(device) << text.constData();
+        EXPECT_EQ(device->platform, platform) << text.constData();
         QString version = u"stale"_s;
         EXPECT_EQ(device->GetPlatformVersion(version), 0u);
-        EXPECT_EQ(version, QString::fromLatin1(row.version));
+        EXPECT_EQ(version, QString::fromLatin1(expectedVersion));
         EXPECT_EQ(device->GetConnectTarget().name, u"phone"_s);
     }
 }

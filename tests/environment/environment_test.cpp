@@ -1,0 +1,493 @@
+#include "environment/platforms.h"
+#include "environment/testdirectories.h"
+
+#include "support/testutil.h"
+
+#include <QDir>
+#include <QFile>
+#include <QFileInfo>
+#include <QTemporaryDir>
+
+#include <gtest/gtest.h>
+
+using namespace Qt::StringLiterals;
+
+namespace {
+
+// A private data root, platforms root and test sets root, with none of the
+// user's settings.
+class EnvironmentTest : public ::testing::Test
+{
+protected:
+    void SetUp() override
+    {
+        ASSERT_TRUE(temp.isValid());
+        base = temp.path() + u"/data"_s;
+        root = temp.path() + u"/platforms"_s;
+        kits = temp.path() + u"/Tests"_s;
+        env.Set("KESTIX_DATA_ROOT", base + u'/');
+        for (const char *name : {"KESTIX_PLATFORMS_ALL", "KESTIX_PLATFORM", "KESTIX_TESTSETS_ALL", "KESTIX_TESTSET"})
+            env.Unset(name);
+    }
+
+    void MakeDirs(const QString &parent, const QStringList &names)
+    {
+        for (const QString &name : names)
+            ASSERT_TRUE(QDir().mkpath(parent + u'/' + name));
+    }
+
+    QTemporaryDir temp;
+    QString base;
+    QString root;
+    QString kits;
+    testutil::EnvGuard env;
+};
+using PlatformsTest = EnvironmentTest;
+using TestDirectoriesTest = EnvironmentTest;
+
+QStringList Names(const QList<Platform> &platforms)
+{
+    QStringList names;
+    for (const Platform &platform : platforms)
+        names << platform.name;
+    return names;
+}
+
+TEST_F(PlatformsTest, NoPlatformsRootListsNothingAndClearsTheList)
+{
+    QList<Platform> platforms{Platform()};
+    EXPECT_EQ(GetPlatforms(platforms), 0u);
+    EXPECT_TRUE(platforms.isEmpty());
+}
+
+TEST_F(PlatformsTest, ListsSubDirectoriesByNameStrippingTheProWord)
+{
+    MakeDirs(root, {"Product", "Foo Pro", "abc", "Pro", "My Project", "Bar PRO 2", "zed"});
+    testutil::WriteFile(root + u"/notes.txt"_s, "not a platform");
+    env.Set("KESTIX_PLATFORMS_ALL", root);
+
+    QList<Platform> platforms;
+    ASSERT_EQ(GetPlatforms(platforms), 7u);
+
+    struct Expected
+    {
+        const char *entry;
+        const char *name;
+        bool pro;
+    };
+    const Expected expected[] = {
+        {"abc", "abc", false},    {"Bar PRO 2", "Bar 2", true},
+        {"Foo Pro", "Foo", true}, {"My Project", "My Project", true},
+        {"Pro", "Pro", true},     {"Product", "Product", true},
+        {"zed", "zed", false},
+    };
+    for (int i = 0; i < 7; ++i) {
+        SCOPED_TRACE(expected[i].entry);
+        EXPECT_EQ(platforms[i].name, QString::fromUtf8(expected[i].name));
+        EXPECT_EQ(platforms[i].path, root + u'/' + QString::fromUtf8(expected[i].entry));
+        EXPECT_EQ(platforms[i].isPro, expected[i].pro);
+        EXPECT_FALSE(platforms[i].isDefault);
+    }
+}
+
+TEST_F(PlatformsTest, DefaultPlatformIsMatchedIgnoringCase)
+{
+    MakeDirs(root, {"abc", "Foo Pro"});
+    env.Set("KESTIX_PLATFORMS_ALL", root);
+    env.Set("KESTIX_PLATFORM", (root + u"/ABC/"_s).toUpper());
+
+    QList<Platform> platforms;
+    ASSERT_EQ(GetPlatforms(platforms), 2u);
+    EXPECT_TRUE(platforms[0].isDefault);
+    EXPECT_FALSE(platforms[1].isDefault);
+
+    // A root written with a trailing separator still finds its default.
+    env.Set("KESTIX_PLATFORMS_ALL", root + u'/');
+    env.Set("KESTIX_PLATFORM", root + u"/Foo Pro/bin"_s);
+    ASSERT_EQ(GetPlatforms(platforms), 2u);
+    EXPECT_EQ(platforms[1].path, root + u"//Foo Pro"_s);
+    EXPECT_FALSE(platforms[0].isDefault);
+    EXPECT_TRUE(platforms[1].isDefault);
+
+    // A setting without a separator names no platform.
+    env.Set("KESTIX_PLATFORM", u"abc"_s);
+    ASSERT_EQ(GetPlatforms(platforms), 2u);
+    EXPECT_FALSE(platforms[0].isDefault);
+}
+
+TEST_F(PlatformsTest, ProAndNonProListsAppendWithoutClearing)
+{
+    MakeDirs(root, {"abc", "Foo Pro", "Pro", "zed"});
+    env.Set("KESTIX_PLATFORMS_ALL", root);
+
+    QList<Platform> pro;
+    EXPECT_EQ(GetProPlatforms(pro), 2u);
+    EXPECT_EQ(GetProPlatforms(pro), 4u);
+    EXPECT_EQ(Names(pro), QStringList({"Foo", "Pro", "Foo", "Pro"}));
+
+    QList<Platform> mixed = pro.mid(0, 1);
+    EXPECT_EQ(GetNonProPlatforms(mixed), 3u);
+    EXPECT_EQ(Names(mixed), QStringList({"Foo", "abc", "zed"}));
+
+    env.Unset("KESTIX_PLATFORMS_ALL");
+    EXPECT_EQ(GetProPlatforms(mixed), 3u);
+}
+
+TEST(DefaultPlatform, CutsAtLastBackslashThenLastSlash)
+{
+    const std::tuple<const char *, bool, const char *> rows[] = {
+        {"", false, ""},
+        {"C:\\sdk\\platforms\\abc\\", true, "C:\\sdk\\platforms\\abc"},
+        {"C:\\sdk\\platforms\\abc", true, "C:\\sdk\\platforms"},
+        {"/opt/sdk/abc/", true, "/opt/sdk/abc"},
+        {"/opt/sdk/abc", true, "/opt/sdk"},
+        {"a/b\\c/d", true, "a/b"}, // a backslash anywhere wins over later forward slashes
+        {"abc", true, "abc"},
+    };
+    testutil::EnvGuard env;
+    for (const auto &[setting, found, path] : rows) {
+        env.Set("KESTIX_PLATFORM", QString::fromUtf8(setting));
+        QString out = u"stale"_s;
+        EXPECT_EQ(GetDefaultPlatform(out), found) << setting;
+        EXPECT_EQ(out, QString::fromUtf8(path));
+    }
+}
+
+TEST_F(PlatformsTest, TestKitsDefaultToTestsBesidePlatformsRoot)
+{
+    MakeDirs(root, {"abc"});
+    MakeDirs(kits, {"kitB", "kitA"});
+    env.Set("KESTIX_PLATFORMS_ALL", root + u'/');
+
+    EXPECT_EQ(GetTestSetsRoot(), kits);
+    QList<TestKit> found{TestKit()};
+    ASSERT_EQ(GetTestKits(found), 2u);
+    EXPECT_EQ(found[0].name, u"kitA"_s);
+    EXPECT_EQ(found[0].path, kits + u"/kitA"_s);
+    EXPECT_EQ(found[0].type, TestKit::TEST_KIT);
+    EXPECT_FALSE(found[0].reserved);
+    EXPECT_EQ(found[1].name, u"kitB"_s);
+
+    // An explicit root takes precedence and is cleaned.
+    const QString other = temp.path() + u"/other"_s;
+    MakeDirs(other, {"only"});
+    env.Set("KESTIX_TESTSETS_ALL", other + u"/./"_s);
+    ASSERT_EQ(GetTestKits(found), 1u);
+    EXPECT_EQ(found[0].path, other + u"/only"_s);
+}
+
+TEST_F(PlatformsTest, DefaultTestKitIsTheNamedOneExactly)
+{
+    env.Set("KESTIX_TESTSETS_ALL", kits);
+    env.Set("KESTIX_TESTSET", kits + u"/kitB"_s);
+    TestKit kit;
+    kit.name = u"mine"_s;
+    EXPECT_FALSE(GetDefaultTestKit(kit)); // none installed
+    EXPECT_EQ(kit.name, u"mine"_s);
+
+    MakeDirs(kits, {"kitA", "kitB"});
+    ASSERT_TRUE(GetDefaultTestKit(kit));
+    EXPECT_EQ(kit.name, u"kitB"_s);
+    EXPECT_EQ(kit.path, kits + u"/kitB"_s);
+
+    env.Set("KESTIX_TESTSET", u"C:\\kits\\kitA"_s);
+    ASSERT_TRUE(GetDefaultTestKit(kit));
+    EXPECT_EQ(kit.name, u"kitA"_s);
+
+    // Not installed, or differing in case only: nothing picked, out unchanged.
+    for (const char *setting : {"/kits/kitC", "/kits/KITA"}) {
+        env.Set("KESTIX_TESTSET", QString::fromUtf8(setting));
+        TestKit untouched;
+        untouched.name = u"mine"_s;
+        EXPECT_FALSE(GetDefaultTestKit(untouched)) << setting;
+        EXPECT_EQ(untouched.name, u"mine"_s);
+        EXPECT_EQ(untouched.type, TestKit::USER_KIT);
+    }
+}
+
+TEST_F(PlatformsTest, TestSetEndingInSeparatorPicksTheGreatestName)
+{
+    // Ordinal comparison: lower-case names sort after upper-case ones.
+    MakeDirs(kits, {"alpha", "Zeta", "beta"});
+    env.Set("KESTIX_TESTSETS_ALL", kits);
+    env.Set("KESTIX_TESTSET", kits + u'/');
+    EXPECT_EQ(GetDefaultTestKitName(), QString());
+
+    TestKit kit;
+    ASSERT_TRUE(GetDefaultTestKit(kit));
+    EXPECT_EQ(kit.name, u"beta"_s);
+
+    // Whatever out held before does not change the choice.
+    TestKit prefilled;
+    prefilled.name = u"zzz"_s;
+    ASSERT_TRUE(GetDefaultTestKit(prefilled));
+    EXPECT_EQ(prefilled.name, u"beta"_s);
+}
+
+TEST(TestKitNames, DefaultTestKitNameIsTheLastComponent)
+{
+    testutil::EnvGuard env;
+    const std::pair<const char *, const char *> cases[]
+        = {{"", ""}, {"kit", "kit"}, {"/a/b/kit", "kit"}, {"C:\\a\\kit", "kit"}, {"a\\kit/x", "kit/x"}, {"/a/b/", ""}};
+    for (const auto &[setting, name] : cases) {
+        env.Set("KESTIX_TESTSET", QString::fromUtf8(setting));
+        EXPECT_EQ(GetDefaultTestKitName(), QString::fromUtf8(name)) << setting;
+    }
+}
+
+TEST(TestKitNames, TypeNames)
+{
+    EXPECT_EQ(TestKit::TypeToName(TestKit::USER_KIT), u"User Kit"_s);
+    EXPECT_EQ(TestKit::TypeToName(TestKit::TEST_KIT), u"Test Kit"_s);
+    EXPECT_EQ(TestKit::TypeToName(TestKit::PVS_KIT), u"Pvs Kit"_s);
+    EXPECT_EQ(TestKit::TypeToName(static_cast<TestKit::KitType>(7)), u"unknown"_s);
+    EXPECT_EQ(TestKit::TypeToName(static_cast<TestKit::KitType>(-1)), u"unknown"_s);
+}
+
+TEST(EnvironmentReaders, EmptyTestSetsRootFallsBackBesidePlatforms)
+{
+    testutil::EnvGuard env;
+    env.Set("KESTIX_PLATFORMS_ALL", u"/sdk/./platforms"_s);
+    env.Set("KESTIX_TESTSETS_ALL", u"/kits/../kits"_s);
+    EXPECT_EQ(GetTestSetsRoot(), u"/kits/../kits"_s);
+    env.Set("KESTIX_TESTSETS_ALL", QString());
+    EXPECT_EQ(GetTestSetsRoot(), u"/sdk/Tests"_s);
+}
+
+TEST(BreakPackageName, SplitsIntoNameVariantAndBuild)
+{
+    const std::tuple<const char *, bool, const char *, const char *, const char *> rows[] = {
+        {"my_mod_RVCT22arm9_Release.kestix", true, "my_mod", "RVCT22arm9", "Release"},
+        {"mod_GCCE_UDEB.KESTIX", true, "mod", "GCCE", "UDEB"},
+        {"a__b_c", true, "a", "b", "c"},
+        {"x_y__b_c", true, "x_y", "b", "c"},
+        {"_b_c", true, "", "b", "c"},
+        {"a_b_", true, "a", "b", ""},
+        {"a.kestix_b.kestix_c.kestix", true, "a", "b", "c"},
+        {"a_b.kestix", false, "", "2", "3"},
+        {"plain", false, "", "2", "3"},
+        {"", false, "", "2", "3"},
+    };
+    for (const auto &[package, split, first, middle, last] : rows) {
+        // Too few parts leave the outputs as they were; callers pass first empty.
+        QString parts[3] = {QString(), u"2"_s, u"3"_s};
+        EXPECT_EQ(BreakPackageName(QString::fromUtf8(package), parts[0], parts[1], parts[2]), split) << package;
+        EXPECT_EQ(QStringList(parts, parts + 3), (QStringList{first, middle, last})) << package;
+    }
+}
+
+TEST_F(TestDirectoriesTest, CacheFoldersAreCreatedButNotTheirFiles)
+{
+    const QString manifests = TestDirectories::GetManifestDirectory(u"#42"_s);
+    EXPECT_EQ(manifests, base + u"/Norvane/TestManifests/#42"_s);
+    EXPECT_TRUE(QFileInfo(manifests).isDir());
+
+    EXPECT_EQ(TestDirectories::GetTestDataPath(), base + u"/Norvane/TestDataCache"_s);
+
+    const QString kar = TestDirectories::GetTestDataCacheFilePath(u"#7"_s);
+    EXPECT_EQ(kar, base + u"/Norvane/TestDataCache/#7.kar"_s);
+    EXPECT_FALSE(QFileInfo::exists(kar));
+
+    const QString dso = TestDirectories::GetDSOCacheFilePath(u"#7"_s);
+    EXPECT_EQ(dso, base + u"/Norvane/TestDataCache/DSOFiles/#7.dso"_s);
+    EXPECT_TRUE(QFileInfo(QFileInfo(dso).path()).isDir());
+    EXPECT_FALSE(QFileInfo::exists(dso));
+
+    // An empty data root falls back to the generic data location.
+    const QString xdg = temp.path() + u"/xdg"_s;
+    ASSERT_TRUE(QDir().mkpath(xdg));
+    env.Set("XDG_DATA_HOME", xdg);
+    env.Set("KESTIX_DATA_ROOT", QString());
+    EXPECT_EQ(TestDirectories::GetTestDataPath(), xdg + u"/Norvane/TestDataCache"_s);
+}
+
+TEST_F(TestDirectoriesTest, ProcessResultsPathCreatesFoldersButNotTheFile)
+{
+    const QString path = TestDirectories::GetProcessResultsPath(u"phone"_s);
+    const QString logs = base + u"/Norvane/Targets/phone/Logs"_s;
+    EXPECT_EQ(path, logs + u"/ProcessedResults/ProcessedResults.xml"_s);
+    EXPECT_TRUE(QFileInfo(logs + u"/ProcessedResults"_s).isDir());
+    EXPECT_FALSE(QFileInfo::exists(path));
+    EXPECT_EQ(TestDirectories::GetLogDirectory(u"phone"_s), logs);
+
+    // Asking again leaves what is there alone.
+    testutil::WriteFile(path, "<results/>");
+    EXPECT_EQ(TestDirectories::GetProcessResultsPath(u"phone"_s), path);
+    EXPECT_EQ(testutil::ReadFile(path), QByteArray("<results/>"));
+}
+
+TEST_F(TestDirectoriesTest, TargetNameBecomesOneFolderBelowTargets)
+{
+    const std::pair<const char *, const char *> rows[] = {
+        {"My Phone:1", "My%20Phone%3A1"},
+        {"a/b\\c", "a%2Fb%5Cc"},
+        {"Az09-._~", "Az09-._~"},
+        {"100%", "100%25"},
+        {"..", "%2E%2E"},
+        {".", "%2E"},
+        {"a..b", "a..b"},
+        {"T\xc3\xa9l\xc3\xa9phone", "T%E9l%E9phone"},
+        {"\xe9\x9b\xbb\xe8\xa9\xb1", "%E9%9B%BB%E8%A9%B1"},
+    };
+    const QString targets = base + u"/Norvane/Targets"_s;
+    for (const auto &[target, folder] : rows) {
+        const QString directory = TestDirectories::GetTargetDirectory(QString::fromUtf8(target));
+        EXPECT_EQ(directory, targets + u'/' + QString::fromLatin1(folder));
+        EXPECT_TRUE(QFileInfo(directory).isDir()) << folder;
+    }
+}
+
+class OatScriptsTest : public TestDirectoriesTest
+{
+protected:
+    QString Scripts() const { return base + u"/Norvane/TestDataCache/PerlScripts"_s; }
+    QString Tools() const { return temp.path() + u"/kit/testframeworks/oat/tools/bin"_s; }
+};
+
+TEST_F(OatScriptsTest, CopiesOnceAndNeverRefreshes)
+{
+    testutil::WriteFile(Tools() + u"/PostProcess3.pl"_s, "print 1;\n");
+    testutil::WriteFile(Tools() + u"/helper.pm"_s, "1;\n");
+    ASSERT_TRUE(QDir().mkpath(Tools() + u"/subdir"_s));
+    env.Set("KESTIX_TESTSET", temp.path() + u"/kit"_s);
+
+    EXPECT_EQ(TestDirectories::GetOatPerlScripts(), Scripts());
+    EXPECT_EQ(QDir(Scripts()).entryList(QDir::AllEntries | QDir::NoDotAndDotDot, QDir::Name | QDir::IgnoreCase),
+              QStringList({"helper.pm", "PostProcess3.pl"}));
+
+    testutil::WriteFile(Tools() + u"/PostProcess3.pl"_s, "print 2;\n");
+    testutil::WriteFile(Tools() + u"/new.pl"_s, "new\n");
+    EXPECT_EQ(TestDirectories::GetOatPerlScripts(), Scripts());
+    EXPECT_EQ(testutil::ReadFile(Scripts() + u"/PostProcess3.pl"_s), QByteArray("print 1;\n"));
+    EXPECT_FALSE(QFileInfo::exists(Scripts() + u"/new.pl"_s));
+}
+
+// The folder is filled once, from the default test set; an empty one,
+// made before the test set was named or by hand, stays empty.
+TEST_F(OatScriptsTest, ExistingFolderIsNeverFilled)
+{
+    EXPECT_EQ(TestDirectories::GetOatPerlScripts(), Scripts());
+    EXPECT_TRUE(QDir(Scripts()).isEmpty());
+
+    testutil::WriteFile(Tools() + u"/PostProcess3.pl"_s, "print 1;\n");
+    env.Set("KESTIX_TESTSET", temp.path() + u"/kit"_s);
+    EXPECT_EQ(TestDirectories::GetOatPerlScripts(), Scripts());
+    EXPECT_TRUE(QDir(Scripts()).isEmpty());
+}
+
+TEST_F(TestDirectoriesTest, GenerateProPlatformMatchesNameThenDefault)
+{
+    const QString root = temp.path() + u"/platforms"_s;
+    for (const char *name : {"Alpha Pro", "beta pro", "Gamma"})
+        ASSERT_TRUE(QDir().mkpath(root + u'/' + QString::fromUtf8(name)));
+    env.Set("KESTIX_PLATFORMS_ALL", root);
+
+    Platform found = TestDirectories::GenerateProPlatform(u"BETA"_s);
+    EXPECT_EQ(found.name, u"beta"_s);
+    EXPECT_EQ(found.path, root + u"/beta pro"_s);
+
+    // Non-professional platforms are never chosen, and no default: empty.
+    found = TestDirectories::GenerateProPlatform(u"gamma"_s);
+    EXPECT_TRUE(found.name.isEmpty());
+    EXPECT_TRUE(found.path.isEmpty());
+    EXPECT_FALSE(found.isPro);
+
+    env.Set("KESTIX_PLATFORM", root + u"/Alpha Pro/"_s);
+    found = TestDirectories::GenerateProPlatform(u"gamma"_s);
+    EXPECT_EQ(found.name, u"Alpha"_s);
+    EXPECT_TRUE(found.isDefault);
+    EXPECT_EQ(TestDirectories::GenerateProPlatform(u"beta"_s).name, u"beta"_s);
+}
+
+TEST_F(TestDirectoriesTest, ResolveXmlPathSearchOrder)
+{
+    const QString work = temp.path() + u"/work"_s;
+    const QString home = temp.path() + u"/home"_s;
+    const QString pack = temp.path() + u"/pack"_s;
+    testutil::WriteFile(work + u"/here.xml"_s, "<a/>");
+    testutil::WriteFile(home + u"/athome.xml"_s, "<a/>");
+    testutil::WriteFile(pack + u"/device.xml"_s, "<a/>");
+    testutil::WriteFile(pack + u"/beside.xml"_s, "<a/>");
+    testutil::WriteFile(pack + u"/sub/deep.xml"_s, "<a/>");
+    testutil::WriteFile(pack + u"/flat.xml"_s, "<a/>");
+    ASSERT_TRUE(QDir().mkpath(work + u"/folder"_s));
+    env.Set("HOME", home);
+    testutil::CurrentDirectory cd(work);
+    const QString reference = pack + u"/device.xml"_s;
+
+    EXPECT_EQ(ResolveXmlPath(u"/no/such/file.xml"_s, reference), u"/no/such/file.xml"_s);
+    EXPECT_EQ(ResolveXmlPath(u"here.xml"_s, reference), work + u"/here.xml"_s);
+    EXPECT_EQ(ResolveXmlPath(u"athome.xml"_s, reference), home + u"/athome.xml"_s);
+    EXPECT_EQ(ResolveXmlPath(u"beside.xml"_s, reference), pack + u"/beside.xml"_s);
+    EXPECT_EQ(ResolveXmlPath(u"sub/deep.xml"_s, reference), pack + u"/sub/deep.xml"_s);
+    EXPECT_EQ(ResolveXmlPath(u"elsewhere/flat.xml"_s, reference), pack + u"/flat.xml"_s);
+    EXPECT_EQ(ResolveXmlPath(u"beside.xml"_s, QString()), QString());
+    EXPECT_EQ(ResolveXmlPath(u"missing.xml"_s, reference), QString());
+    // A folder is not a file.
+    EXPECT_EQ(ResolveXmlPath(u"folder"_s, reference), QString());
+    EXPECT_EQ(ResolveXmlPath(QString(), reference), QString());
+}
+
+class AssociatedExecutableTest : public TestDirectoriesTest
+{
+protected:
+    void SetUp() override
+    {
+        TestDirectoriesTest::SetUp();
+        bin = temp.path() + u"/bin"_s;
+        for (const char *program : {"perl", "python3", "sh"})
+            MakeExecutable(bin + u'/' + QString::fromLatin1(program));
+        env.Set("PATH", bin);
+    }
+
+    static void MakeExecutable(const QString &path)
+    {
+        testutil::WriteFile(path, "#!/bin/sh\nexit 0\n");
+        QFile::setPermissions(path, QFile::ReadOwner | QFile::WriteOwner | QFile::ExeOwner);
+    }
+
+    QString Script(const QString &name, const QByteArray &content)
+    {
+        const QString path = temp.path() + u"/scripts/"_s + name;
+        testutil::WriteFile(path, content);
+        return path;
+    }
+
+    QString bin;
+};
+
+TEST_F(AssociatedExecutableTest, ShebangThenSuffixNamesTheInterpreter)
+{
+    const QString own = temp.path() + u"/tools/interp"_s;
+    MakeExecutable(own);
+    const struct
+    {
+        const char *name;
+        QByteArray content;
+        QString found;
+    } rows[] = {
+        {"a", "#!/usr/bin/env perl\nprint;\n", bin + u"/perl"_s},
+        {"b.txt", "#! /usr/bin/env -S python3 -u\n", bin + u"/python3"_s},
+        {"c.pl", "#!/bin/sh\necho\n", u"/bin/sh"_s},
+        {"d", "#!perl -w\r\n", bin + u"/perl"_s},
+        {"e", "#!" + own.toUtf8() + " --x\n", own},
+        {"PostProcess3.pl", "print 1;\n", bin + u"/perl"_s},
+        {"Tool.PL", "", bin + u"/perl"_s},
+        {"x.py", "print(1)\n", bin + u"/python3"_s},
+        {"x.sh", "echo\n", bin + u"/sh"_s},
+        // A "#!" naming an interpreter that is not there falls back to the suffix.
+        {"y.pl", "#!/no/such/perl\n", bin + u"/perl"_s},
+        {"notes.txt", "hello\n", QString()},
+        {"noext", "", QString()},
+        {"z", "#!/usr/bin/env\n", QString()},
+    };
+    for (const auto &row : rows)
+        EXPECT_EQ(FindAssociatedExecutable(Script(QString::fromLatin1(row.name), row.content)), row.found) << row.name;
+    EXPECT_EQ(FindAssociatedExecutable(temp.path() + u"/missing.pl"_s), QString());
+    EXPECT_EQ(FindAssociatedExecutable(temp.path()), QString());
+    env.Set("PATH", temp.path() + u"/empty"_s);
+    EXPECT_EQ(FindAssociatedExecutable(Script(u"p.pl"_s, "print 1;\n")), QString());
+    EXPECT_EQ(FindAssociatedExecutable(Script(u"q"_s, "#!/usr/bin/env perl\n")), QString());
+}
+
+} // namespace
