@@ -1,4 +1,8 @@
+// The emulated handset: finding and connecting handsets, the operations on
+// files, packages and programs, and losing the connection.
+
 #include "device/device.h"
+#include "handset/connectfactory.h"
 #include "handset/emulatedhandset.h"
 #include "log/log.h"
 
@@ -9,6 +13,7 @@
 #include <QDirIterator>
 #include <QFile>
 #include <QFileInfo>
+#include <QTemporaryDir>
 
 #include <gtest/gtest.h>
 
@@ -54,7 +59,8 @@ protected:
     void SetUp() override
     {
         folder = fixture.AddHandset(u"phone"_s);
-        device = fixture.Connect(u"phone"_s);
+        log.SetLogPath(fixture.WorkFolder() + u"/log.txt"_s);
+        device = fixture.Connect(u"phone"_s, &log);
         ASSERT_TRUE(device);
         outside = fixture.WorkFolder() + u"/outside"_s;
         testutil::WriteFile(outside + u"/keep.txt"_s, "keep");
@@ -68,8 +74,10 @@ protected:
     QString Host(const char *handsetPath) const { return fixture.HostPath(u"phone"_s, QString::fromUtf8(handsetPath)); }
     QString Work(const char *name) const { return fixture.WorkFolder() + u'/' + QString::fromUtf8(name); }
     QString Fs() const { return folder + u"/fs"_s; }
+    QString LogText() const { return QString::fromLatin1(testutil::ReadFile(Work("log.txt"))); }
 
     HandsetFixture fixture;
+    Log log;
     QString folder;
     QString outside;
     HandsetFixture::Device device;
@@ -399,33 +407,21 @@ TEST_F(PackageTest, MemberLeadingThroughALinkOutOfTheHandsetRefusesThePackage)
 
 TEST_F(PackageTest, DamagedPackageIsRefusedWithItsReasonAndInstallsNothing)
 {
-    Log log;
-    log.SetLogPath(fixture.WorkFolder() + u"/log.txt"_s);
-    device = fixture.Connect(u"phone"_s, &log);
-    ASSERT_TRUE(device);
     const QString package = fixture.MakePackage(
         u"p.kestix"_s, testutil::Members{{u"m/a.txt"_s, "a"}, {u"m/big.bin"_s, QByteArray(4096, 'x')}});
-    QByteArray bytes = testutil::ReadFile(package);
-    const struct
-    {
-        const char *name;
-        QByteArray bytes;
-        const char *reason;
-    } damaged[] = {
+    const QByteArray bytes = testutil::ReadFile(package);
+    const std::tuple<const char *, QByteArray, const char *> damaged[] = {
         {"cut.kestix", bytes.left(512 + 512 + 512 + 1000), "unexpected end of archive at offset 2536"},
         {"sum.kestix", bytes.left(1024) + "junk" + bytes.mid(1028), "checksum error at offset 1024"},
         {"text.kestix", QByteArray("m/a.txt\n").repeated(100), "does not look like a tar archive"},
     };
-    for (const auto &c : damaged) {
-        const QString path = fixture.WorkFolder() + u'/' + QLatin1String(c.name);
-        testutil::WriteFile(path, c.bytes);
-        EXPECT_EQ(device->InstallPackage(path), HANDSET_ERROR_BAD_PACKAGE) << c.name;
-        EXPECT_TRUE(Tree(Fs()).isEmpty()) << c.name;
-        EXPECT_TRUE(
-            testutil::ReadFile(fixture.WorkFolder() + u"/log.txt"_s)
-                .contains(u"EmulatedHandset::InstallPackage refused %1: %2\n"_s.arg(path, QLatin1String(c.reason))
-                              .toLatin1()))
-            << c.name;
+    for (const auto &[name, content, reason] : damaged) {
+        const QString path = Work(name);
+        testutil::WriteFile(path, content);
+        EXPECT_EQ(device->InstallPackage(path), HANDSET_ERROR_BAD_PACKAGE) << name;
+        EXPECT_TRUE(Tree(Fs()).isEmpty()) << name;
+        EXPECT_TRUE(LogText().contains(u"EmulatedHandset::InstallPackage refused %1: %2\n"_s.arg(path, reason)))
+            << name;
     }
 }
 
@@ -550,6 +546,96 @@ TEST_F(BehaviourTest, NothingTheBehaviourStartedOutlivesTheStartCall)
     for (int i = 0; i < 200 && IsAlive(pid); ++i)
         std::this_thread::sleep_for(std::chrono::milliseconds(10));
     EXPECT_FALSE(IsAlive(pid));
+}
+
+QStringList Names(const QList<ConnectTarget> &targets)
+{
+    QStringList names;
+    for (const ConnectTarget &target : targets)
+        names.append(target.name + u'|' + target.description);
+    return names;
+}
+
+TEST(ConnectFactory, ListsHandsetsSortedByNameIgnoringCaseWithTheirDescriptions)
+{
+    testutil::HandsetFixture fixture;
+    fixture.AddHandset(u"beta"_s);
+    fixture.AddHandset(u"Alpha"_s, u"Lab phone 1"_s, u"arm"_s);
+    fixture.AddHandset(u"charlie"_s, QString(), u"1"_s);
+    QDir().mkpath(fixture.HandsetsFolder() + u"/not-a-handset/fs"_s);
+    testutil::WriteFile(fixture.HandsetsFolder() + u"/stray.ini"_s, "x");
+
+    ASSERT_TRUE(ConnectFactory::Initialize());
+    QList<ConnectTarget> targets{ConnectTarget(u"left"_s, u"over"_s)};
+    EXPECT_EQ(ConnectFactory::ListTargets(targets), 3u);
+    EXPECT_EQ(Names(targets), (QStringList{u"Alpha|Lab phone 1"_s, u"beta|beta"_s, u"charlie|charlie"_s}));
+    ConnectFactory::Uninitialize();
+}
+
+TEST(ConnectFactory, ReadsPlatformAndVersionWithDefaults)
+{
+    testutil::HandsetFixture fixture;
+    const QString ini = fixture.AddHandset(u"phone"_s) + u"/handset.ini"_s;
+    using P = IKestoDevice::Platform;
+    const std::tuple<QByteArray, P, const char *> rows[] = {
+        {"", P::PLATFORM_WIN32, ""},
+        {"platform=ARM\nversion=4.1.7\n", P::PLATFORM_ARM, "4.1.7"},
+        {"platform=z80\n", P::PLATFORM_UNKNOWN, ""},
+        {"platform=\nversion=\n", P::PLATFORM_WIN32, ""},
+    };
+    for (const auto &[text, platform, expectedVersion] : rows) {
+        testutil::WriteFile(ini, text);
+        auto device = fixture.Connect(u"phone"_s);
+        ASSERT_TRUE(device) << text.constData();
+        EXPECT_EQ(device->platform, platform) << text.constData();
+        QString version = u"stale"_s;
+        EXPECT_EQ(device->GetPlatformVersion(version), 0u);
+        EXPECT_EQ(version, QString::fromLatin1(expectedVersion));
+        EXPECT_EQ(device->GetConnectTarget().name, u"phone"_s);
+    }
+}
+
+TEST(ConnectFactory, DefaultHandsetsFolderLiesBelowTheDataRoot)
+{
+    QTemporaryDir root;
+    testutil::EnvGuard env("KESTIX_DATA_ROOT", root.path());
+    env.Unset("KESTIX_HANDSETS");
+    testutil::WriteFile(root.path() + u"/Norvane/Handsets/phone/handset.ini"_s, "");
+    QList<ConnectTarget> targets;
+    EXPECT_EQ(ConnectFactory::ListTargets(targets), 1u);
+    EXPECT_EQ(Names(targets), QStringList{u"phone|phone"_s});
+
+    env.Set("KESTIX_HANDSETS", QString());
+    EXPECT_EQ(ConnectFactory::ListTargets(targets), 1u);
+
+    env.Set("KESTIX_HANDSETS", root.filePath(u"none"_s));
+    EXPECT_EQ(ConnectFactory::ListTargets(targets), 0u);
+    EXPECT_TRUE(targets.isEmpty());
+}
+
+using ConnectFactoryRefusal = EmulatedHandsetTest;
+
+TEST_F(ConnectFactoryRefusal, UnknownHandsetsAndNamesThatAreNoPlainFolderNameGiveNull)
+{
+    EXPECT_EQ(ConnectFactory::ConnectToTarget(ConnectTarget(u"nokia"_s, QString()), &log), nullptr);
+    EXPECT_TRUE(LogText().contains(u"Handset nokia not found"_s));
+    EXPECT_EQ(ConnectFactory::ConnectToTarget(ConnectTarget(u"nokia"_s, QString()), nullptr), nullptr);
+    ConnectFactory::DisconnectTarget(nullptr);
+
+    // A handset one level up must not be reachable through "..".
+    testutil::WriteFile(fixture.HandsetsFolder() + u"/../handset.ini"_s, "");
+    for (const char *name : {"..", ".", "", "phone/fs", "../handsets/phone"})
+        EXPECT_EQ(ConnectFactory::ConnectToTarget(ConnectTarget(QString::fromUtf8(name), QString()), &log), nullptr)
+            << name;
+}
+
+TEST_F(ConnectFactoryRefusal, OfflineHandsetIsListedButRefusesTheConnection)
+{
+    testutil::WriteFile(fixture.HandsetFolder(u"phone"_s) + u"/offline"_s, "");
+    QList<ConnectTarget> targets;
+    EXPECT_EQ(ConnectFactory::ListTargets(targets), 1u);
+    EXPECT_EQ(ConnectFactory::ConnectToTarget(targets.first(), &log), nullptr);
+    EXPECT_TRUE(LogText().contains(u"Handset phone is offline."_s));
 }
 
 } // namespace
