@@ -78,6 +78,9 @@ protected:
         return names;
     }
 
+    // A cache file of the manifest's kit holding text.
+    void WriteCache(const Manifest &manifest, const QByteArray &text) { testutil::WriteFile(manifest.cacheFile, text); }
+
     QString LogText() const { return QString::fromLatin1(testutil::ReadFile(m_dir.path() + u"/log.txt"_s)); }
 
     QTemporaryDir m_dir;
@@ -423,43 +426,7 @@ TEST(ManifestLogKind, ModuleKindFollowsTheLogName)
     }
 }
 
-class ManifestCacheTest : public ManifestFixture
-{
-protected:
-    // A kit with a module of every kind, records in their packages, and
-    // frameworks of both origins.
-    void BuildRichKit()
-    {
-        Module ctf = MakeModule(u"ctf"_s, u"Timer"_s);
-        ctf.family = u"Kernel"_s;
-        ctf.minKestoVersion = u"3.1"_s;
-        ctf.secondaryModules = {u"helperlib"_s};
-        ctf.package.classIds = {0x01020304, 0x01020305};
-        ctf.package.programs = {{u"Timer_k"_s, u"-all"_s}, {u"Other"_s, QString()}};
-        kit->AddSourceModule(u"tests/kernel/timer"_s, ctf);
-
-        Module applet = MakeModule(u"ctfapplet"_s, u"Browser"_s);
-        applet.package.appletIds = {0x0A0B0C0D, 0x0A0B0C0E};
-        kit->AddSourceModule(u"tests/net/browser"_s, applet);
-
-        Module oat = MakeModule(u"oat"_s, u"Contacts"_s);
-        oat.package.suitePrograms = {u"kesto:suite:Contacts"_s};
-        kit->AddSourceModule(u"tests/pim/contacts"_s, oat);
-        kit->AddFile(u"tests/pim/contacts/Contacts.baseline"_s, "b");
-
-        Module menu = MakeModule(u"uitf"_s, u"Menu"_s);
-        menu.family = u"Menüs \u65e5\u672c"_s;
-        kit->AddSourceModule(u"tests/ui/menu"_s, menu);
-        kit->AddPrebuiltModule(u"tests/ui/prebuilt"_s, MakeModule(u"uitf"_s, u"Prebuilt"_s));
-        kit->AddModulePackages(u"libs/helper/package"_s, MakeModule(u"ctf"_s, u"helperlib"_s));
-
-        kit->AddFrameworkPackage(u"testframeworks"_s, u"oat"_s, u"RVCT22arm9"_s, u"Release"_s);
-        kit->AddFrameworkPackage(u"testframeworks"_s, u"ctf"_s, u"Win32"_s, u"Debug"_s);
-    }
-
-    // A cache file of the manifest's kit with the given root and entries.
-    void WriteCache(const Manifest &manifest, const QByteArray &text) { testutil::WriteFile(manifest.cacheFile, text); }
-};
+using ManifestCacheTest = ManifestFixture;
 
 TEST_F(ManifestCacheTest, CacheLivesInTheFolderNamedByTheCleanedKitPath)
 {
@@ -514,7 +481,7 @@ TEST_F(ManifestCacheTest, StaleOrBrokenCacheIsReplacedByAScan)
     }
 }
 
-TEST_F(ManifestCacheTest, ReadingKeepsKnownKindsAndNamedFrameworksOnly)
+TEST_F(ManifestCacheTest, ReadingKeepsKnownKindsAndNamedFrameworksOnlyAndReplacesModules)
 {
     Manifest manifest(kit->Root(), false);
     WriteCache(manifest,
@@ -541,34 +508,75 @@ TEST_F(ManifestCacheTest, ReadingKeepsKnownKindsAndNamedFrameworksOnly)
     EXPECT_TRUE(manifest.frameworks.value(u"oat"_s).dynamicCast<_OatFramework>());
     EXPECT_FALSE(manifest.frameworks.value(u"OAT"_s).dynamicCast<_OatFramework>());
     EXPECT_EQ(manifest.frameworks.value(u"oat"_s)->classId, 17u);
-}
 
-TEST_F(ManifestCacheTest, ReadingReplacesModulesButKeepsFrameworks)
-{
-    Manifest manifest(kit->Root(), false);
-    WriteCache(manifest,
-               "<testkit version='5'><testmodules><testmodule testtype='ctf' moduleName='A'/></testmodules>"
-               "<frameworks><framework name='ctf'/></frameworks></testkit>");
-    ASSERT_TRUE(manifest.ReadManifest());
+    // Reading again replaces the modules but keeps the frameworks.
     WriteCache(manifest,
                "<testkit version='5'><testmodules><testmodule testtype='ctf' moduleName='B'/></testmodules>"
-               "<frameworks><framework name='oat'/></frameworks></testkit>");
+               "<frameworks><framework name='ctf'/></frameworks></testkit>");
     ASSERT_TRUE(manifest.ReadManifest());
     EXPECT_EQ(manifest.testModules.keys(), QStringList{"b"});
-    EXPECT_EQ(manifest.frameworks.keys(), (QStringList{"ctf", "oat"}));
+    EXPECT_EQ(manifest.frameworks.keys(), (QStringList{"OAT", "ctf", "oat"}));
 }
 
-TEST_F(ManifestCacheTest, WrittenCatalogueReadsBackTheSame)
+// A kit with a module of every kind, records in their packages, and
+// frameworks of both origins.
+TEST_F(ManifestCacheTest, WrittenCatalogueIsWellFormedAndReadsBackTheSame)
 {
-    BuildRichKit();
+    Module ctf = MakeModule(u"ctf"_s, u"Timer"_s);
+    ctf.family = u"Kernel"_s;
+    ctf.minKestoVersion = u"3.1"_s;
+    ctf.secondaryModules = {u"helperlib"_s};
+    ctf.package.classIds = {0x01020304, 0x01020305};
+    ctf.package.programs = {{u"Timer_k"_s, u"-all"_s}, {u"Other"_s, QString()}};
+    kit->AddSourceModule(u"tests/kernel/timer"_s, ctf);
+
+    Module applet = MakeModule(u"ctfapplet"_s, u"Browser"_s);
+    applet.package.appletIds = {0x0A0B0C0D, 0x0A0B0C0E};
+    kit->AddSourceModule(u"tests/net/browser"_s, applet);
+
+    Module oat = MakeModule(u"oat"_s, u"Contacts"_s);
+    oat.package.suitePrograms = {u"kesto:suite:Contacts"_s};
+    kit->AddSourceModule(u"tests/pim/contacts"_s, oat);
+    kit->AddFile(u"tests/pim/contacts/Contacts.baseline"_s, "b");
+
+    Module menu = MakeModule(u"uitf"_s, u"Menu"_s);
+    menu.family = u"Menüs \u65e5\u672c"_s;
+    kit->AddSourceModule(u"tests/ui/menu"_s, menu);
+    kit->AddPrebuiltModule(u"tests/ui/prebuilt"_s, MakeModule(u"uitf"_s, u"Prebuilt"_s));
+    kit->AddModulePackages(u"libs/helper/package"_s, MakeModule(u"ctf"_s, u"helperlib"_s));
+
+    kit->AddFrameworkPackage(u"testframeworks"_s, u"oat"_s, u"RVCT22arm9"_s, u"Release"_s);
+    kit->AddFrameworkPackage(u"testframeworks"_s, u"ctf"_s, u"Win32"_s, u"Debug"_s);
     Manifest scanned = ScanKit();
     ASSERT_EQ(scanned.testModules.keys(),
               (QStringList{"browser", "contacts", "helperlib", "menu", "prebuilt", "timer"}));
 
+    const QByteArray bytes = testutil::ReadFile(scanned.cacheFile);
+    EXPECT_TRUE(bytes.startsWith("<testkit ")) << "no XML declaration";
+    QDomDocument document;
+    ASSERT_TRUE(document.setContent(bytes));
+    const QDomElement root = document.documentElement();
+    EXPECT_EQ(root.attribute(u"version"_s), u"5"_s);
+    EXPECT_EQ(root.attribute(u"path"_s), kit->Root());
+    EXPECT_EQ(root.attribute(u"hash"_s), scanned.RootHash());
+    EXPECT_EQ(root.firstChildElement().tagName(), u"testmodules"_s);
+    EXPECT_EQ(root.lastChildElement().tagName(), u"frameworks"_s);
+    EXPECT_EQ(root.firstChildElement().childNodes().size(), 6);
+    QByteArray output;
+    if (testutil::HaveProgram(u"xmllint"_s))
+        EXPECT_EQ(testutil::RunProgram(u"xmllint"_s, {u"--noout"_s, scanned.cacheFile}, &output), 0)
+            << output.toStdString();
+    // The tool scans in a process of its own, with its own hash seed: the
+    // catalogue it writes must hold the same bytes.
+    ASSERT_EQ(testutil::RunProgram(u"" HARNESS_BINARY_DIR "/harness"_s,
+                                   {u"manifest"_s, u"--kit"_s, kit->Root(), u"-o"_s, TempPath(u"tool"_s)}, &output),
+              0)
+        << output.toStdString();
+    EXPECT_EQ(testutil::ReadFile(TempPath(u"tool/KVKManifest.xml"_s)), bytes);
+
     Manifest read(kit->Root(), false);
     ASSERT_TRUE(read.IsVersionOkay());
     ASSERT_TRUE(read.ReadManifest());
-
     // What the scan found is really there; the kinds and hashes come back as
     // the byte comparison below shows.
     ASSERT_EQ(read.testModules.size(), scanned.testModules.size());
@@ -579,11 +587,10 @@ TEST_F(ManifestCacheTest, WrittenCatalogueReadsBackTheSame)
     const auto contacts = read.FindTestModule(u"contacts"_s).dynamicCast<OatTestModule>();
     ASSERT_TRUE(contacts);
     EXPECT_EQ(contacts->ModuleName(), u"Contacts"_s);
+    EXPECT_EQ(contacts->baseLineFile, kit->Path(u"tests/pim/contacts/Contacts.baseline"_s));
     EXPECT_EQ(read.FindTestModule(u"browser"_s)->applets.size(), 2);
-    EXPECT_EQ(read.FindTestModule(u"contacts"_s)->baseLineFile, kit->Path(u"tests/pim/contacts/Contacts.baseline"_s));
     EXPECT_TRUE(read.FindTestModule(u"helperlib"_s).dynamicCast<SecondaryModule>());
     EXPECT_EQ(read.FindTestModule(u"menu"_s)->family, u"Menüs \u65e5\u672c"_s);
-
     QList<QSharedPointer<_Framework>> frameworks;
     ASSERT_EQ(read.GetFrameworks(frameworks), 2u);
     EXPECT_EQ(frameworks[0]->name, u"ctf"_s);
@@ -594,39 +601,10 @@ TEST_F(ManifestCacheTest, WrittenCatalogueReadsBackTheSame)
     // program records, whose bytes the manifest never holds.
     const QString again = TempPath(u"again.xml"_s);
     ASSERT_TRUE(read.WriteManifest(again));
-    QByteArray expected = testutil::ReadFile(scanned.cacheFile);
+    QByteArray expected = bytes;
     ASSERT_TRUE(expected.contains("<data/>"));
     expected.replace("     <data/>\n", "");
     EXPECT_EQ(testutil::ReadFile(again), expected);
-}
-
-// The tool scans in a process of its own, with its own hash seed: the
-// catalogue it writes must hold the same bytes.
-TEST_F(ManifestCacheTest, WrittenCacheIsWellFormedXmlAndTheSameInAnotherProcess)
-{
-    BuildRichKit();
-    Manifest manifest = ScanKit();
-
-    const QByteArray bytes = testutil::ReadFile(manifest.cacheFile);
-    EXPECT_TRUE(bytes.startsWith("<testkit ")) << "no XML declaration";
-    QDomDocument document;
-    ASSERT_TRUE(document.setContent(bytes));
-    const QDomElement root = document.documentElement();
-    EXPECT_EQ(root.attribute(u"version"_s), u"5"_s);
-    EXPECT_EQ(root.attribute(u"path"_s), kit->Root());
-    EXPECT_EQ(root.attribute(u"hash"_s), manifest.RootHash());
-    EXPECT_EQ(root.firstChildElement().tagName(), u"testmodules"_s);
-    EXPECT_EQ(root.lastChildElement().tagName(), u"frameworks"_s);
-    EXPECT_EQ(root.firstChildElement().childNodes().size(), 6);
-    QByteArray output;
-    if (testutil::HaveProgram(u"xmllint"_s))
-        EXPECT_EQ(testutil::RunProgram(u"xmllint"_s, {u"--noout"_s, manifest.cacheFile}, &output), 0)
-            << output.toStdString();
-    ASSERT_EQ(testutil::RunProgram(u"" HARNESS_BINARY_DIR "/harness"_s,
-                                   {u"manifest"_s, u"--kit"_s, kit->Root(), u"-o"_s, TempPath(u"tool"_s)}, &output),
-              0)
-        << output.toStdString();
-    EXPECT_EQ(testutil::ReadFile(TempPath(u"tool/KVKManifest.xml"_s)), testutil::ReadFile(manifest.cacheFile));
 }
 
 TEST_F(ManifestCacheTest, EmptyCatalogueIsNeverWritten)
@@ -667,12 +645,12 @@ TEST_F(ManifestCacheTest, WritingRecreatesAMissingCacheFolder)
     EXPECT_TRUE(QFile::exists(manifest.cacheFile));
 }
 
-class ManifestQueryTest : public ManifestCacheTest
+class ManifestQueryTest : public ManifestFixture
 {
 protected:
     void SetUp() override
     {
-        ManifestCacheTest::SetUp();
+        ManifestFixture::SetUp();
         manifest = std::make_unique<Manifest>(kit->Root(), false);
         WriteCache(*manifest,
                    "<testkit version='5'><testmodules>"
