@@ -163,7 +163,11 @@ TEST_F(ManifestScanTest, PlatformManifestWalksTestframeworksLikeAnyFolder)
     EXPECT_EQ(module->subFamily, u"ctf"_s);
 }
 
-TEST_F(ManifestScanTest, FamiliesComeFromTheDescriptionOrElseFromThePath)
+// Families come from the description or else from the path; the first
+// description of a name wins and later ones add their package targets; source
+// modules get targets and prebuilt ones do not; oat modules find their
+// baseline file.
+TEST_F(ManifestScanTest, ModulesTakeTheirRecordsFromDescriptionPathAndPackages)
 {
     kit->AddSourceModule(u"tests/multimedia/audio"_s, MakeModule(u"ctf"_s, u"Audio"_s));
     kit->AddSourceModule(u"API/Tests/net/socket/v2"_s, MakeModule(u"uitf"_s, u"Socket"_s));
@@ -174,23 +178,6 @@ TEST_F(ManifestScanTest, FamiliesComeFromTheDescriptionOrElseFromThePath)
     kit->AddSourceModule(u"tests/Shallow"_s, MakeModule(u"ctfapplet"_s, u"Shallow"_s));
     kit->AddSourceModule(u"tests"_s, MakeModule(u"ctf"_s, u"Top"_s));
 
-    Manifest manifest = ScanKit();
-
-    const auto family = [&](const char *name) {
-        const auto module = manifest.FindTestModule(QString::fromLatin1(name));
-        return module ? module->family + u'/' + module->subFamily : u"missing"_s;
-    };
-    EXPECT_EQ(family("audio"), u"multimedia/audio"_s);
-    EXPECT_EQ(family("socket"), u"net/socket"_s);
-    EXPECT_EQ(family("own"), u"Telephony/Calls"_s);
-    // One folder below the skipped words: the file name is the second part.
-    EXPECT_EQ(family("shallow"), u"Shallow/ctfappletmodule.xml"_s);
-    EXPECT_EQ(family("top"), u"/"_s);
-    EXPECT_EQ(manifest.FindTestModule(u"audio"_s)->source, u"KVK"_s);
-}
-
-TEST_F(ManifestScanTest, FirstDescriptionOfANameWinsAndLaterOnesAddTheirPackageTargets)
-{
     Module first = MakeModule(u"ctf"_s, u"Dup"_s);
     first.variants = {u"Win32_Debug"_s};
     Module second = MakeModule(u"ctf"_s, u"DUP"_s);
@@ -203,24 +190,6 @@ TEST_F(ManifestScanTest, FirstDescriptionOfANameWinsAndLaterOnesAddTheirPackageT
     kit->AddSourceModule(u"tests/b_arm/dup"_s, second);
     kit->AddSourceModule(u"tests/c_again/dup"_s, third);
 
-    Manifest manifest = ScanKit();
-
-    ASSERT_EQ(manifest.testModules.size(), 1);
-    const auto module = manifest.testModules.value(u"dup"_s);
-    ASSERT_TRUE(module.dynamicCast<CtfTestModule>());
-    EXPECT_EQ(module->moduleName, u"Dup"_s);
-    EXPECT_EQ(module->family, u"a_win32"_s);
-    EXPECT_EQ(module->subFamily, u"dup"_s);
-    ASSERT_EQ(module->testCases.size(), 2);
-    EXPECT_EQ(module->testCases.first().name, u"Dup_1"_s);
-    EXPECT_EQ(module->targets.keys(), (QStringList{"DUP_RVCT22arm9_Release", "Dup_Win32_Debug"}));
-    // A target of a name already known keeps its first package.
-    EXPECT_EQ(module->targets.value(u"Dup_Win32_Debug"_s)->packagePath,
-              kit->Path(u"tests/a_win32/dup/package/Dup_Win32_Debug.kestix"_s));
-}
-
-TEST_F(ManifestScanTest, SourceModulesGetTargetsAndPrebuiltOnesDoNot)
-{
     Module source = MakeModule(u"ctf"_s, u"FromSource"_s);
     source.package.classIds = {0x01234567, 0x01234568};
     source.package.appletIds = {0x0ABCDEF0};
@@ -229,21 +198,54 @@ TEST_F(ManifestScanTest, SourceModulesGetTargetsAndPrebuiltOnesDoNot)
     // A package folder beside prebuilt binaries is not looked at for targets.
     kit->AddModulePackages(u"tests/x/prebuilt/package"_s, MakeModule(u"ctf"_s, u"Prebuilt"_s));
 
+    kit->AddSourceModule(u"tests/oat/with"_s, MakeModule(u"oat"_s, u"With"_s));
+    kit->AddFile(u"tests/oat/with/With.BaseLine"_s, "base");
+    kit->AddSourceModule(u"tests/oat/without"_s, MakeModule(u"oat"_s, u"Without"_s));
+    kit->AddFile(u"tests/oat/without/zzz.txt"_s, "x");
+
     Manifest manifest = ScanKit();
+    EXPECT_EQ(
+        manifest.testModules.keys(),
+        (QStringList{"audio", "dup", "fromsource", "own", "prebuilt", "shallow", "socket", "top", "with", "without"}));
+
+    const auto family = [&](const char *name) {
+        const auto module = manifest.FindTestModule(QString::fromLatin1(name));
+        return module ? module->family + u'/' + module->subFamily : u"missing"_s;
+    };
+    EXPECT_EQ(family("audio"), u"multimedia/audio"_s);
+    EXPECT_EQ(family("socket"), u"net/socket"_s);
+    EXPECT_EQ(family("own"), u"Telephony/Calls"_s);
+    // One folder below the skipped words: the file name is the second part.
+    EXPECT_EQ(family("shallow"), u"Shallow/ctfappletmodule.xml"_s);
+    EXPECT_EQ(family("top"), u"/"_s);
+    EXPECT_EQ(manifest.FindTestModule(u"audio"_s)->source, u"KVK"_s);
+
+    const auto dup = manifest.testModules.value(u"dup"_s);
+    ASSERT_TRUE(dup.dynamicCast<CtfTestModule>());
+    EXPECT_EQ(dup->moduleName, u"Dup"_s);
+    EXPECT_EQ(family("dup"), u"a_win32/dup"_s);
+    ASSERT_EQ(dup->testCases.size(), 2);
+    EXPECT_EQ(dup->testCases.first().name, u"Dup_1"_s);
+    EXPECT_EQ(dup->targets.keys(), (QStringList{"DUP_RVCT22arm9_Release", "Dup_Win32_Debug"}));
+    // A target of a name already known keeps its first package.
+    EXPECT_EQ(dup->targets.value(u"Dup_Win32_Debug"_s)->packagePath,
+              kit->Path(u"tests/a_win32/dup/package/Dup_Win32_Debug.kestix"_s));
 
     const auto built = manifest.FindTestModule(u"fromsource"_s);
-    ASSERT_TRUE(built);
     EXPECT_EQ(built->sourcePath, kit->Path(u"tests/x/source"_s));
     EXPECT_EQ(built->targets.keys(), (QStringList{"FromSource_RVCT22arm9_Release", "FromSource_Win32_Debug"}));
     EXPECT_EQ(built->targets.value(u"FromSource_Win32_Debug"_s)->arch, IKestoDevice::PLATFORM_WIN32);
     EXPECT_EQ(built->classids, (QVector<unsigned int>{0x01234567, 0x01234568}));
     ASSERT_EQ(built->applets.size(), 1);
     EXPECT_EQ(built->applets[0].appletid, 0x0ABCDEF0u);
-
     const auto prebuilt = manifest.FindTestModule(u"prebuilt"_s);
-    ASSERT_TRUE(prebuilt);
     EXPECT_TRUE(prebuilt->targets.isEmpty());
     EXPECT_TRUE(prebuilt->sourcePath.isEmpty());
+
+    EXPECT_EQ(manifest.FindTestModule(u"with"_s)->baseLineFile, kit->Path(u"tests/oat/with/With.BaseLine"_s));
+    const auto without = manifest.FindTestModule(u"without"_s);
+    EXPECT_TRUE(without->baseLineFile.isEmpty());
+    EXPECT_FALSE(without->targets.isEmpty());
 }
 
 // The last entry in name order that says "source" or "prebuilt" decides.
@@ -278,21 +280,6 @@ TEST_F(ManifestScanTest, LastClassifyingEntryDecidesBetweenSourceAndPrebuilt)
         EXPECT_EQ(!found->targets.isEmpty(), rows[i].source) << rows[i].entry;
         EXPECT_FALSE(found->sourcePath.isEmpty()) << "a source entry was seen in every case";
     }
-}
-
-TEST_F(ManifestScanTest, OatModulesFindTheirBaseLineFile)
-{
-    kit->AddSourceModule(u"tests/oat/with"_s, MakeModule(u"oat"_s, u"With"_s));
-    kit->AddFile(u"tests/oat/with/With.BaseLine"_s, "base");
-    kit->AddSourceModule(u"tests/oat/without"_s, MakeModule(u"oat"_s, u"Without"_s));
-    kit->AddFile(u"tests/oat/without/zzz.txt"_s, "x");
-
-    Manifest manifest = ScanKit();
-
-    EXPECT_EQ(manifest.FindTestModule(u"with"_s)->baseLineFile, kit->Path(u"tests/oat/with/With.BaseLine"_s));
-    const auto without = manifest.FindTestModule(u"without"_s);
-    EXPECT_TRUE(without->baseLineFile.isEmpty());
-    EXPECT_FALSE(without->targets.isEmpty());
 }
 
 TEST_F(ManifestScanTest, SecondaryModulesAreMovedInOnlyWhenNoModuleTakesTheirName)
