@@ -150,47 +150,38 @@ TEST(Framework, GetVariantTakesTheFirstByNameForThePlatform)
     EXPECT_TRUE(framework.GetVariant(IKestoDevice::PLATFORM_UNKNOWN).isNull());
 }
 
-TEST(Framework, IsLoadedAsksTheModuleThenTheClassDirectory)
-{
-    MockDevice device;
-    _Framework framework;
-    EXPECT_FALSE(framework.IsLoaded(&device)); // no class ID: never asks
-
-    framework.classId = 0xabc;
-    EXPECT_CALL(device, FindModule(0xabcu, _)).WillOnce(Return(0u)).WillRepeatedly(Return(1u));
-    EXPECT_TRUE(framework.IsLoaded(&device));
-
-    EXPECT_CALL(device, ListDirectory(u"fs:/~0x00000abc"_s, _))
-        .WillOnce(ListingOf({u"fs:/~0x00000abc/a.mif"_s}))
-        .WillOnce(ListingOf({}));
-    EXPECT_TRUE(framework.IsLoaded(&device));
-    EXPECT_FALSE(framework.IsLoaded(&device));
-}
-
-TEST(Framework, LoadHandsThePackagePathOverUnchangedEvenWhenEmpty)
+// IsLoaded asks the module, then the class directory; Load hands the package
+// path over unchanged, even when empty; Unload falls back to the directory
+// named after the framework.
+TEST(Framework, LoadsAndUnloadsThroughTheHandset)
 {
     MockDevice device;
     device.platform = IKestoDevice::PLATFORM_ARM;
     QMap<QString, QString> env;
     _Framework framework;
-    EXPECT_FALSE(framework.Load(&device, env));
+    framework.name = u"ctf"_s;
+    EXPECT_FALSE(framework.IsLoaded(&device)); // no class ID: never asks
+    EXPECT_FALSE(framework.Load(&device, env)); // no variant
+
+    framework.classId = 0xabc;
+    EXPECT_CALL(device, FindModule(0xabcu, _))
+        .WillOnce(Return(0u))
+        .WillOnce(Return(1u))
+        .WillOnce(Return(1u))
+        .WillOnce(DoAll(SetArgReferee<1>(u"fs:/usermods/ctfx/"_s), Return(0u)))
+        .WillOnce(Return(3u));
+    EXPECT_CALL(device, ListDirectory(u"fs:/~0x00000abc"_s, _))
+        .WillOnce(ListingOf({u"fs:/~0x00000abc/a.mif"_s}))
+        .WillOnce(ListingOf({}));
+    EXPECT_TRUE(framework.IsLoaded(&device));
+    EXPECT_TRUE(framework.IsLoaded(&device));
+    EXPECT_FALSE(framework.IsLoaded(&device));
 
     framework.variants.insert(u"a"_s, Variant(u"a"_s));
     EXPECT_CALL(device, InstallPackage(QString())).WillOnce(Return(0u)).WillOnce(Return(7u));
     EXPECT_TRUE(framework.Load(&device, env));
     EXPECT_FALSE(framework.Load(&device, env));
-}
 
-TEST(Framework, UnloadFallsBackToTheNamedDirectory)
-{
-    MockDevice device;
-    QMap<QString, QString> env;
-    _Framework framework;
-    framework.name = u"ctf"_s;
-    framework.classId = 5;
-    EXPECT_CALL(device, FindModule(5u, _))
-        .WillOnce(DoAll(SetArgReferee<1>(u"fs:/usermods/ctfx/"_s), Return(0u)))
-        .WillOnce(Return(3u));
     EXPECT_CALL(device, RemoveDirectory(u"fs:/usermods/ctfx/"_s)).WillOnce(Return(0u));
     EXPECT_CALL(device, RemoveDirectory(u"fs:/usermods/ctf"_s)).WillOnce(Return(0u));
     framework.Unload(&device, env);
@@ -233,7 +224,7 @@ protected:
 
 } // namespace
 
-TEST_F(ModuleXml, ReadsUpperCaseAttributesBeforeLowerCaseOnes)
+TEST_F(ModuleXml, ReadsUpperCaseAttributesBeforeLowerCaseOnesAndOatModuleElements)
 {
     ASSERT_TRUE(module.ProcessModuleXML(
         Write("<kit><SUITE NAME='Upper' name='lower' family='fam' SUBFAMILY='Sub' subfamily='sub'>"
@@ -254,26 +245,21 @@ TEST_F(ModuleXml, ReadsUpperCaseAttributesBeforeLowerCaseOnes)
     EXPECT_EQ(module.testCases[1].type, u"auto"_s);
     EXPECT_EQ(module.testCases[2].type, QString());
     EXPECT_TRUE(module.errorText.isEmpty());
+
+    // An oat module element with lower-case names does too.
+    RecordModule oat;
+    ASSERT_TRUE(oat.ProcessModuleXML(Write("<x><oatmodule name='Timer' family='f' subfamily='s'/></x>")));
+    EXPECT_EQ(oat.moduleName + u'/' + oat.subFamily, u"Timer/s"_s);
 }
 
-TEST_F(ModuleXml, AcceptsAnOatModuleElementWithLowerCaseNames)
-{
-    ASSERT_TRUE(module.ProcessModuleXML(Write("<x><oatmodule name='Timer' family='f' subfamily='s'/></x>")));
-    EXPECT_EQ(module.moduleName, u"Timer"_s);
-    EXPECT_EQ(module.subFamily, u"s"_s);
-}
-
-TEST_F(ModuleXml, FailsWithTheSuiteMessageWhenTheFirstElementIsNoSuite)
+TEST_F(ModuleXml, FailsWithTheSuiteOrParseMessage)
 {
     for (const QByteArray &xml : {QByteArray("<kit/>"), QByteArray("<kit><other/><suite name='x'/></kit>")}) {
         const QString path = Write(xml);
         EXPECT_FALSE(module.ProcessModuleXML(path));
         EXPECT_EQ(module.errorText, u"Error processing module xml file:"_s + path + u"\n\tSUITE node not found."_s);
     }
-}
-
-TEST_F(ModuleXml, ReportsParseErrorsWithLineAndColumn)
-{
+    // Parse errors give their line and column; a missing file no message.
     const QString path = Write("<kit>\n<suite name='x'>\n</kit>");
     EXPECT_FALSE(module.ProcessModuleXML(path));
     EXPECT_TRUE(module.errorText.startsWith(u"Error processing oat xml file:"_s + path + u"\n\t"_s));
