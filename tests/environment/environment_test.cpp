@@ -177,6 +177,12 @@ TEST_F(PlatformsTest, TestKitsDefaultToTestsBesidePlatformsRoot)
     env.Set("KESTIX_TESTSETS_ALL", other + u"/./"_s);
     ASSERT_EQ(GetTestKits(found), 1u);
     EXPECT_EQ(found[0].path, other + u"/only"_s);
+    // Only an empty root falls back beside the platforms; others are taken as written.
+    env.Set("KESTIX_PLATFORMS_ALL", u"/sdk/./platforms"_s);
+    env.Set("KESTIX_TESTSETS_ALL", u"/kits/../kits"_s);
+    EXPECT_EQ(GetTestSetsRoot(), u"/kits/../kits"_s);
+    env.Set("KESTIX_TESTSETS_ALL", QString());
+    EXPECT_EQ(GetTestSetsRoot(), u"/sdk/Tests"_s);
 }
 
 TEST_F(PlatformsTest, DefaultTestKitIsTheNamedOneExactly)
@@ -245,16 +251,6 @@ TEST(TestKitNames, TypeNames)
     EXPECT_EQ(TestKit::TypeToName(TestKit::PVS_KIT), u"Pvs Kit"_s);
     EXPECT_EQ(TestKit::TypeToName(static_cast<TestKit::KitType>(7)), u"unknown"_s);
     EXPECT_EQ(TestKit::TypeToName(static_cast<TestKit::KitType>(-1)), u"unknown"_s);
-}
-
-TEST(EnvironmentReaders, EmptyTestSetsRootFallsBackBesidePlatforms)
-{
-    testutil::EnvGuard env;
-    env.Set("KESTIX_PLATFORMS_ALL", u"/sdk/./platforms"_s);
-    env.Set("KESTIX_TESTSETS_ALL", u"/kits/../kits"_s);
-    EXPECT_EQ(GetTestSetsRoot(), u"/kits/../kits"_s);
-    env.Set("KESTIX_TESTSETS_ALL", QString());
-    EXPECT_EQ(GetTestSetsRoot(), u"/sdk/Tests"_s);
 }
 
 TEST(BreakPackageName, SplitsIntoNameVariantAndBuild)
@@ -407,12 +403,9 @@ TEST_F(TestDirectoriesTest, ResolveXmlPathSearchOrder)
     const QString work = temp.path() + u"/work"_s;
     const QString home = temp.path() + u"/home"_s;
     const QString pack = temp.path() + u"/pack"_s;
-    testutil::WriteFile(work + u"/here.xml"_s, "<a/>");
-    testutil::WriteFile(home + u"/athome.xml"_s, "<a/>");
-    testutil::WriteFile(pack + u"/device.xml"_s, "<a/>");
-    testutil::WriteFile(pack + u"/beside.xml"_s, "<a/>");
-    testutil::WriteFile(pack + u"/sub/deep.xml"_s, "<a/>");
-    testutil::WriteFile(pack + u"/flat.xml"_s, "<a/>");
+    for (const QString &file : {work + u"/here.xml"_s, home + u"/athome.xml"_s, pack + u"/device.xml"_s,
+                                pack + u"/beside.xml"_s, pack + u"/sub/deep.xml"_s, pack + u"/flat.xml"_s})
+        testutil::WriteFile(file, "<a/>");
     ASSERT_TRUE(QDir().mkpath(work + u"/folder"_s));
     env.Set("HOME", home);
     testutil::CurrentDirectory cd(work);

@@ -474,27 +474,23 @@ TEST_F(BehaviourTest, ProgramRunsItsBehaviourToTheEndAndLeavesItsLog)
     EXPECT_TRUE(FileNames(info).contains(u"fs:/usermods/ctfmod/run.log"_s));
     EXPECT_EQ(device->DeleteFile(u"fs:/usermods/ctfmod/run.log"_s), 0u);
     EXPECT_FALSE(device->FileExists(u"fs:/~0x01020304/run.log"_s));
-}
 
-TEST_F(BehaviourTest, AppletRunsItsBehaviourWithTheClassId)
-{
+    // An applet runs it with its class ID.
     ASSERT_EQ(device->StartApplet(kApplet, QString()), 0u);
     EXPECT_FALSE(device->IsAppletRunning(kApplet));
     EXPECT_TRUE(RunLog().startsWith("applet 0x0103abcd [] []"));
 }
 
-TEST_F(BehaviourTest, ModuleWithoutBehaviourStartsAndEndsAtOnce)
+TEST_F(BehaviourTest, ProgramsOfEitherProgramTypeAreFoundByTheirExactName)
 {
+    // A module without behaviour starts and ends at once.
     ModuleSpec quiet;
     quiet.directory = u"quiet"_s;
     quiet.appletIds = {0x77};
     ASSERT_EQ(device->InstallPackage(fixture.MakePackage(u"quiet.kestix"_s, quiet)), 0u);
     EXPECT_EQ(device->StartApplet(0x77, QString()), 0u);
     EXPECT_FALSE(device->IsAppletRunning(0x77));
-}
 
-TEST_F(BehaviourTest, ProgramsOfEitherProgramTypeAreFoundByTheirExactName)
-{
     ModuleSpec other;
     other.directory = u"other"_s;
     other.programs = {{u"abc"_s, QString(), 0x0102C305}, {u"Main"_s, QString()}};
