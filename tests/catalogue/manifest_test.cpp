@@ -163,7 +163,8 @@ TEST_F(ManifestScanTest, PlatformManifestWalksTestframeworksLikeAnyFolder)
     EXPECT_EQ(module->subFamily, u"ctf"_s);
 }
 
-// Families come from the description or else from the path; the first
+// Families come from the description or else from the path; broken
+// descriptions are skipped; the first
 // description of a name wins and later ones add their package targets; source
 // modules get targets and prebuilt ones do not; oat modules find their
 // baseline file.
@@ -202,6 +203,10 @@ TEST_F(ManifestScanTest, ModulesTakeTheirRecordsFromDescriptionPathAndPackages)
     kit->AddFile(u"tests/oat/with/With.BaseLine"_s, "base");
     kit->AddSourceModule(u"tests/oat/without"_s, MakeModule(u"oat"_s, u"Without"_s));
     kit->AddFile(u"tests/oat/without/zzz.txt"_s, "x");
+    // Broken and misnamed descriptions are skipped without stopping the walk.
+    kit->AddFile(u"tests/broken/ctfmodule.xml"_s, "<module><suite NAME='Broken'>");
+    kit->AddFile(u"tests/nosuite/ctfmodule.xml"_s, "<module><other NAME='NoSuite'/></module>");
+    kit->AddFile(u"tests/notes/notes.xml"_s, "<notes/>");
 
     Manifest manifest = ScanKit();
     EXPECT_EQ(
@@ -219,6 +224,7 @@ TEST_F(ManifestScanTest, ModulesTakeTheirRecordsFromDescriptionPathAndPackages)
     EXPECT_EQ(family("shallow"), u"Shallow/ctfappletmodule.xml"_s);
     EXPECT_EQ(family("top"), u"/"_s);
     EXPECT_EQ(manifest.FindTestModule(u"audio"_s)->source, u"KVK"_s);
+    EXPECT_TRUE(manifest.FindTestModule(u"socket"_s).dynamicCast<UTTestModule>());
 
     const auto dup = manifest.testModules.value(u"dup"_s);
     ASSERT_TRUE(dup.dynamicCast<CtfTestModule>());
@@ -365,19 +371,6 @@ TEST_F(ManifestScanTest, ASymbolicLinkLoopIsWalkedOnce)
     for (const auto &target : std::as_const(manifest.FindTestModule(u"helper"_s)->targets))
         EXPECT_TRUE(target->packagePath.startsWith(kit->Path(u"libs/helper/package/"_s)))
             << target->packagePath.toStdString();
-}
-
-TEST_F(ManifestScanTest, BrokenAndMisnamedInputIsSkippedWithoutStoppingTheWalk)
-{
-    kit->AddFile(u"tests/broken/ctfmodule.xml"_s, "<module><suite NAME='Broken'>");
-    kit->AddFile(u"tests/nosuite/ctfmodule.xml"_s, "<module><other NAME='NoSuite'/></module>");
-    kit->AddFile(u"tests/notes/notes.xml"_s, "<notes/>");
-    kit->AddSourceModule(u"tests/zgood"_s, MakeModule(u"uitf"_s, u"Good"_s));
-
-    Manifest manifest = ScanKit();
-
-    EXPECT_EQ(manifest.testModules.keys(), QStringList{"good"});
-    EXPECT_TRUE(manifest.FindTestModule(u"good"_s).dynamicCast<UTTestModule>());
 }
 
 TEST_F(ManifestScanTest, CurrentCacheIsReadInsteadOfScanning)
@@ -606,10 +599,13 @@ TEST_F(ManifestCacheTest, EmptyCatalogueIsNeverWritten)
     EXPECT_FALSE(QFile::exists(TempPath(u"empty.xml"_s)));
 }
 
-TEST_F(ManifestCacheTest, UnwritableDestinationAnswersFalseWithAMessage)
+TEST_F(ManifestCacheTest, WritingRecreatesAMissingCacheFolderButAnUnwritableDestinationAnswersFalse)
 {
     kit->AddSourceModule(u"tests/a"_s, MakeModule(u"ctf"_s, u"A"_s));
-    Manifest manifest = ScanKit();
+    Manifest manifest(kit->Root(), false);
+    ASSERT_TRUE(QDir(manifest.cacheDirectory).removeRecursively());
+    Scan(manifest);
+    EXPECT_TRUE(QFile::exists(manifest.cacheFile));
 
     testutil::WriteFile(TempPath(u"plainfile"_s), "x");
     const QString destination = TempPath(u"plainfile/Manifest.xml"_s);
@@ -621,15 +617,6 @@ TEST_F(ManifestCacheTest, UnwritableDestinationAnswersFalseWithAMessage)
     ASSERT_TRUE(QDir().mkpath(manifest.cacheFile));
     EXPECT_FALSE(manifest.WriteManifest(QString()));
     EXPECT_TRUE(QFileInfo(manifest.cacheFile).isDir());
-}
-
-TEST_F(ManifestCacheTest, WritingRecreatesAMissingCacheFolder)
-{
-    kit->AddSourceModule(u"tests/a"_s, MakeModule(u"ctf"_s, u"A"_s));
-    Manifest manifest(kit->Root(), false);
-    ASSERT_TRUE(QDir(manifest.cacheDirectory).removeRecursively());
-    Scan(manifest);
-    EXPECT_TRUE(QFile::exists(manifest.cacheFile));
 }
 
 class ManifestQueryTest : public ManifestFixture

@@ -376,26 +376,17 @@ TEST_F(OatScriptsTest, ExistingFolderIsNeverFilled)
 
 TEST_F(TestDirectoriesTest, GenerateProPlatformMatchesNameThenDefault)
 {
-    const QString root = temp.path() + u"/platforms"_s;
-    for (const char *name : {"Alpha Pro", "beta pro", "Gamma"})
-        ASSERT_TRUE(QDir().mkpath(root + u'/' + QString::fromUtf8(name)));
+    MakeDirs(root, {"Alpha Pro", "beta pro", "Gamma"});
     env.Set("KESTIX_PLATFORMS_ALL", root);
-
-    Platform found = TestDirectories::GenerateProPlatform(u"BETA"_s);
-    EXPECT_EQ(found.name, u"beta"_s);
-    EXPECT_EQ(found.path, root + u"/beta pro"_s);
-
+    const auto generate = [this](const QString &name) {
+        return Describe({TestDirectories::GenerateProPlatform(name)}, root);
+    };
+    EXPECT_EQ(generate(u"BETA"_s), QStringList{"beta|R/beta pro|1|0"});
     // Non-professional platforms are never chosen, and no default: empty.
-    found = TestDirectories::GenerateProPlatform(u"gamma"_s);
-    EXPECT_TRUE(found.name.isEmpty());
-    EXPECT_TRUE(found.path.isEmpty());
-    EXPECT_FALSE(found.isPro);
-
+    EXPECT_EQ(generate(u"gamma"_s), QStringList{"||0|0"});
     env.Set("KESTIX_PLATFORM", root + u"/Alpha Pro/"_s);
-    found = TestDirectories::GenerateProPlatform(u"gamma"_s);
-    EXPECT_EQ(found.name, u"Alpha"_s);
-    EXPECT_TRUE(found.isDefault);
-    EXPECT_EQ(TestDirectories::GenerateProPlatform(u"beta"_s).name, u"beta"_s);
+    EXPECT_EQ(generate(u"gamma"_s), QStringList{"Alpha|R/Alpha Pro|1|1"});
+    EXPECT_EQ(generate(u"beta"_s), QStringList{"beta|R/beta pro|1|0"});
 }
 
 TEST_F(TestDirectoriesTest, ResolveXmlPathSearchOrder)
