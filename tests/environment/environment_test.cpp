@@ -415,44 +415,23 @@ TEST_F(TestDirectoriesTest, ResolveXmlPathSearchOrder)
     EXPECT_EQ(ResolveXmlPath(QString(), reference), QString());
 }
 
-class AssociatedExecutableTest : public TestDirectoriesTest
+TEST_F(TestDirectoriesTest, AssociatedExecutableIsNamedByTheShebangThenTheSuffix)
 {
-protected:
-    void SetUp() override
-    {
-        TestDirectoriesTest::SetUp();
-        bin = temp.path() + u"/bin"_s;
-        for (const char *program : {"perl", "python3", "sh"})
-            MakeExecutable(bin + u'/' + QString::fromLatin1(program));
-        env.Set("PATH", bin);
-    }
-
-    static void MakeExecutable(const QString &path)
-    {
+    const auto executable = [](const QString &path) {
         testutil::WriteFile(path, "#!/bin/sh\nexit 0\n");
         QFile::setPermissions(path, QFile::ReadOwner | QFile::WriteOwner | QFile::ExeOwner);
-    }
-
-    QString Script(const QString &name, const QByteArray &content)
-    {
-        const QString path = temp.path() + u"/scripts/"_s + name;
-        testutil::WriteFile(path, content);
         return path;
-    }
-
-    QString bin;
-};
-
-TEST_F(AssociatedExecutableTest, ShebangThenSuffixNamesTheInterpreter)
-{
-    const QString own = temp.path() + u"/tools/interp"_s;
-    MakeExecutable(own);
-    const struct
-    {
-        const char *name;
-        QByteArray content;
-        QString found;
-    } rows[] = {
+    };
+    const auto script = [this](const QString &name, const QByteArray &content) {
+        testutil::WriteFile(temp.path() + u"/scripts/"_s + name, content);
+        return temp.path() + u"/scripts/"_s + name;
+    };
+    const QString bin = temp.path() + u"/bin"_s;
+    for (const char *program : {"perl", "python3", "sh"})
+        executable(bin + u'/' + QString::fromLatin1(program));
+    env.Set("PATH", bin);
+    const QString own = executable(temp.path() + u"/tools/interp"_s);
+    const std::tuple<const char *, QByteArray, QString> rows[] = {
         {"a", "#!/usr/bin/env perl\nprint;\n", bin + u"/perl"_s},
         {"b.txt", "#! /usr/bin/env -S python3 -u\n", bin + u"/python3"_s},
         {"c.pl", "#!/bin/sh\necho\n", u"/bin/sh"_s},
@@ -468,13 +447,13 @@ TEST_F(AssociatedExecutableTest, ShebangThenSuffixNamesTheInterpreter)
         {"noext", "", QString()},
         {"z", "#!/usr/bin/env\n", QString()},
     };
-    for (const auto &row : rows)
-        EXPECT_EQ(FindAssociatedExecutable(Script(QString::fromLatin1(row.name), row.content)), row.found) << row.name;
+    for (const auto &[name, content, found] : rows)
+        EXPECT_EQ(FindAssociatedExecutable(script(QString::fromLatin1(name), content)), found) << name;
     EXPECT_EQ(FindAssociatedExecutable(temp.path() + u"/missing.pl"_s), QString());
     EXPECT_EQ(FindAssociatedExecutable(temp.path()), QString());
     env.Set("PATH", temp.path() + u"/empty"_s);
-    EXPECT_EQ(FindAssociatedExecutable(Script(u"p.pl"_s, "print 1;\n")), QString());
-    EXPECT_EQ(FindAssociatedExecutable(Script(u"q"_s, "#!/usr/bin/env perl\n")), QString());
+    EXPECT_EQ(FindAssociatedExecutable(script(u"p.pl"_s, "print 1;\n")), QString());
+    EXPECT_EQ(FindAssociatedExecutable(script(u"q"_s, "#!/usr/bin/env perl\n")), QString());
 }
 
 class FlattenDeviceXmlTest : public EnvironmentTest
