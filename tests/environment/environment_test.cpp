@@ -69,20 +69,15 @@ QStringList Describe(const QList<Platform> &platforms, const QString &root)
     return rows;
 }
 
-TEST_F(PlatformsTest, NoPlatformsRootListsNothingAndClearsTheList)
-{
-    QList<Platform> platforms{Platform()};
-    EXPECT_EQ(GetPlatforms(platforms), 0u);
-    EXPECT_TRUE(platforms.isEmpty());
-}
-
 TEST_F(PlatformsTest, ListsSubDirectoriesByNameStrippingTheProWord)
 {
+    QList<Platform> platforms{Platform()};
+    EXPECT_EQ(GetPlatforms(platforms), 0u) << "no platforms root";
+    EXPECT_TRUE(platforms.isEmpty());
+
     MakeDirs(root, {"Product", "Foo Pro", "abc", "Pro", "My Project", "Bar PRO 2", "zed"});
     testutil::WriteFile(root + u"/notes.txt"_s, "not a platform");
     env.Set("KESTIX_PLATFORMS_ALL", root);
-
-    QList<Platform> platforms;
     ASSERT_EQ(GetPlatforms(platforms), 7u);
     EXPECT_EQ(Describe(platforms, root),
               (QStringList{
@@ -185,7 +180,7 @@ TEST_F(PlatformsTest, TestKitsDefaultToTestsBesidePlatformsRoot)
     EXPECT_EQ(GetTestSetsRoot(), u"/sdk/Tests"_s);
 }
 
-TEST_F(PlatformsTest, DefaultTestKitIsTheNamedOneExactly)
+TEST_F(PlatformsTest, DefaultTestKitIsTheNamedOneExactlyOrTheGreatestName)
 {
     env.Set("KESTIX_TESTSETS_ALL", kits);
     env.Set("KESTIX_TESTSET", kits + u"/kitB"_s);
@@ -212,17 +207,14 @@ TEST_F(PlatformsTest, DefaultTestKitIsTheNamedOneExactly)
         EXPECT_EQ(untouched.name, u"mine"_s);
         EXPECT_EQ(untouched.type, TestKit::USER_KIT);
     }
-}
 
-TEST_F(PlatformsTest, TestSetEndingInSeparatorPicksTheGreatestName)
-{
-    // Ordinal comparison: lower-case names sort after upper-case ones.
-    MakeDirs(kits, {"alpha", "Zeta", "beta"});
-    env.Set("KESTIX_TESTSETS_ALL", kits);
-    env.Set("KESTIX_TESTSET", kits + u'/');
+    // A test set ending in a separator picks the greatest name, ordinally:
+    // lower-case names sort after upper-case ones.
+    const QString more = temp.path() + u"/more"_s;
+    MakeDirs(more, {"alpha", "Zeta", "beta"});
+    env.Set("KESTIX_TESTSETS_ALL", more);
+    env.Set("KESTIX_TESTSET", more + u'/');
     EXPECT_EQ(GetDefaultTestKitName(), QString());
-
-    TestKit kit;
     ASSERT_TRUE(GetDefaultTestKit(kit));
     EXPECT_EQ(kit.name, u"beta"_s);
 
@@ -246,11 +238,10 @@ TEST(TestKitNames, DefaultTestKitNameIsTheLastComponent)
 
 TEST(TestKitNames, TypeNames)
 {
-    EXPECT_EQ(TestKit::TypeToName(TestKit::USER_KIT), u"User Kit"_s);
-    EXPECT_EQ(TestKit::TypeToName(TestKit::TEST_KIT), u"Test Kit"_s);
-    EXPECT_EQ(TestKit::TypeToName(TestKit::PVS_KIT), u"Pvs Kit"_s);
-    EXPECT_EQ(TestKit::TypeToName(static_cast<TestKit::KitType>(7)), u"unknown"_s);
-    EXPECT_EQ(TestKit::TypeToName(static_cast<TestKit::KitType>(-1)), u"unknown"_s);
+    QStringList names;
+    for (const int type : {int(TestKit::USER_KIT), int(TestKit::TEST_KIT), int(TestKit::PVS_KIT), 7, -1})
+        names << TestKit::TypeToName(static_cast<TestKit::KitType>(type));
+    EXPECT_EQ(names, (QStringList{"User Kit", "Test Kit", "Pvs Kit", "unknown", "unknown"}));
 }
 
 TEST(BreakPackageName, SplitsIntoNameVariantAndBuild)
@@ -275,7 +266,7 @@ TEST(BreakPackageName, SplitsIntoNameVariantAndBuild)
     }
 }
 
-TEST_F(TestDirectoriesTest, CacheFoldersAreCreatedButNotTheirFiles)
+TEST_F(TestDirectoriesTest, CacheAndResultsFoldersAreCreatedButNotTheirFiles)
 {
     const QString manifests = TestDirectories::GetManifestDirectory(u"#42"_s);
     EXPECT_EQ(manifests, base + u"/Norvane/TestManifests/#42"_s);
@@ -298,10 +289,8 @@ TEST_F(TestDirectoriesTest, CacheFoldersAreCreatedButNotTheirFiles)
     env.Set("XDG_DATA_HOME", xdg);
     env.Set("KESTIX_DATA_ROOT", QString());
     EXPECT_EQ(TestDirectories::GetTestDataPath(), xdg + u"/Norvane/TestDataCache"_s);
-}
+    env.Set("KESTIX_DATA_ROOT", base);
 
-TEST_F(TestDirectoriesTest, ProcessResultsPathCreatesFoldersButNotTheFile)
-{
     const QString path = TestDirectories::GetProcessResultsPath(u"phone"_s);
     const QString logs = base + u"/Norvane/Targets/phone/Logs"_s;
     EXPECT_EQ(path, logs + u"/ProcessedResults/ProcessedResults.xml"_s);
