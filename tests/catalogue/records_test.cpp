@@ -48,7 +48,7 @@ QSharedPointer<_CompilerVariant> Variant(const QString &name, IKestoDevice::Plat
 
 } // namespace
 
-TEST(CompilerVariant, ReadsFilesListInAnyCaseAndSkipsEntriesWithoutPath)
+TEST(CompilerVariant, ReadsFilesListInAnyCaseAndSkipsEntriesWithoutPathOrName)
 {
     QDomDocument document;
     const QDomElement element = Parse(document,
@@ -62,13 +62,8 @@ TEST(CompilerVariant, ReadsFilesListInAnyCaseAndSkipsEntriesWithoutPath)
     EXPECT_EQ(variant.VariantPath(), u"/b"_s);
     variant.packagePath = u"/p.kestix"_s;
     EXPECT_EQ(variant.VariantPath(), u"/p.kestix"_s);
-}
 
-TEST(CompilerVariant, WithoutNameIsRejectedButKeepsWhatWasRead)
-{
-    QDomDocument document;
-    _CompilerVariant variant;
-    variant.files << u"stale"_s;
+    // Without a name it is rejected, but keeps what was read.
     EXPECT_FALSE(variant.ReadFromXML(Parse(document, u"<v build='Release'/>"_s)));
     EXPECT_EQ(variant.build, u"Release"_s);
     EXPECT_TRUE(variant.files.isEmpty());
