@@ -546,9 +546,10 @@ QStringList Names(const QList<ConnectTarget> &targets)
     return names;
 }
 
-TEST(ConnectFactory, ListsHandsetsSortedByNameIgnoringCaseWithTheirDescriptions)
+using ConnectFactoryTest = EmulatedHandsetTest;
+
+TEST_F(ConnectFactoryTest, ListsHandsetsSortedByNameIgnoringCaseWithTheirDescriptions)
 {
-    testutil::HandsetFixture fixture;
     fixture.AddHandset(u"beta"_s);
     fixture.AddHandset(u"Alpha"_s, u"Lab phone 1"_s, u"arm"_s);
     fixture.AddHandset(u"charlie"_s, QString(), u"1"_s);
@@ -557,15 +558,13 @@ TEST(ConnectFactory, ListsHandsetsSortedByNameIgnoringCaseWithTheirDescriptions)
 
     ASSERT_TRUE(ConnectFactory::Initialize());
     QList<ConnectTarget> targets{ConnectTarget(u"left"_s, u"over"_s)};
-    EXPECT_EQ(ConnectFactory::ListTargets(targets), 3u);
-    EXPECT_EQ(Names(targets), (QStringList{u"Alpha|Lab phone 1"_s, u"beta|beta"_s, u"charlie|charlie"_s}));
+    EXPECT_EQ(ConnectFactory::ListTargets(targets), 4u);
+    EXPECT_EQ(Names(targets), (QStringList{"Alpha|Lab phone 1", "beta|beta", "charlie|charlie", "phone|phone"}));
     ConnectFactory::Uninitialize();
 }
 
-TEST(ConnectFactory, ReadsPlatformAndVersionWithDefaults)
+TEST_F(ConnectFactoryTest, ReadsPlatformAndVersionWithDefaults)
 {
-    testutil::HandsetFixture fixture;
-    const QString ini = fixture.AddHandset(u"phone"_s) + u"/handset.ini"_s;
     using P = IKestoDevice::Platform;
     const std::tuple<QByteArray, P, const char *> rows[] = {
         {"", P::PLATFORM_WIN32, ""},
@@ -574,7 +573,7 @@ TEST(ConnectFactory, ReadsPlatformAndVersionWithDefaults)
         {"platform=\nversion=\n", P::PLATFORM_WIN32, ""},
     };
     for (const auto &[text, platform, expectedVersion] : rows) {
-        testutil::WriteFile(ini, text);
+        testutil::WriteFile(folder + u"/handset.ini"_s, text);
         auto device = fixture.Connect(u"phone"_s);
         ASSERT_TRUE(device) << text.constData();
         EXPECT_EQ(device->platform, platform) << text.constData();
@@ -603,9 +602,7 @@ TEST(ConnectFactory, DefaultHandsetsFolderLiesBelowTheDataRoot)
     EXPECT_TRUE(targets.isEmpty());
 }
 
-using ConnectFactoryRefusal = EmulatedHandsetTest;
-
-TEST_F(ConnectFactoryRefusal, UnknownHandsetsAndNamesThatAreNoPlainFolderNameGiveNull)
+TEST_F(ConnectFactoryTest, UnknownOfflineAndEscapingHandsetsGiveNull)
 {
     EXPECT_EQ(ConnectFactory::ConnectToTarget(ConnectTarget(u"nokia"_s, QString()), &log), nullptr);
     EXPECT_TRUE(LogText().contains(u"Handset nokia not found"_s));
@@ -617,10 +614,8 @@ TEST_F(ConnectFactoryRefusal, UnknownHandsetsAndNamesThatAreNoPlainFolderNameGiv
     for (const char *name : {"..", ".", "", "phone/fs", "../handsets/phone"})
         EXPECT_EQ(ConnectFactory::ConnectToTarget(ConnectTarget(QString::fromUtf8(name), QString()), &log), nullptr)
             << name;
-}
 
-TEST_F(ConnectFactoryRefusal, OfflineHandsetIsListedButRefusesTheConnection)
-{
+    // An offline handset is listed but refuses the connection.
     testutil::WriteFile(fixture.HandsetFolder(u"phone"_s) + u"/offline"_s, "");
     QList<ConnectTarget> targets;
     EXPECT_EQ(ConnectFactory::ListTargets(targets), 1u);
