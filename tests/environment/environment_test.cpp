@@ -452,10 +452,7 @@ protected:
     {
         EnvironmentTest::SetUp();
         pack = temp.path() + u"/pack"_s;
-        elsewhere = temp.path() + u"/elsewhere"_s;
-        output = temp.path() + u"/out/device.dso"_s;
-        ASSERT_TRUE(QDir().mkpath(elsewhere));
-        ASSERT_TRUE(QDir().mkpath(temp.path() + u"/out"_s));
+        output = temp.path() + u"/device.dso"_s;
         env.Set("HOME", temp.path() + u"/home"_s);
     }
 
@@ -470,7 +467,7 @@ protected:
     // found beside the device pack.
     QByteArray Flatten(const QString &source)
     {
-        testutil::CurrentDirectory cd(elsewhere);
+        testutil::CurrentDirectory cd(temp.path());
         EXPECT_TRUE(FlattenDeviceXml(source, output));
         return testutil::ReadFile(output);
     }
@@ -485,7 +482,6 @@ protected:
     }
 
     QString pack;
-    QString elsewhere;
     QString output;
 };
 
