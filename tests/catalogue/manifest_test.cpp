@@ -249,33 +249,31 @@ TEST_F(ManifestScanTest, ModulesTakeTheirRecordsFromDescriptionPathAndPackages)
 // The last entry in name order that says "source" or "prebuilt" decides.
 TEST_F(ManifestScanTest, LastClassifyingEntryDecidesBetweenSourceAndPrebuilt)
 {
-    const struct
-    {
-        const char *entry;
-        bool isDirectory;
-        bool source;
-    } rows[] = {
+    // The entry, whether it is a folder, whether the module counts as source.
+    const std::tuple<const char *, bool, bool> rows[] = {
         {"src", true, true}, // "src" after "m.MOD"
         {"a.c", false, false}, // before it
         {"Include", true, false}, // "include" < "m.mod"
         {"z_inc", true, true},
     };
     for (int i = 0; i < 4; ++i) {
+        const auto &[entry, isDirectory, source] = rows[i];
         const QString folder = u"tests/m/mixed%1"_s.arg(i);
         const Module module = MakeModule(u"ctf"_s, u"Mixed%1"_s.arg(i));
         kit->AddDescription(folder, module);
         kit->AddModulePackages(folder + u"/package"_s, module);
-        if (rows[i].isDirectory)
-            kit->AddDirectory(folder + u'/' + QString::fromLatin1(rows[i].entry));
+        if (isDirectory)
+            kit->AddDirectory(folder + u'/' + QString::fromLatin1(entry));
         else
-            kit->AddFile(folder + u'/' + QString::fromLatin1(rows[i].entry), "x");
+            kit->AddFile(folder + u'/' + QString::fromLatin1(entry), "x");
         kit->AddFile(folder + u"/m.MOD"_s, "x");
     }
     Manifest manifest = ScanKit();
     for (int i = 0; i < 4; ++i) {
+        const auto &[entry, isDirectory, source] = rows[i];
         const auto found = manifest.FindTestModule(u"mixed%1"_s.arg(i));
-        ASSERT_TRUE(found) << rows[i].entry;
-        EXPECT_EQ(!found->targets.isEmpty(), rows[i].source) << rows[i].entry;
+        ASSERT_TRUE(found) << entry;
+        EXPECT_EQ(!found->targets.isEmpty(), source) << entry;
         EXPECT_FALSE(found->sourcePath.isEmpty()) << "a source entry was seen in every case";
     }
 }

@@ -50,14 +50,6 @@ protected:
 using PlatformsTest = EnvironmentTest;
 using TestDirectoriesTest = EnvironmentTest;
 
-QStringList Names(const QList<Platform> &platforms)
-{
-    QStringList names;
-    for (const Platform &platform : platforms)
-        names << platform.name;
-    return names;
-}
-
 // Each platform as "name|path|pro|default", root written as R.
 QStringList Describe(const QList<Platform> &platforms, const QString &root)
 {
@@ -121,11 +113,12 @@ TEST_F(PlatformsTest, ProAndNonProListsAppendWithoutClearing)
     QList<Platform> pro;
     EXPECT_EQ(GetProPlatforms(pro), 2u);
     EXPECT_EQ(GetProPlatforms(pro), 4u);
-    EXPECT_EQ(Names(pro), QStringList({"Foo", "Pro", "Foo", "Pro"}));
+    EXPECT_EQ(Describe(pro, root),
+              (QStringList{"Foo|R/Foo Pro|1|0", "Pro|R/Pro|1|0", "Foo|R/Foo Pro|1|0", "Pro|R/Pro|1|0"}));
 
     QList<Platform> mixed = pro.mid(0, 1);
     EXPECT_EQ(GetNonProPlatforms(mixed), 3u);
-    EXPECT_EQ(Names(mixed), QStringList({"Foo", "abc", "zed"}));
+    EXPECT_EQ(Describe(mixed, root), (QStringList{"Foo|R/Foo Pro|1|0", "abc|R/abc|0|0", "zed|R/zed|0|0"}));
 
     env.Unset("KESTIX_PLATFORMS_ALL");
     EXPECT_EQ(GetProPlatforms(mixed), 3u);

@@ -250,8 +250,7 @@ TEST_F(EmulatedHandsetTest, OfflineFileAppearingMidSessionLosesTheConnectionForG
 
     // Even when the handset comes back, this connection stays lost.
     ASSERT_TRUE(QFile::remove(folder + u"/offline"_s));
-    QString version;
-    QString directory;
+    QString version, directory;
     QSharedPointer<_DirectoryInfo> info;
     EXPECT_EQ(device->GetPlatformVersion(version), HANDSET_ERROR_CONNECTION_LOST);
     EXPECT_EQ(device->CopyFileToDevice(Work("a"), u"fs:/b"_s), HANDSET_ERROR_CONNECTION_LOST);
