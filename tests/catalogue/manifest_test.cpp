@@ -642,17 +642,15 @@ TEST_F(ManifestQueryTest, NamePatternsUseLeadingAndTrailingWildCards)
     EXPECT_EQ(manifest->GetTestModules(out, {u"net"_s}, QString(), QString()), 2u);
 }
 
-TEST_F(ManifestQueryTest, FamiliesAreMatchedByContainmentIgnoringCase)
+TEST_F(ManifestQueryTest, FamiliesAndNamesAreMatchedIgnoringCase)
 {
     EXPECT_EQ(Select({}, u"Media"_s), (QStringList{"Audio", "NetWork", "SubNetTool"}));
     EXPECT_EQ(Select({}, u"media"_s, u"PLAY"_s), QStringList{"Audio"});
     EXPECT_EQ(Select({}), (QStringList{"Audio", "EtherNet", "Net", "NetWork", "SubNetTool"}));
     // A sub-family alone filters nothing.
     EXPECT_EQ(Select({}, QString(), u"Wired"_s).size(), 5);
-}
 
-TEST_F(ManifestQueryTest, FindIgnoresCaseAndFindsSecondaryModules)
-{
+    // Finding a module by name ignores case and finds secondary modules.
     ASSERT_TRUE(manifest->FindTestModule(u"eTHERnET"_s));
     EXPECT_EQ(manifest->FindTestModule(u"ETHERNET"_s)->moduleName, u"EtherNet"_s);
     EXPECT_TRUE(manifest->FindTestModule(u"netlib"_s).dynamicCast<SecondaryModule>());
