@@ -478,17 +478,10 @@ protected:
     QString output;
 };
 
-struct FlattenCase
-{
-    const char *what;
-    std::vector<std::pair<QString, QByteArray>> includes; // written beside the pack first
-    QByteArray source;
-    QByteArray expected;
-};
-
 TEST_F(FlattenDeviceXmlTest, ExpandsIncludesAndMergesSections)
 {
-    const FlattenCase rows[] = {
+    // What, the files written beside the pack first, the pack, what it flattens to.
+    const std::tuple<const char *, std::vector<std::pair<QString, QByteArray>>, QByteArray, QByteArray> rows[] = {
         {"IncludesEntityFilesBesideThePackAndDropsTheDoctype",
          {{u"keys.xml"_s, "<?xml version=\"1.0\"?>\n<include>\n  <keys><key code=\"1\"/></keys>\n</include>\n"},
           {u"sub/extra.xml"_s, "<include><extra/><more n=\"2\"/></include>"}},
@@ -527,11 +520,11 @@ TEST_F(FlattenDeviceXmlTest, ExpandsIncludesAndMergesSections)
          "<!ENTITY gone SYSTEM \"gone.xml\">\n<!ENTITY good SYSTEM \"good.xml\">\n]>\n"
          "<pack>\n <a>&gone;</a>\n <b>x&broken;y</b>\n <good/>\n</pack>\n"},
     };
-    for (const FlattenCase &row : rows) {
-        SCOPED_TRACE(row.what);
-        for (const auto &[name, bytes] : row.includes)
+    for (const auto &[what, includes, source, expected] : rows) {
+        SCOPED_TRACE(what);
+        for (const auto &[name, bytes] : includes)
             Write(name, bytes);
-        EXPECT_EQ(Flatten(Write(u"device.xml"_s, row.source)), row.expected);
+        EXPECT_EQ(Flatten(Write(u"device.xml"_s, source)), expected);
         ExpectWellFormed();
     }
 }

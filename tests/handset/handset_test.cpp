@@ -13,7 +13,6 @@
 #include <QDirIterator>
 #include <QFile>
 #include <QFileInfo>
-#include <QTemporaryDir>
 
 #include <gtest/gtest.h>
 
@@ -346,22 +345,20 @@ TEST_F(PackageTest, PackageMadeByTheTarProgramInstalls)
     EXPECT_EQ(testutil::ReadFile(Host("fs:/usermods/ctfmod/data/table.txt")), QByteArray("rows"));
 }
 
-TEST_F(PackageTest, ModuleInformationDirectlyInUsermodsNamesNoModule)
-{
-    layout.directory.clear();
-    layout.mifName = u"loose.mif"_s;
-    ASSERT_EQ(device->InstallPackage(fixture.MakePackage(u"loose.kestix"_s, layout)), 0u);
-    QString directory;
-    EXPECT_EQ(device->FindModule(kClass, directory), HANDSET_ERROR_NOT_FOUND);
-}
-
 TEST_F(PackageTest, FirstModuleByPathWinsWhenTwoListTheSameClass)
 {
+    // Module information directly in usermods names no module.
+    ModuleSpec loose = layout;
+    loose.directory.clear();
+    loose.mifName = u"loose.mif"_s;
+    ASSERT_EQ(device->InstallPackage(fixture.MakePackage(u"loose.kestix"_s, loose)), 0u);
+    QString directory;
+    EXPECT_EQ(device->FindModule(kClass, directory), HANDSET_ERROR_NOT_FOUND);
+
     ModuleSpec other = layout;
     other.directory = u"aaa"_s;
     ASSERT_EQ(device->InstallPackage(fixture.MakePackage(u"b.kestix"_s, layout)), 0u);
     ASSERT_EQ(device->InstallPackage(fixture.MakePackage(u"a.kestix"_s, other)), 0u);
-    QString directory;
     EXPECT_EQ(device->FindModule(kClass, directory), 0u);
     EXPECT_EQ(directory, u"fs:/usermods/aaa/"_s);
 }
@@ -576,12 +573,11 @@ TEST_F(ConnectFactoryTest, ReadsPlatformAndVersionWithDefaults)
     }
 }
 
-TEST(ConnectFactory, DefaultHandsetsFolderLiesBelowTheDataRoot)
+TEST_F(ConnectFactoryTest, DefaultHandsetsFolderLiesBelowTheDataRoot)
 {
-    QTemporaryDir root;
-    testutil::EnvGuard env("KESTIX_DATA_ROOT", root.path());
+    testutil::EnvGuard env("KESTIX_DATA_ROOT", Work("data"));
     env.Unset("KESTIX_HANDSETS");
-    testutil::WriteFile(root.path() + u"/Norvane/Handsets/phone/handset.ini"_s, "");
+    testutil::WriteFile(Work("data/Norvane/Handsets/phone/handset.ini"), "");
     QList<ConnectTarget> targets;
     EXPECT_EQ(ConnectFactory::ListTargets(targets), 1u);
     EXPECT_EQ(Names(targets), QStringList{u"phone|phone"_s});
@@ -589,7 +585,7 @@ TEST(ConnectFactory, DefaultHandsetsFolderLiesBelowTheDataRoot)
     env.Set("KESTIX_HANDSETS", QString());
     EXPECT_EQ(ConnectFactory::ListTargets(targets), 1u);
 
-    env.Set("KESTIX_HANDSETS", root.filePath(u"none"_s));
+    env.Set("KESTIX_HANDSETS", Work("none"));
     EXPECT_EQ(ConnectFactory::ListTargets(targets), 0u);
     EXPECT_TRUE(targets.isEmpty());
 }
