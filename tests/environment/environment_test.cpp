@@ -318,42 +318,30 @@ TEST_F(TestDirectoriesTest, TargetNameBecomesOneFolderBelowTargets)
     }
 }
 
-class OatScriptsTest : public TestDirectoriesTest
+// The folder is filled once, from the default test set; an empty one, made
+// before the test set was named or by hand, stays empty.
+TEST_F(TestDirectoriesTest, OatPerlScriptsAreCopiedOnceAndNeverRefreshed)
 {
-protected:
-    QString Scripts() const { return base + u"/Norvane/TestDataCache/PerlScripts"_s; }
-    QString Tools() const { return temp.path() + u"/kit/testframeworks/oat/tools/bin"_s; }
-};
-
-TEST_F(OatScriptsTest, CopiesOnceAndNeverRefreshes)
-{
-    testutil::WriteFile(Tools() + u"/PostProcess3.pl"_s, "print 1;\n");
-    testutil::WriteFile(Tools() + u"/helper.pm"_s, "1;\n");
-    ASSERT_TRUE(QDir().mkpath(Tools() + u"/subdir"_s));
+    const QString tools = temp.path() + u"/kit/testframeworks/oat/tools/bin"_s;
+    QString scripts = base + u"/Norvane/TestDataCache/PerlScripts"_s;
+    EXPECT_EQ(TestDirectories::GetOatPerlScripts(), scripts);
+    testutil::WriteFile(tools + u"/PostProcess3.pl"_s, "print 1;\n");
+    testutil::WriteFile(tools + u"/helper.pm"_s, "1;\n");
+    ASSERT_TRUE(QDir().mkpath(tools + u"/subdir"_s));
     env.Set("KESTIX_TESTSET", temp.path() + u"/kit"_s);
+    EXPECT_EQ(TestDirectories::GetOatPerlScripts(), scripts);
+    EXPECT_TRUE(QDir(scripts).isEmpty());
 
-    EXPECT_EQ(TestDirectories::GetOatPerlScripts(), Scripts());
-    EXPECT_EQ(QDir(Scripts()).entryList(QDir::AllEntries | QDir::NoDotAndDotDot, QDir::Name | QDir::IgnoreCase),
+    env.Set("KESTIX_DATA_ROOT", temp.path() + u"/other"_s);
+    scripts = temp.path() + u"/other/Norvane/TestDataCache/PerlScripts"_s;
+    EXPECT_EQ(TestDirectories::GetOatPerlScripts(), scripts);
+    EXPECT_EQ(QDir(scripts).entryList(QDir::AllEntries | QDir::NoDotAndDotDot, QDir::Name | QDir::IgnoreCase),
               QStringList({"helper.pm", "PostProcess3.pl"}));
-
-    testutil::WriteFile(Tools() + u"/PostProcess3.pl"_s, "print 2;\n");
-    testutil::WriteFile(Tools() + u"/new.pl"_s, "new\n");
-    EXPECT_EQ(TestDirectories::GetOatPerlScripts(), Scripts());
-    EXPECT_EQ(testutil::ReadFile(Scripts() + u"/PostProcess3.pl"_s), QByteArray("print 1;\n"));
-    EXPECT_FALSE(QFileInfo::exists(Scripts() + u"/new.pl"_s));
-}
-
-// The folder is filled once, from the default test set; an empty one,
-// made before the test set was named or by hand, stays empty.
-TEST_F(OatScriptsTest, ExistingFolderIsNeverFilled)
-{
-    EXPECT_EQ(TestDirectories::GetOatPerlScripts(), Scripts());
-    EXPECT_TRUE(QDir(Scripts()).isEmpty());
-
-    testutil::WriteFile(Tools() + u"/PostProcess3.pl"_s, "print 1;\n");
-    env.Set("KESTIX_TESTSET", temp.path() + u"/kit"_s);
-    EXPECT_EQ(TestDirectories::GetOatPerlScripts(), Scripts());
-    EXPECT_TRUE(QDir(Scripts()).isEmpty());
+    testutil::WriteFile(tools + u"/PostProcess3.pl"_s, "print 2;\n");
+    testutil::WriteFile(tools + u"/new.pl"_s, "new\n");
+    EXPECT_EQ(TestDirectories::GetOatPerlScripts(), scripts);
+    EXPECT_EQ(testutil::ReadFile(scripts + u"/PostProcess3.pl"_s), QByteArray("print 1;\n"));
+    EXPECT_FALSE(QFileInfo::exists(scripts + u"/new.pl"_s));
 }
 
 TEST_F(TestDirectoriesTest, GenerateProPlatformMatchesNameThenDefault)
