@@ -119,29 +119,22 @@ TEST(Framework, KeepsTheLastVariantOfANameAndReadsClassId)
     EXPECT_FALSE(_Framework().ReadFromManifest(Parse(document, u"<framework/>"_s)));
 }
 
-TEST(Framework, WritesClassIdInDecimalAndPaddedHex)
+TEST(Framework, WritesClassIdInDecimalAndPaddedHexAndGivesTheFirstVariantByNameForThePlatform)
 {
     _Framework framework;
     framework.name = u"oat"_s;
     framework.classId = 16;
-    framework.variants.insert(u"z"_s, Variant(u"z"_s));
-    framework.variants.insert(u"a"_s, Variant(u"a"_s, IKestoDevice::PLATFORM_WIN32));
-    QDomDocument document;
-    QDomElement element = RootElement(document, u"framework"_s);
-    framework.WriteToManifest(element);
-    const QDomElement id = element.lastChildElement(u"classid"_s);
-    EXPECT_EQ(id.attribute(u"value"_s) + u' ' + id.attribute(u"valuehex"_s), u"16 0x00000010"_s);
-    EXPECT_EQ(element.firstChildElement().attribute(u"name"_s), u"a"_s);
-}
-
-TEST(Framework, GetVariantTakesTheFirstByNameForThePlatform)
-{
-    _Framework framework;
     framework.variants.insert(u"b"_s, Variant(u"b"_s));
     framework.variants.insert(u"a"_s, Variant(u"a"_s));
     framework.variants.insert(u"0"_s, Variant(u"0"_s, IKestoDevice::PLATFORM_WIN32));
     EXPECT_EQ(framework.GetVariant(IKestoDevice::PLATFORM_ARM)->name, u"a"_s);
     EXPECT_TRUE(framework.GetVariant(IKestoDevice::PLATFORM_UNKNOWN).isNull());
+    QDomDocument document;
+    QDomElement element = RootElement(document, u"framework"_s);
+    framework.WriteToManifest(element);
+    const QDomElement id = element.lastChildElement(u"classid"_s);
+    EXPECT_EQ(id.attribute(u"value"_s) + u' ' + id.attribute(u"valuehex"_s), u"16 0x00000010"_s);
+    EXPECT_EQ(element.firstChildElement().attribute(u"name"_s), u"0"_s);
 }
 
 // IsLoaded asks the module, then the class directory; Load hands the package

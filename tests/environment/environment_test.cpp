@@ -526,7 +526,6 @@ TEST_F(FlattenDeviceXmlTest, TextOutsideAsciiSurvivesAsCharacterReferences)
               "<pack title=\"Caf\xc3\xa9\">&names;<c><![CDATA[\xc3\xa9<\xf0\x9f\x98\x80>]]></c></pack>\n"));
     for (const char byte : flattened)
         ASSERT_LT(static_cast<unsigned char>(byte), 0x80u) << "not ASCII";
-    EXPECT_TRUE(flattened.contains("Caf&#xe9;"));
     ExpectWellFormed();
 
     QDomDocument document;
@@ -570,8 +569,8 @@ TEST_F(FlattenDeviceXmlTest, FailsWithoutWritingOnBadSourceOrDestinationAndReads
     EXPECT_FALSE(FlattenDeviceXml(good, temp.path() + u"/no/such/folder/x.dso"_s));
 
     // A device or a pipe named by an entity is never read.
-    Write(u"dev.xml"_s, "<!DOCTYPE p [<!ENTITY z SYSTEM \"/dev/zero\">]><p>&z;</p>");
-    EXPECT_TRUE(FlattenDeviceXml(pack + u"/dev.xml"_s, output));
+    EXPECT_TRUE(
+        FlattenDeviceXml(Write(u"dev.xml"_s, "<!DOCTYPE p [<!ENTITY z SYSTEM \"/dev/zero\">]><p>&z;</p>"), output));
     EXPECT_TRUE(testutil::ReadFile(output).contains("<p>&z;</p>"));
 
     // A relative source is found from the current directory.
