@@ -326,8 +326,8 @@ TEST_F(ManifestScanTest, ModuleInformationComesFromTheFirstMatchingMemberThatLoa
     // A package that is not an archive, and one cut short, are refused with
     // their reason: neither becomes a target.
     kit->AddFile(u"tests/mif/package/Mif_armgcc_Release.kestix"_s, QByteArray(700, 'x'));
-    const QString good = kit->Path(u"tests/mif/package/Mif_Win32_Debug.kestix"_s);
-    kit->AddFile(u"tests/mif/package/Mif_Win32_Release.kestix"_s, testutil::ReadFile(good).left(1500));
+    kit->AddFile(u"tests/mif/package/Mif_Win32_Release.kestix"_s,
+                 testutil::ReadFile(kit->Path(u"tests/mif/package/Mif_Win32_Debug.kestix"_s)).left(1500));
 
     Manifest manifest = ScanKit();
 
