@@ -218,7 +218,7 @@ TEST_F(PlatformsTest, DefaultTestKitIsTheNamedOneExactlyOrTheGreatestName)
     EXPECT_EQ(prefilled.name, u"beta"_s);
 }
 
-TEST(TestKitNames, DefaultTestKitNameIsTheLastComponent)
+TEST(TestKitNames, DefaultTestKitNameIsTheLastComponentAndTypesHaveNames)
 {
     testutil::EnvGuard env;
     const std::pair<const char *, const char *> cases[]
@@ -227,10 +227,7 @@ TEST(TestKitNames, DefaultTestKitNameIsTheLastComponent)
         env.Set("KESTIX_TESTSET", QString::fromUtf8(setting));
         EXPECT_EQ(GetDefaultTestKitName(), QString::fromUtf8(name)) << setting;
     }
-}
 
-TEST(TestKitNames, TypeNames)
-{
     QStringList names;
     for (const int type : {int(TestKit::USER_KIT), int(TestKit::TEST_KIT), int(TestKit::PVS_KIT), 7, -1})
         names << TestKit::TypeToName(static_cast<TestKit::KitType>(type));

@@ -385,13 +385,22 @@ TEST_F(PackageTest, HostilePackageIsRefusedAsAWholeAndLeavesNothingBehind)
     }
 }
 
-TEST_F(PackageTest, MemberLeadingThroughALinkOutOfTheHandsetRefusesThePackage)
+TEST_F(PackageTest, MemberThroughALinkOutOfTheHandsetOrAFailedWriteLeavesNothingBehind)
 {
     QDir().mkpath(Host("fs:/usermods"));
     ASSERT_TRUE(QFile::link(outside, Host("fs:/usermods/ctfmod")));
     EXPECT_EQ(device->InstallPackage(fixture.MakePackage(u"p.kestix"_s, layout)), HANDSET_ERROR_BAD_PACKAGE);
     EXPECT_EQ(Tree(outside), QStringList{u"keep.txt"_s});
     EXPECT_EQ(Tree(Fs()), (QStringList{u"usermods"_s, u"usermods/ctfmod"_s}));
+
+    // A failure to write takes back what the package wrote: "m/x" exists as a
+    // folder, so the second member cannot be written.
+    QDir().mkpath(Host("fs:/usermods/m/x/inner"));
+    const QString package
+        = fixture.MakePackage(u"p2.kestix"_s, testutil::Members{{u"new/deep/a.txt"_s, "a"}, {u"m/x"_s, "b"}});
+    EXPECT_EQ(device->InstallPackage(package), HANDSET_ERROR_IO);
+    EXPECT_EQ(Tree(Fs()),
+              (QStringList{"usermods", "usermods/ctfmod", "usermods/m", "usermods/m/x", "usermods/m/x/inner"}));
 }
 
 TEST_F(PackageTest, DamagedPackageIsRefusedWithItsReasonAndInstallsNothing)
@@ -412,16 +421,6 @@ TEST_F(PackageTest, DamagedPackageIsRefusedWithItsReasonAndInstallsNothing)
         EXPECT_TRUE(LogText().contains(u"EmulatedHandset::InstallPackage refused %1: %2\n"_s.arg(path, reason)))
             << name;
     }
-}
-
-TEST_F(PackageTest, WriteFailureTakesBackWhatThePackageWrote)
-{
-    // "m/x" exists as a folder, so the second member cannot be written.
-    QDir().mkpath(Host("fs:/usermods/m/x/inner"));
-    const QString package
-        = fixture.MakePackage(u"p.kestix"_s, testutil::Members{{u"new/deep/a.txt"_s, "a"}, {u"m/x"_s, "b"}});
-    EXPECT_EQ(device->InstallPackage(package), HANDSET_ERROR_IO);
-    EXPECT_EQ(Tree(Fs()), (QStringList{u"usermods"_s, u"usermods/m"_s, u"usermods/m/x"_s, u"usermods/m/x/inner"_s}));
 }
 
 class BehaviourTest : public PackageTest
