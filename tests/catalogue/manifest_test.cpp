@@ -55,17 +55,13 @@ protected:
         return module;
     }
 
-    // Scans the kit from scratch into manifest.
-    void Scan(Manifest &manifest)
-    {
-        ASSERT_TRUE(kit->Ok()) << kit->Errors().join(u'\n').toStdString();
-        manifest.SetLogger(&logger);
-        ASSERT_TRUE(manifest.GenerateManifest(true));
-    }
+    // Scans the kit from scratch.
     Manifest ScanKit(bool platform = false)
     {
+        EXPECT_TRUE(kit->Ok()) << kit->Errors().join(u'\n').toStdString();
         Manifest manifest(kit->Root(), platform);
-        Scan(manifest);
+        manifest.SetLogger(&logger);
+        EXPECT_TRUE(manifest.GenerateManifest(true));
         return manifest;
     }
 
@@ -576,7 +572,7 @@ TEST_F(ManifestCacheTest, EmptyCatalogueIsNeverWrittenNorOneToAnUnwritablePlace)
     // destination answers false with a message.
     kit->AddSourceModule(u"tests/a"_s, MakeModule(u"ctf"_s, u"A"_s));
     ASSERT_TRUE(QDir(manifest.cacheDirectory).removeRecursively());
-    Scan(manifest);
+    ASSERT_TRUE(manifest.GenerateManifest(true));
     EXPECT_TRUE(QFile::exists(manifest.cacheFile));
 
     testutil::WriteFile(TempPath(u"plainfile"_s), "x");
