@@ -11,6 +11,8 @@
 
 #include <gtest/gtest.h>
 
+using namespace Qt::StringLiterals;
+
 namespace {
 
 class DemoInit : public ::testing::Test
@@ -19,8 +21,8 @@ protected:
     void SetUp() override
     {
         ASSERT_TRUE(dir.isValid());
-        root = dir.filePath(QStringLiteral("demo with blanks"));
-        const ToolResult r = RunTool({QStringLiteral("demo"), QStringLiteral("init"), root});
+        root = dir.filePath(u"demo with blanks"_s);
+        const ToolResult r = RunTool({u"demo"_s, u"init"_s, root});
         ASSERT_EQ(r.status, 0) << r.err.constData();
         env = QString::fromUtf8(r.out);
     }
@@ -31,28 +33,27 @@ protected:
 
 TEST_F(DemoInit, PrintsTheVariablesThatPointAtIt)
 {
-    EXPECT_TRUE(env.contains(QStringLiteral("export KESTIX_TESTSET='%1/kits/DemoKit'\n").arg(root)))
-        << env.toStdString();
-    EXPECT_TRUE(env.contains(QStringLiteral("export KESTIX_PLATFORM='%1/platforms/Kesto5 Pro/'\n").arg(root)));
-    EXPECT_EQ(testutil::ReadFile(root + QStringLiteral("/env.sh")), env.toUtf8());
+    EXPECT_TRUE(env.contains(u"export KESTIX_TESTSET='%1/kits/DemoKit'\n"_s.arg(root))) << env.toStdString();
+    EXPECT_TRUE(env.contains(u"export KESTIX_PLATFORM='%1/platforms/Kesto5 Pro/'\n"_s.arg(root)));
+    EXPECT_EQ(testutil::ReadFile(root + u"/env.sh"_s), env.toUtf8());
     // A second init into the same folder is refused rather than mixed in;
     // an empty folder is taken.
-    EXPECT_EQ(RunTool({QStringLiteral("demo"), QStringLiteral("init"), root}).status, 2);
-    const QString empty = root + QStringLiteral("-empty");
+    EXPECT_EQ(RunTool({u"demo"_s, u"init"_s, root}).status, 2);
+    const QString empty = root + u"-empty"_s;
     ASSERT_TRUE(QDir().mkpath(empty));
-    EXPECT_EQ(RunTool({QStringLiteral("demo"), QStringLiteral("init"), empty}).status, 0);
+    EXPECT_EQ(RunTool({u"demo"_s, u"init"_s, empty}).status, 0);
 }
 
 TEST_F(DemoInit, PackagesAreTarArchivesWithReadableModuleInformation)
 {
     int packages = 0;
-    QDirIterator it(root, {QStringLiteral("*.kestix")}, QDir::Files, QDirIterator::Subdirectories);
+    QDirIterator it(root, {u"*.kestix"_s}, QDir::Files, QDirIterator::Subdirectories);
     while (it.hasNext()) {
         const QString path = it.next();
         ++packages;
-        if (testutil::HaveProgram(QStringLiteral("tar"))) {
+        if (testutil::HaveProgram(u"tar"_s)) {
             QByteArray listing;
-            EXPECT_EQ(testutil::RunProgram(QStringLiteral("tar"), {QStringLiteral("-tf"), path}, &listing), 0)
+            EXPECT_EQ(testutil::RunProgram(u"tar"_s, {u"-tf"_s, path}, &listing), 0)
                 << path.toStdString() << listing.constData();
         }
         Tar tar;
@@ -60,7 +61,7 @@ TEST_F(DemoInit, PackagesAreTarArchivesWithReadableModuleInformation)
         bool haveMif = false;
         for (unsigned int i = 0; i < tar.EntryCount(); ++i) {
             TarFileEntry entry = tar.Entry(i);
-            if (!entry.name.endsWith(QLatin1String(".mif")))
+            if (!entry.name.endsWith(u".mif"_s))
                 continue;
             KestoResources mif;
             ASSERT_TRUE(mif.LoadFrom(tar.EntryData(entry))) << entry.name.toStdString();
@@ -80,30 +81,27 @@ TEST_F(DemoInit, PackagesAreTarArchivesWithReadableModuleInformation)
 
 TEST_F(DemoInit, ScriptsAreValidShellAndPerlAndDescriptionsValidXml)
 {
-    if (testutil::HaveProgram(QStringLiteral("xmllint"))) {
+    if (testutil::HaveProgram(u"xmllint"_s)) {
         int descriptions = 0;
-        QDirIterator xml(root, {QStringLiteral("*module.xml")}, QDir::Files, QDirIterator::Subdirectories);
+        QDirIterator xml(root, {u"*module.xml"_s}, QDir::Files, QDirIterator::Subdirectories);
         while (xml.hasNext()) {
             QByteArray out;
             ++descriptions;
-            EXPECT_EQ(testutil::RunProgram(QStringLiteral("xmllint"), {QStringLiteral("--noout"), xml.next()}, &out), 0)
-                << out.constData();
+            EXPECT_EQ(testutil::RunProgram(u"xmllint"_s, {u"--noout"_s, xml.next()}, &out), 0) << out.constData();
         }
         EXPECT_EQ(descriptions, 6);
     }
-    QDirIterator it(root, {QStringLiteral("*.exe")}, QDir::Files, QDirIterator::Subdirectories);
+    QDirIterator it(root, {u"*.exe"_s}, QDir::Files, QDirIterator::Subdirectories);
     while (it.hasNext()) {
         const QString path = it.next();
         QByteArray out;
-        EXPECT_EQ(testutil::RunProgram(QStringLiteral("sh"), {QStringLiteral("-n"), path}, &out), 0) << out.constData();
+        EXPECT_EQ(testutil::RunProgram(u"sh"_s, {u"-n"_s, path}, &out), 0) << out.constData();
     }
-    if (testutil::HaveProgram(QStringLiteral("perl"))) {
+    if (testutil::HaveProgram(u"perl"_s)) {
         QByteArray out;
         EXPECT_EQ(
-            testutil::RunProgram(QStringLiteral("perl"),
-                                 {QStringLiteral("-c"),
-                                  root + QStringLiteral("/kits/DemoKit/testframeworks/oat/tools/bin/PostProcess3.pl")},
-                                 &out),
+            testutil::RunProgram(
+                u"perl"_s, {u"-c"_s, root + u"/kits/DemoKit/testframeworks/oat/tools/bin/PostProcess3.pl"_s}, &out),
             0)
             << out.constData();
     }
@@ -111,35 +109,31 @@ TEST_F(DemoInit, ScriptsAreValidShellAndPerlAndDescriptionsValidXml)
 
 TEST_F(DemoInit, StandInCompilersProduceRealResourceFiles)
 {
-    const QString tools = root + QStringLiteral("/toolset/bin");
-    const QString car = dir.filePath(QStringLiteral("demo.car"));
-    const QString kar = dir.filePath(QStringLiteral("demo.kar"));
-    const QString dso = dir.filePath(QStringLiteral("device.kar"));
+    const QString tools = root + u"/toolset/bin"_s;
+    const QString car = dir.filePath(u"demo.car"_s);
+    const QString kar = dir.filePath(u"demo.kar"_s);
+    const QString dso = dir.filePath(u"device.kar"_s);
     QByteArray out;
-    ASSERT_EQ(testutil::RunProgram(tools + QStringLiteral("/kestormc.exe"),
-                                   {QStringLiteral("-convert"), QStringLiteral("-infile"),
-                                    root + QStringLiteral("/testdata/demo.ksx"), QStringLiteral("-outfile"), car},
+    ASSERT_EQ(testutil::RunProgram(tools + u"/kestormc.exe"_s,
+                                   {u"-convert"_s, u"-infile"_s, root + u"/testdata/demo.ksx"_s, u"-outfile"_s, car},
                                    &out),
               0);
     EXPECT_TRUE(out.contains("Successfully converted file")) << out.constData();
-    ASSERT_EQ(testutil::RunProgram(
-                  tools + QStringLiteral("/kestormc.exe"),
-                  {QStringLiteral("-compile"), QStringLiteral("-infile"), car, QStringLiteral("-outfile"), kar}, &out),
-              0);
+    ASSERT_EQ(
+        testutil::RunProgram(tools + u"/kestormc.exe"_s, {u"-compile"_s, u"-infile"_s, car, u"-outfile"_s, kar}, &out),
+        0);
     EXPECT_TRUE(out.contains("Successfully compiled")) << out.constData();
     KestoResources data;
     ASSERT_TRUE(data.Read(kar));
     quint16 format = 0;
     QString text;
     ASSERT_TRUE(data.GetString(KestoResources::kTypeStrings, 2, &format, text));
-    EXPECT_EQ(text, QStringLiteral("\u30c6\u30b9\u30c8"));
+    EXPECT_EQ(text, u"\u30c6\u30b9\u30c8"_s);
 
     ASSERT_EQ(testutil::RunProgram(
-                  tools + QStringLiteral("/deprecated/ResourceEditor/kestorc.exe"),
-                  {QStringLiteral("-nh"), QStringLiteral("-o"), dso,
-                   root
-                       + QStringLiteral(
-                           "/platforms/Kesto5 Pro/pvs/platform/testframeworks/oat/tools/reference/deviceref.dso")},
+                  tools + u"/deprecated/ResourceEditor/kestorc.exe"_s,
+                  {u"-nh"_s, u"-o"_s, dso,
+                   root + u"/platforms/Kesto5 Pro/pvs/platform/testframeworks/oat/tools/reference/deviceref.dso"_s},
                   &out),
               0)
         << out.constData();

@@ -33,27 +33,27 @@ protected:
     void SetUp() override
     {
         ASSERT_TRUE(dir.isValid());
-        root = dir.filePath(QStringLiteral("demo"));
-        const ToolResult init = RunTool({QStringLiteral("demo"), QStringLiteral("init"), root});
+        root = dir.filePath(u"demo"_s);
+        const ToolResult init = RunTool({u"demo"_s, u"init"_s, root});
         ASSERT_EQ(init.status, 0) << init.err.constData();
         env = QProcessEnvironment::systemEnvironment();
-        static const QRegularExpression line(QStringLiteral("^export (\\w+)='(.*)'$"));
-        for (const QString &text : QString::fromUtf8(init.out).split(QLatin1Char('\n'), Qt::SkipEmptyParts)) {
+        static const QRegularExpression line(u"^export (\\w+)='(.*)'$"_s);
+        for (const QString &text : QString::fromUtf8(init.out).split(u'\n', Qt::SkipEmptyParts)) {
             const QRegularExpressionMatch m = line.match(text);
             ASSERT_TRUE(m.hasMatch()) << text.toStdString();
             env.insert(m.captured(1), m.captured(2));
         }
-        env.insert(QStringLiteral("KESTIX_TIME_SCALE"), QStringLiteral("0"));
-        handsets = env.value(QStringLiteral("KESTIX_HANDSETS"));
-        targets = root + QStringLiteral("/data/Norvane/Targets");
-        results = targets + QStringLiteral("/demo-phone/Logs/ProcessedResults/ProcessedResults.xml");
-        testData = root + QStringLiteral("/testdata/demo.ksx");
+        env.insert(u"KESTIX_TIME_SCALE"_s, u"0"_s);
+        handsets = env.value(u"KESTIX_HANDSETS"_s);
+        targets = root + u"/data/Norvane/Targets"_s;
+        results = targets + u"/demo-phone/Logs/ProcessedResults/ProcessedResults.xml"_s;
+        testData = root + u"/testdata/demo.ksx"_s;
     }
 
     QStringList WithLog(QStringList arguments) const
     {
-        arguments.insert(1, QStringLiteral("--log"));
-        arguments.insert(2, dir.filePath(QStringLiteral("harness.log")));
+        arguments.insert(1, u"--log"_s);
+        arguments.insert(2, dir.filePath(u"harness.log"_s));
         return arguments;
     }
 
@@ -62,13 +62,13 @@ protected:
     // Handsets beside the demo's own, with its settings plus extra lines.
     void AddHandset(const QString &name, const QByteArray &extra = QByteArray())
     {
-        ASSERT_TRUE(QDir().mkpath(handsets + QLatin1Char('/') + name + QStringLiteral("/fs")));
-        testutil::WriteFile(handsets + QLatin1Char('/') + name + QStringLiteral("/handset.ini"),
-                            testutil::ReadFile(handsets + QStringLiteral("/demo-phone/handset.ini")) + extra);
+        ASSERT_TRUE(QDir().mkpath(handsets + u'/' + name + u"/fs"_s));
+        testutil::WriteFile(handsets + u'/' + name + u"/handset.ini"_s,
+                            testutil::ReadFile(handsets + u"/demo-phone/handset.ini"_s) + extra);
     }
     void AddToIni(const QString &name, const QByteArray &extra)
     {
-        const QString ini = handsets + QLatin1Char('/') + name + QStringLiteral("/handset.ini");
+        const QString ini = handsets + u'/' + name + u"/handset.ini"_s;
         testutil::WriteFile(ini, testutil::ReadFile(ini) + extra);
     }
 
@@ -76,14 +76,13 @@ protected:
     static QMap<QString, QString> Rows(const QByteArray &out)
     {
         QMap<QString, QString> rows;
-        static const QRegularExpression row(
-            QStringLiteral("^(\\w+)\\s+([\\w-]*)\\s+(\\d+)\\s+(\\d+)\\s+(\\d+)\\s+(\\d+)$"));
-        for (const QString &text : QString::fromUtf8(out).split(QLatin1Char('\n'))) {
+        static const QRegularExpression row(u"^(\\w+)\\s+([\\w-]*)\\s+(\\d+)\\s+(\\d+)\\s+(\\d+)\\s+(\\d+)$"_s);
+        for (const QString &text : QString::fromUtf8(out).split(u'\n')) {
             const QRegularExpressionMatch m = row.match(text);
             if (m.hasMatch())
                 rows.insert(m.captured(1),
                             QStringList{m.captured(2), m.captured(3), m.captured(4), m.captured(5), m.captured(6)}
-                                .join(QLatin1Char(' '))
+                                .join(u' ')
                                 .trimmed());
         }
         return rows;
@@ -92,12 +91,11 @@ protected:
     // The JUnit file is valid against the schema CI servers read.
     static void ExpectValidJUnit(const QString &path)
     {
-        if (!testutil::HaveProgram(QStringLiteral("xmllint")))
+        if (!testutil::HaveProgram(u"xmllint"_s))
             return;
         QByteArray lint;
-        EXPECT_EQ(testutil::RunProgram(QStringLiteral("xmllint"),
-                                       {QStringLiteral("--noout"), QStringLiteral("--schema"),
-                                        testutil::DataPath(QStringLiteral("junit/junit.xsd")), path},
+        EXPECT_EQ(testutil::RunProgram(u"xmllint"_s,
+                                       {u"--noout"_s, u"--schema"_s, testutil::DataPath(u"junit/junit.xsd"_s), path},
                                        &lint),
                   0)
             << lint.constData();
@@ -113,9 +111,9 @@ protected:
     // What is left installed on a handset besides the framework folder.
     QStringList Installed(const QString &handset) const
     {
-        QStringList left = QDir(handsets + QLatin1Char('/') + handset + QStringLiteral("/fs/usermods"))
-                               .entryList(QDir::AllEntries | QDir::NoDotAndDotDot);
-        left.removeAll(QStringLiteral("CTF"));
+        QStringList left
+            = QDir(handsets + u'/' + handset + u"/fs/usermods"_s).entryList(QDir::AllEntries | QDir::NoDotAndDotDot);
+        left.removeAll(u"CTF"_s);
         return left;
     }
 
@@ -130,91 +128,81 @@ protected:
 
 TEST_F(DemoRun, ReportsEveryModuleOfThisRunWithItsHandsetTimesAndLogs)
 {
-    const QString junit = dir.filePath(QStringLiteral("junit.xml"));
-    const QString json = dir.filePath(QStringLiteral("summary.json"));
-    const ToolResult r = Tool({QStringLiteral("run"), QStringLiteral("--test-data"), testData,
-                               QStringLiteral("--junit"), junit, QStringLiteral("--json"), json});
+    const QString junit = dir.filePath(u"junit.xml"_s);
+    const QString json = dir.filePath(u"summary.json"_s);
+    const ToolResult r = Tool({u"run"_s, u"--test-data"_s, testData, u"--junit"_s, junit, u"--json"_s, json});
     EXPECT_EQ(r.status, 1) << r.err.constData(); // some demo test cases fail on purpose
     const QMap<QString, QString> rows = Rows(r.out);
-    EXPECT_EQ(rows.value(QStringLiteral("ITimer")), QStringLiteral("demo-phone 3 1 1 0")) << r.out.constData();
-    EXPECT_EQ(rows.value(QStringLiteral("IClock")), QStringLiteral("demo-phone 3 0 0 0"));
-    EXPECT_EQ(rows.value(QStringLiteral("Widgets")), QStringLiteral("demo-phone 2 1 0 0"));
-    EXPECT_EQ(rows.value(QStringLiteral("OatAudio")), QStringLiteral("demo-phone 2 1 1 0"));
-    EXPECT_EQ(rows.value(QStringLiteral("Sockets")), QStringLiteral("demo-phone 2 1 1 0"));
-    EXPECT_EQ(rows.value(QStringLiteral("PlatformVersion")), QStringLiteral("demo-phone 2 0 0 0"));
+    EXPECT_EQ(rows.value(u"ITimer"_s), u"demo-phone 3 1 1 0"_s) << r.out.constData();
+    EXPECT_EQ(rows.value(u"IClock"_s), u"demo-phone 3 0 0 0"_s);
+    EXPECT_EQ(rows.value(u"Widgets"_s), u"demo-phone 2 1 0 0"_s);
+    EXPECT_EQ(rows.value(u"OatAudio"_s), u"demo-phone 2 1 1 0"_s);
+    EXPECT_EQ(rows.value(u"Sockets"_s), u"demo-phone 2 1 1 0"_s);
+    EXPECT_EQ(rows.value(u"PlatformVersion"_s), u"demo-phone 2 0 0 0"_s);
     EXPECT_TRUE(r.out.contains("Total (6 modules)"));
     EXPECT_TRUE(QFile::exists(results));
 
     ExpectValidJUnit(junit);
     const QDomElement suites = ReadXml(junit);
-    EXPECT_EQ(suites.attribute(QStringLiteral("failures")), QStringLiteral("4"));
-    EXPECT_EQ(suites.attribute(QStringLiteral("errors")), QStringLiteral("0"));
-    const QDomElement timer = suites.elementsByTagName(QStringLiteral("testsuite")).at(1).toElement();
-    EXPECT_EQ(timer.attribute(QStringLiteral("name")), QStringLiteral("ITimer"));
-    EXPECT_EQ(timer.attribute(QStringLiteral("hostname")), QStringLiteral("demo-phone"));
-    EXPECT_FALSE(timer.attribute(QStringLiteral("timestamp")).isEmpty());
-    const QString message
-        = timer.elementsByTagName(QStringLiteral("failure")).at(0).toElement().attribute(QStringLiteral("message"));
-    EXPECT_TRUE(message.contains(QLatin1String("Test: Expiry / Result: FAIL"))) << message.toStdString();
-    EXPECT_TRUE(message.contains(QLatin1String("/Logs/ITimer-"))) << message.toStdString();
+    EXPECT_EQ(suites.attribute(u"failures"_s), u"4"_s);
+    EXPECT_EQ(suites.attribute(u"errors"_s), u"0"_s);
+    const QDomElement timer = suites.elementsByTagName(u"testsuite"_s).at(1).toElement();
+    EXPECT_EQ(timer.attribute(u"name"_s), u"ITimer"_s);
+    EXPECT_EQ(timer.attribute(u"hostname"_s), u"demo-phone"_s);
+    EXPECT_FALSE(timer.attribute(u"timestamp"_s).isEmpty());
+    const QString message = timer.elementsByTagName(u"failure"_s).at(0).toElement().attribute(u"message"_s);
+    EXPECT_TRUE(message.contains(u"Test: Expiry / Result: FAIL"_s)) << message.toStdString();
+    EXPECT_TRUE(message.contains(u"/Logs/ITimer-"_s)) << message.toStdString();
     // The unit test log gives each test case's time.
-    const QDomElement sockets = suites.elementsByTagName(QStringLiteral("testsuite")).at(5).toElement();
-    EXPECT_EQ(sockets.firstChildElement(QStringLiteral("testcase")).attribute(QStringLiteral("time")),
-              QStringLiteral("0.007"));
+    const QDomElement sockets = suites.elementsByTagName(u"testsuite"_s).at(5).toElement();
+    EXPECT_EQ(sockets.firstChildElement(u"testcase"_s).attribute(u"time"_s), u"0.007"_s);
 
     const QJsonObject summary = QJsonDocument::fromJson(testutil::ReadFile(json)).object();
-    EXPECT_FALSE(summary.value(QStringLiteral("start")).toString().isEmpty());
-    EXPECT_EQ(summary.value(QStringLiteral("handsets")).toArray().at(0).toString(), QStringLiteral("demo-phone"));
-    const QJsonObject first = summary.value(QStringLiteral("modules")).toArray().at(0).toObject();
-    EXPECT_TRUE(QFile::exists(first.value(QStringLiteral("logs")).toArray().at(0).toString()));
-    EXPECT_GE(first.value(QStringLiteral("durationMs")).toInteger(-1), 0);
+    EXPECT_FALSE(summary.value(u"start"_s).toString().isEmpty());
+    EXPECT_EQ(summary.value(u"handsets"_s).toArray().at(0).toString(), u"demo-phone"_s);
+    const QJsonObject first = summary.value(u"modules"_s).toArray().at(0).toObject();
+    EXPECT_TRUE(QFile::exists(first.value(u"logs"_s).toArray().at(0).toString()));
+    EXPECT_GE(first.value(u"durationMs"_s).toInteger(-1), 0);
 
     // "-" is standard output, and the summary then goes to standard error.
-    const ToolResult toOutput
-        = Tool({QStringLiteral("run"), QStringLiteral("IClock"), QStringLiteral("--json"), QStringLiteral("-")});
+    const ToolResult toOutput = Tool({u"run"_s, u"IClock"_s, u"--json"_s, u"-"_s});
     EXPECT_EQ(toOutput.status, 0) << toOutput.err.constData();
-    EXPECT_EQ(QJsonDocument::fromJson(toOutput.out)
-                  .object()
-                  .value(QStringLiteral("totals"))
-                  .toObject()
-                  .value(QStringLiteral("passed"))
-                  .toInt(),
+    EXPECT_EQ(QJsonDocument::fromJson(toOutput.out).object().value(u"totals"_s).toObject().value(u"passed"_s).toInt(),
               3)
         << toOutput.out.constData();
-    EXPECT_FALSE(QFile::exists(dir.filePath(QStringLiteral("-"))));
+    EXPECT_FALSE(QFile::exists(dir.filePath(u"-"_s)));
 }
 
 TEST_F(DemoRun, AHandsetLostMidRunReportsErrorsNotAnEarlierRunsVerdicts)
 {
-    ASSERT_EQ(Tool({QStringLiteral("run")}).status, 1); // a history where every module ran
-    AddToIni(QStringLiteral("demo-phone"), "offlineAfter=12\n");
-    const QString junit = dir.filePath(QStringLiteral("junit.xml"));
-    const ToolResult lost = Tool({QStringLiteral("run"), QStringLiteral("--junit"), junit});
+    ASSERT_EQ(Tool({u"run"_s}).status, 1); // a history where every module ran
+    AddToIni(u"demo-phone"_s, "offlineAfter=12\n");
+    const QString junit = dir.filePath(u"junit.xml"_s);
+    const ToolResult lost = Tool({u"run"_s, u"--junit"_s, junit});
     EXPECT_EQ(lost.status, 1) << lost.err.constData();
     const QMap<QString, QString> rows = Rows(lost.out);
     EXPECT_EQ(rows.size(), 6) << lost.out.constData();
-    EXPECT_EQ(rows.value(QStringLiteral("PlatformVersion")), QStringLiteral("0 0 0 2")) << lost.out.constData();
+    EXPECT_EQ(rows.value(u"PlatformVersion"_s), u"0 0 0 2"_s) << lost.out.constData();
     EXPECT_TRUE(lost.out.contains("Not finished: IClock on demo-phone: handset lost")) << lost.out.constData();
     EXPECT_TRUE(lost.out.contains("Not finished: Sockets: not run: every handset was lost"));
     ExpectValidJUnit(junit);
     const QDomElement suites = ReadXml(junit);
-    EXPECT_EQ(suites.attribute(QStringLiteral("errors")), QStringLiteral("21"));
-    EXPECT_EQ(suites.elementsByTagName(QStringLiteral("skipped")).size(), 0);
-    EXPECT_EQ(suites.elementsByTagName(QStringLiteral("error")).at(0).toElement().attribute(QStringLiteral("message")),
-              QStringLiteral("handset lost"));
+    EXPECT_EQ(suites.attribute(u"errors"_s), u"21"_s);
+    EXPECT_EQ(suites.elementsByTagName(u"skipped"_s).size(), 0);
+    EXPECT_EQ(suites.elementsByTagName(u"error"_s).at(0).toElement().attribute(u"message"_s), u"handset lost"_s);
 }
 
 TEST_F(DemoRun, AnInterruptedRunEndsTheModuleInHandAndReportsTheRest)
 {
-    const QString junit = dir.filePath(QStringLiteral("junit.xml"));
-    env.insert(QStringLiteral("KESTIX_TIME_SCALE"), QStringLiteral("0.2")); // time to stop it mid-run
+    const QString junit = dir.filePath(u"junit.xml"_s);
+    env.insert(u"KESTIX_TIME_SCALE"_s, u"0.2"_s); // time to stop it mid-run
     for (const int stops : {1, 2}) {
         SCOPED_TRACE(stops);
         QProcess tool;
         tool.setProcessEnvironment(env);
         tool.setWorkingDirectory(dir.path());
         tool.start(QStringLiteral(HARNESS_BINARY_DIR "/harness"),
-                   WithLog({QStringLiteral("run"), QStringLiteral("--verbose"), QStringLiteral("--junit"), junit}));
+                   WithLog({u"run"_s, u"--verbose"_s, u"--junit"_s, junit}));
         tool.setReadChannel(QProcess::StandardError);
         ASSERT_TRUE(tool.waitForStarted());
         // Stop as soon as the first module is under way.
@@ -244,31 +232,29 @@ TEST_F(DemoRun, AnInterruptedRunEndsTheModuleInHandAndReportsTheRest)
             continue;
         }
         EXPECT_TRUE(out.contains("interrupted before it ran")) << out.constData() << err.constData();
-        EXPECT_TRUE(
-            QString::fromUtf8(out).contains(QRegularExpression(QStringLiteral("\nIClock +demo-phone +3 +0 +0 +0\n"))));
-        EXPECT_EQ(Installed(QStringLiteral("demo-phone")), QStringList());
+        EXPECT_TRUE(QString::fromUtf8(out).contains(QRegularExpression(u"\nIClock +demo-phone +3 +0 +0 +0\n"_s)));
+        EXPECT_EQ(Installed(u"demo-phone"_s), QStringList());
         ExpectValidJUnit(junit);
-        EXPECT_GT(ReadXml(junit).attribute(QStringLiteral("errors")).toInt(), 0);
+        EXPECT_GT(ReadXml(junit).attribute(u"errors"_s).toInt(), 0);
         QFile::remove(junit);
     }
 }
 
 TEST_F(DemoRun, OneRunAtATimeOnAHandsetUnlessAskedToWait)
 {
-    QLockFile held(targets + QStringLiteral("/demo-phone/run.lock"));
-    ASSERT_TRUE(QDir().mkpath(targets + QStringLiteral("/demo-phone")));
+    QLockFile held(targets + u"/demo-phone/run.lock"_s);
+    ASSERT_TRUE(QDir().mkpath(targets + u"/demo-phone"_s));
     ASSERT_TRUE(held.tryLock(0));
-    const ToolResult busy = Tool({QStringLiteral("run"), QStringLiteral("IClock")});
+    const ToolResult busy = Tool({u"run"_s, u"IClock"_s});
     EXPECT_EQ(busy.status, 2);
     EXPECT_TRUE(busy.err.contains(
-        QStringLiteral("handset demo-phone is in use by process %1").arg(QCoreApplication::applicationPid()).toUtf8()))
+        u"handset demo-phone is in use by process %1"_s.arg(QCoreApplication::applicationPid()).toUtf8()))
         << busy.err.constData();
     EXPECT_FALSE(busy.out.contains("Total"));
 
     QProcess waiting;
     waiting.setProcessEnvironment(env);
-    waiting.start(QStringLiteral(HARNESS_BINARY_DIR "/harness"),
-                  WithLog({QStringLiteral("run"), QStringLiteral("--wait"), QStringLiteral("IClock")}));
+    waiting.start(QStringLiteral(HARNESS_BINARY_DIR "/harness"), WithLog({u"run"_s, u"--wait"_s, u"IClock"_s}));
     waiting.setReadChannel(QProcess::StandardError);
     ASSERT_TRUE(waiting.waitForStarted());
     QByteArray err;
@@ -283,49 +269,44 @@ TEST_F(DemoRun, OneRunAtATimeOnAHandsetUnlessAskedToWait)
 
 TEST_F(DemoRun, TheNamedHandsetIsTheOneUsed)
 {
-    AddHandset(QStringLiteral("demo-phone2"));
-    const ToolResult exact = Tool(
-        {QStringLiteral("run"), QStringLiteral("--target"), QStringLiteral("demo-phone"), QStringLiteral("IClock")});
+    AddHandset(u"demo-phone2"_s);
+    const ToolResult exact = Tool({u"run"_s, u"--target"_s, u"demo-phone"_s, u"IClock"_s});
     EXPECT_EQ(exact.status, 0) << exact.err.constData();
-    EXPECT_EQ(Rows(exact.out).value(QStringLiteral("IClock")), QStringLiteral("demo-phone 3 0 0 0"));
+    EXPECT_EQ(Rows(exact.out).value(u"IClock"_s), u"demo-phone 3 0 0 0"_s);
 
-    const ToolResult several
-        = Tool({QStringLiteral("run"), QStringLiteral("--target"), QStringLiteral("phone"), QStringLiteral("IClock")});
+    const ToolResult several = Tool({u"run"_s, u"--target"_s, u"phone"_s, u"IClock"_s});
     EXPECT_EQ(several.status, 2);
     EXPECT_TRUE(several.err.contains("'phone' matches several handsets: demo-phone, demo-phone2"))
         << several.err.constData();
 
-    testutil::WriteFile(handsets + QStringLiteral("/demo-phone/offline"), "");
-    const ToolResult offline = Tool(
-        {QStringLiteral("run"), QStringLiteral("--target"), QStringLiteral("demo-phone"), QStringLiteral("IClock")});
+    testutil::WriteFile(handsets + u"/demo-phone/offline"_s, "");
+    const ToolResult offline = Tool({u"run"_s, u"--target"_s, u"demo-phone"_s, u"IClock"_s});
     EXPECT_EQ(offline.status, 2);
     EXPECT_TRUE(offline.err.contains("handset demo-phone is offline")) << offline.err.constData();
-    EXPECT_FALSE(
-        QFileInfo::exists(targets + QStringLiteral("/demo-phone2/Logs/ProcessedResults/ProcessedResults.xml")));
+    EXPECT_FALSE(QFileInfo::exists(targets + u"/demo-phone2/Logs/ProcessedResults/ProcessedResults.xml"_s));
 }
 
 TEST_F(DemoRun, AnUnreadableHistoryIsSaidOutLoud)
 {
-    ASSERT_EQ(Tool({QStringLiteral("run"), QStringLiteral("IClock")}).status, 0);
+    ASSERT_EQ(Tool({u"run"_s, u"IClock"_s}).status, 0);
     testutil::WriteFile(results, testutil::ReadFile(results).left(60));
-    const ToolResult retry = Tool({QStringLiteral("run"), QStringLiteral("--retry")});
+    const ToolResult retry = Tool({u"run"_s, u"--retry"_s});
     EXPECT_EQ(retry.status, 2);
     EXPECT_TRUE(retry.err.contains("cannot retry: the processed results of demo-phone are unreadable"))
         << retry.err.constData();
 
-    const ToolResult run = Tool({QStringLiteral("run"), QStringLiteral("IClock")});
+    const ToolResult run = Tool({u"run"_s, u"IClock"_s});
     EXPECT_EQ(run.status, 0) << run.err.constData();
-    const QRegularExpressionMatch kept
-        = QRegularExpression(QStringLiteral("were kept as (\\S+)")).match(QString::fromUtf8(run.out));
+    const QRegularExpressionMatch kept = QRegularExpression(u"were kept as (\\S+)"_s).match(QString::fromUtf8(run.out));
     ASSERT_TRUE(kept.hasMatch()) << run.out.constData();
     EXPECT_EQ(testutil::ReadFile(kept.captured(1)).size(), 60);
 }
 
 TEST_F(DemoRun, SetUpFailuresAndBadFiltersAreRefusedBeforeAnythingRuns)
 {
-    const QString missing = dir.filePath(QStringLiteral("missing/file"));
-    testutil::WriteFile(dir.filePath(QStringLiteral("a-file")), "x");
-    QDir().mkpath(dir.filePath(QStringLiteral("empty")));
+    const QString missing = dir.filePath(u"missing/file"_s);
+    testutil::WriteFile(dir.filePath(u"a-file"_s), "x");
+    QDir().mkpath(dir.filePath(u"empty"_s));
     const struct
     {
         QStringList arguments;
@@ -333,52 +314,27 @@ TEST_F(DemoRun, SetUpFailuresAndBadFiltersAreRefusedBeforeAnythingRuns)
         QString value;
         const char *error;
     } rows[] = {
-        {{QStringLiteral("run"), QStringLiteral("--test-data"), missing}, nullptr, {}, "--test-data: "},
-        {{QStringLiteral("run"), QStringLiteral("--dpk"), missing}, nullptr, {}, "--dpk: "},
-        {{QStringLiteral("run")}, "KESTIX_TOOLSET", missing, "tool set"},
-        {{QStringLiteral("run"), QStringLiteral("--run-option"), QStringLiteral("bogus")},
-         nullptr,
-         {},
-         "unknown --run-option 'bogus'"},
-        {{QStringLiteral("run"), QStringLiteral("--features"), missing}, nullptr, {}, "feature list"},
-        {{QStringLiteral("run")}, "KESTIX_DATA_ROOT", dir.filePath(QStringLiteral("a-file")), "is not a folder"},
-        {{QStringLiteral("run"), QStringLiteral("--junit"), missing}, nullptr, {}, "cannot write --junit"},
-        {{QStringLiteral("run"), QStringLiteral("--json"), missing}, nullptr, {}, "cannot write --json"},
-        {{QStringLiteral("run"), QStringLiteral("--copy-delay"), QStringLiteral("soon")}, nullptr, {}, "--copy-delay"},
-        {{QStringLiteral("modules"), QStringLiteral("--kit"), QStringLiteral("nowhere")},
-         nullptr,
-         {},
-         "no test kit 'nowhere'"},
-        {{QStringLiteral("run"), QStringLiteral("IClock"), QStringLiteral("Nope")},
-         nullptr,
-         {},
-         "no module matches 'Nope'"},
-        {{QStringLiteral("run"), QStringLiteral("--family"), QStringLiteral("media"), QStringLiteral("I*")},
-         nullptr,
-         {},
-         "no module matches 'I*' in family 'media'"},
-        {{QStringLiteral("run"), QStringLiteral("--subfamily"), QStringLiteral("timer")},
-         nullptr,
-         {},
-         "--subfamily needs --family"},
-        {{QStringLiteral("run"), QStringLiteral("--test-cases"), QStringLiteral("Nope,ReadClock"),
-          QStringLiteral("IClock")},
-         nullptr,
-         {},
-         "has no test case 'Nope'"},
-        {{QStringLiteral("run"), QStringLiteral("--target"), QStringLiteral("no-such-phone")},
-         nullptr,
-         {},
-         "no handset matching 'no-such-phone'"},
-        {{QStringLiteral("run")}, "KESTIX_HANDSETS", dir.filePath(QStringLiteral("empty")), "no handset attached"},
-        {{QStringLiteral("process")}, nullptr, {}, "--log-dir"},
-        {{QStringLiteral("process"), QStringLiteral("--log-dir"), dir.filePath(QStringLiteral("empty"))},
-         nullptr,
-         {},
-         "no logs"},
+        {{u"run"_s, u"--test-data"_s, missing}, nullptr, {}, "--test-data: "},
+        {{u"run"_s, u"--dpk"_s, missing}, nullptr, {}, "--dpk: "},
+        {{u"run"_s}, "KESTIX_TOOLSET", missing, "tool set"},
+        {{u"run"_s, u"--run-option"_s, u"bogus"_s}, nullptr, {}, "unknown --run-option 'bogus'"},
+        {{u"run"_s, u"--features"_s, missing}, nullptr, {}, "feature list"},
+        {{u"run"_s}, "KESTIX_DATA_ROOT", dir.filePath(u"a-file"_s), "is not a folder"},
+        {{u"run"_s, u"--junit"_s, missing}, nullptr, {}, "cannot write --junit"},
+        {{u"run"_s, u"--json"_s, missing}, nullptr, {}, "cannot write --json"},
+        {{u"run"_s, u"--copy-delay"_s, u"soon"_s}, nullptr, {}, "--copy-delay"},
+        {{u"modules"_s, u"--kit"_s, u"nowhere"_s}, nullptr, {}, "no test kit 'nowhere'"},
+        {{u"run"_s, u"IClock"_s, u"Nope"_s}, nullptr, {}, "no module matches 'Nope'"},
+        {{u"run"_s, u"--family"_s, u"media"_s, u"I*"_s}, nullptr, {}, "no module matches 'I*' in family 'media'"},
+        {{u"run"_s, u"--subfamily"_s, u"timer"_s}, nullptr, {}, "--subfamily needs --family"},
+        {{u"run"_s, u"--test-cases"_s, u"Nope,ReadClock"_s, u"IClock"_s}, nullptr, {}, "has no test case 'Nope'"},
+        {{u"run"_s, u"--target"_s, u"no-such-phone"_s}, nullptr, {}, "no handset matching 'no-such-phone'"},
+        {{u"run"_s}, "KESTIX_HANDSETS", dir.filePath(u"empty"_s), "no handset attached"},
+        {{u"process"_s}, nullptr, {}, "--log-dir"},
+        {{u"process"_s, u"--log-dir"_s, dir.filePath(u"empty"_s)}, nullptr, {}, "no logs"},
     };
     for (const auto &row : rows) {
-        const QString trace = row.arguments.join(QLatin1Char(' ')) + QLatin1Char(' ') + QLatin1String(row.variable);
+        const QString trace = row.arguments.join(u' ') + u' ' + QLatin1String(row.variable);
         SCOPED_TRACE(trace.toStdString());
         const QProcessEnvironment saved = env;
         if (row.variable)
@@ -389,93 +345,83 @@ TEST_F(DemoRun, SetUpFailuresAndBadFiltersAreRefusedBeforeAnythingRuns)
         EXPECT_TRUE(r.err.contains(row.error)) << r.err.constData();
         EXPECT_EQ(r.err.count('\n'), 1) << r.err.constData(); // one line, nothing else
     }
-    EXPECT_FALSE(QFileInfo::exists(targets + QStringLiteral("/demo-phone/Logs/ProcessedResults/ProcessedResults.xml")));
-    EXPECT_EQ(Installed(QStringLiteral("demo-phone")), QStringList());
+    EXPECT_FALSE(QFileInfo::exists(targets + u"/demo-phone/Logs/ProcessedResults/ProcessedResults.xml"_s));
+    EXPECT_EQ(Installed(u"demo-phone"_s), QStringList());
     // A refused kit leaves no empty cache folder behind.
-    const QDir caches(root + QStringLiteral("/data/Norvane/TestManifests"));
+    const QDir caches(root + u"/data/Norvane/TestManifests"_s);
     for (const QString &cache : caches.entryList(QDir::Dirs | QDir::NoDotAndDotDot))
         EXPECT_FALSE(QDir(caches.filePath(cache)).isEmpty()) << cache.toStdString();
 }
 
 TEST_F(DemoRun, FiltersSelectWhatTheyName)
 {
-    const ToolResult modules = Tool({QStringLiteral("modules")});
+    const ToolResult modules = Tool({u"modules"_s});
     ASSERT_EQ(modules.status, 0) << modules.err.constData();
     EXPECT_TRUE(modules.out.contains("ITimer\tctf\tsystem\ttimer\tKVK\t5\n")) << modules.out.constData();
     EXPECT_TRUE(modules.out.contains("PlatformVersion\tctf\tcore\tversion\tPVS\t2\n"));
     EXPECT_FALSE(modules.out.contains("Helper")); // secondary modules are never offered
 
-    const ToolResult family = Tool({QStringLiteral("run"), QStringLiteral("--family"), QStringLiteral("SYSTEM"),
-                                    QStringLiteral("--subfamily"), QStringLiteral("timer"), QStringLiteral("I*")});
-    EXPECT_EQ(Rows(family.out).keys(), QStringList{QStringLiteral("ITimer")})
-        << family.out.constData() << family.err.constData();
+    const ToolResult family = Tool({u"run"_s, u"--family"_s, u"SYSTEM"_s, u"--subfamily"_s, u"timer"_s, u"I*"_s});
+    EXPECT_EQ(Rows(family.out).keys(), QStringList{u"ITimer"_s}) << family.out.constData() << family.err.constData();
 
-    const ToolResult cases = Tool(
-        {QStringLiteral("run"), QStringLiteral("--test-cases"), QStringLiteral("ReadClock"), QStringLiteral("*clock")});
+    const ToolResult cases = Tool({u"run"_s, u"--test-cases"_s, u"ReadClock"_s, u"*clock"_s});
     EXPECT_EQ(cases.status, 0) << cases.err.constData();
 }
 
 TEST_F(DemoRun, RetryAndProcessWorkFromTheHistory)
 {
-    AddToIni(QStringLiteral("demo-phone"), "offlineAfter=40\n");
-    ASSERT_EQ(Tool({QStringLiteral("run")}).status, 1);
-    QFile::remove(handsets + QStringLiteral("/demo-phone/offline"));
-    const QString ini = handsets + QStringLiteral("/demo-phone/handset.ini");
+    AddToIni(u"demo-phone"_s, "offlineAfter=40\n");
+    ASSERT_EQ(Tool({u"run"_s}).status, 1);
+    QFile::remove(handsets + u"/demo-phone/offline"_s);
+    const QString ini = handsets + u"/demo-phone/handset.ini"_s;
     testutil::WriteFile(ini, testutil::ReadFile(ini).replace("offlineAfter=40\n", ""));
     // Every module not shown passed runs again, those the lost run never reached too.
-    const ToolResult retry = Tool({QStringLiteral("run"), QStringLiteral("--retry")});
+    const ToolResult retry = Tool({u"run"_s, u"--retry"_s});
     EXPECT_EQ(retry.status, 1);
     const QMap<QString, QString> rows = Rows(retry.out);
-    EXPECT_EQ(QStringList(rows.keys()),
-              (QStringList{QStringLiteral("ITimer"), QStringLiteral("OatAudio"), QStringLiteral("Sockets"),
-                           QStringLiteral("Widgets")}))
+    EXPECT_EQ(QStringList(rows.keys()), (QStringList{u"ITimer"_s, u"OatAudio"_s, u"Sockets"_s, u"Widgets"_s}))
         << retry.out.constData();
 
-    const QString again = dir.filePath(QStringLiteral("again.xml"));
-    const ToolResult process = Tool({QStringLiteral("process"), QStringLiteral("--log-dir"),
-                                     targets + QStringLiteral("/demo-phone/Logs"), QStringLiteral("--results"), again});
+    const QString again = dir.filePath(u"again.xml"_s);
+    const ToolResult process
+        = Tool({u"process"_s, u"--log-dir"_s, targets + u"/demo-phone/Logs"_s, u"--results"_s, again});
     EXPECT_EQ(process.status, 1) << process.err.constData() << process.out.constData(); // as report: a test case failed
-    EXPECT_TRUE(
-        QString::fromUtf8(process.out).contains(QRegularExpression(QStringLiteral("ITimer\\s+3\\s+1\\s+1\\s+0\\n"))))
+    EXPECT_TRUE(QString::fromUtf8(process.out).contains(QRegularExpression(u"ITimer\\s+3\\s+1\\s+1\\s+0\\n"_s)))
         << process.out.constData();
     EXPECT_TRUE(QFile::exists(again));
 }
 
 TEST_F(DemoRun, ManifestKeepsBothCatalogues)
 {
-    const QString folder = dir.filePath(QStringLiteral("catalogues"));
-    const ToolResult r = Tool({QStringLiteral("manifest"), QStringLiteral("-o"), folder});
+    const QString folder = dir.filePath(u"catalogues"_s);
+    const ToolResult r = Tool({u"manifest"_s, u"-o"_s, folder});
     EXPECT_EQ(r.status, 0) << r.err.constData();
-    const QDomElement kit = ReadXml(folder + QStringLiteral("/KVKManifest.xml"));
-    const QDomElement platform = ReadXml(folder + QStringLiteral("/PlatformManifest.xml"));
-    EXPECT_TRUE(testutil::ReadFile(folder + QStringLiteral("/KVKManifest.xml")).contains("ITimer"));
-    EXPECT_TRUE(testutil::ReadFile(folder + QStringLiteral("/PlatformManifest.xml")).contains("PlatformVersion"));
+    const QDomElement kit = ReadXml(folder + u"/KVKManifest.xml"_s);
+    const QDomElement platform = ReadXml(folder + u"/PlatformManifest.xml"_s);
+    EXPECT_TRUE(testutil::ReadFile(folder + u"/KVKManifest.xml"_s).contains("ITimer"));
+    EXPECT_TRUE(testutil::ReadFile(folder + u"/PlatformManifest.xml"_s).contains("PlatformVersion"));
 
-    const ToolResult file
-        = Tool({QStringLiteral("manifest"), QStringLiteral("-o"), dir.filePath(QStringLiteral("harness.log"))});
+    const ToolResult file = Tool({u"manifest"_s, u"-o"_s, dir.filePath(u"harness.log"_s)});
     EXPECT_EQ(file.status, 2);
 }
 
 TEST_F(DemoRun, SharedRunsNameTheHandsetOfEachModule)
 {
-    AddHandset(QStringLiteral("demo-phone2"), "offlineAfter=1\n"); // lost with a module in hand
-    AddHandset(QStringLiteral("demo-phone3"));
-    testutil::WriteFile(handsets + QStringLiteral("/demo-phone3/offline"), "");
-    const ToolResult r = Tool({QStringLiteral("run"), QStringLiteral("--verbose"), QStringLiteral("--all-targets"),
-                               QStringLiteral("--test-data"), testData});
+    AddHandset(u"demo-phone2"_s, "offlineAfter=1\n"); // lost with a module in hand
+    AddHandset(u"demo-phone3"_s);
+    testutil::WriteFile(handsets + u"/demo-phone3/offline"_s, "");
+    const ToolResult r = Tool({u"run"_s, u"--verbose"_s, u"--all-targets"_s, u"--test-data"_s, testData});
     EXPECT_EQ(r.status, 1) << r.err.constData() << r.out.constData();
     // Every progress line and every library line names its handset.
     const QString out = QString::fromUtf8(r.out);
-    EXPECT_EQ(out.count(QRegularExpression(QStringLiteral("^\\[[1-6]/6\\] demo-phone  "),
-                                           QRegularExpression::MultilineOption)),
-              6)
+    EXPECT_EQ(out.count(QRegularExpression(u"^\\[[1-6]/6\\] demo-phone  "_s, QRegularExpression::MultilineOption)), 6)
         << r.out.constData();
-    EXPECT_TRUE(out.contains(QStringLiteral("handset lost; the module goes back to the queue"))) << r.out.constData();
+    EXPECT_TRUE(out.contains(u"handset lost; the module goes back to the queue"_s)) << r.out.constData();
     EXPECT_TRUE(r.err.contains("\ndemo-phone: Running KVK test ITimer")) << r.err.constData();
     EXPECT_TRUE(r.err.contains("\ndemo-phone2: Running ")) << r.err.constData();
     const QMap<QString, QString> rows = Rows(r.out);
-    EXPECT_EQ(rows.value(QStringLiteral("ITimer")), QStringLiteral("demo-phone 3 1 1 0")) << r.out.constData();
-    EXPECT_EQ(rows.value(QStringLiteral("OatAudio")), QStringLiteral("demo-phone 2 1 1 0"));
+    EXPECT_EQ(rows.value(u"ITimer"_s), u"demo-phone 3 1 1 0"_s) << r.out.constData();
+    EXPECT_EQ(rows.value(u"OatAudio"_s), u"demo-phone 2 1 1 0"_s);
     EXPECT_EQ(rows.size(), 6);
     EXPECT_TRUE(r.out.contains("Handset demo-phone2 dropped out at ")) << r.out.constData();
     EXPECT_TRUE(r.out.contains("Handset demo-phone3 could not be connected"));
@@ -560,17 +506,15 @@ TEST_F(DemoRun, ShardsOfOneSelectionMergeIntoTheVerdictsOfOneRun)
 // streams. Empty when there is no "script" here.
 QByteArray OnTerminal(const QStringList &arguments, const QProcessEnvironment &env, const QString &folder)
 {
-    if (!testutil::HaveProgram(QStringLiteral("script")))
+    if (!testutil::HaveProgram(u"script"_s))
         return {};
     QStringList quoted{QStringLiteral(HARNESS_BINARY_DIR "/harness")};
     for (const QString &argument : arguments)
-        quoted.append(QLatin1Char('\'') + argument + QLatin1Char('\''));
+        quoted.append(u'\'' + argument + u'\'');
     QProcess tool;
     tool.setProcessEnvironment(env);
     tool.setWorkingDirectory(folder);
-    tool.start(QStringLiteral("script"),
-               {QStringLiteral("-q"), QStringLiteral("-e"), QStringLiteral("-c"), quoted.join(QLatin1Char(' ')),
-                QStringLiteral("/dev/null")});
+    tool.start(u"script"_s, {u"-q"_s, u"-e"_s, u"-c"_s, quoted.join(u' '), u"/dev/null"_s});
     tool.closeWriteChannel();
     if (!tool.waitForFinished(120000))
         return {};
@@ -581,51 +525,45 @@ QByteArray OnTerminal(const QStringList &arguments, const QProcessEnvironment &e
 // its package is taken apart and put together again with tar.
 void HangITimer(const QString &root)
 {
-    const QString folder = root + QStringLiteral("/kits/DemoKit/tests/system/timer/ITimer/package");
-    const QString package = folder + QStringLiteral("/ITimer_Win32_Release.kestix");
-    const QString work = folder + QStringLiteral("/unpacked");
+    const QString folder = root + u"/kits/DemoKit/tests/system/timer/ITimer/package"_s;
+    const QString package = folder + u"/ITimer_Win32_Release.kestix"_s;
+    const QString work = folder + u"/unpacked"_s;
     ASSERT_TRUE(QDir().mkpath(work));
-    ASSERT_EQ(testutil::RunProgram(QStringLiteral("tar"), {QStringLiteral("-xf"), package, QStringLiteral("-C"), work}),
-              0);
-    const QString behaviour = work + QStringLiteral("/itimer/behaviour");
+    ASSERT_EQ(testutil::RunProgram(u"tar"_s, {u"-xf"_s, package, u"-C"_s, work}), 0);
+    const QString behaviour = work + u"/itimer/behaviour"_s;
     QByteArray script = testutil::ReadFile(behaviour);
     ASSERT_TRUE(script.contains("echo '[/VERBOSE]'\n"));
     testutil::WriteFile(behaviour, script.replace("echo '[/VERBOSE]'\n", ""));
-    ASSERT_EQ(
-        testutil::RunProgram(QStringLiteral("tar"),
-                             {QStringLiteral("-cf"), package, QStringLiteral("-C"), work, QStringLiteral("itimer")}),
-        0);
+    ASSERT_EQ(testutil::RunProgram(u"tar"_s, {u"-cf"_s, package, u"-C"_s, work, u"itimer"_s}), 0);
     QDir(work).removeRecursively();
 }
 
 TEST_F(DemoRun, ProgressShowsOneLinePerModuleAndColourOnlyOnATerminal)
 {
-    const ToolResult r = Tool({QStringLiteral("run"), QStringLiteral("--test-data"), testData});
+    const ToolResult r = Tool({u"run"_s, u"--test-data"_s, testData});
     EXPECT_EQ(r.status, 1) << r.err.constData();
     const QString out = QString::fromUtf8(r.out);
     static const QRegularExpression timer(
-        QStringLiteral("\n\\[[1-6]/6\\] demo-phone  ITimer +3 passed 1 failed 1 unsupported  \\d+\\.\\d s\n"));
+        u"\n\\[[1-6]/6\\] demo-phone  ITimer +3 passed 1 failed 1 unsupported  \\d+\\.\\d s\n"_s);
     EXPECT_TRUE(out.contains(timer)) << r.out.constData();
-    EXPECT_EQ(out.count(QRegularExpression(QStringLiteral("^\\[[1-6]/6\\] demo-phone  "),
-                                           QRegularExpression::MultilineOption)),
-              6);
-    EXPECT_TRUE(out.contains(
-        QRegularExpression(QStringLiteral("Total \\(6 modules\\).*\nElapsed: \\d+\\.\\d s\nSlowest: \\w+ \\d"))));
+    EXPECT_EQ(out.count(QRegularExpression(u"^\\[[1-6]/6\\] demo-phone  "_s, QRegularExpression::MultilineOption)), 6);
+    EXPECT_TRUE(
+        out.contains(QRegularExpression(u"Total \\(6 modules\\).*\nElapsed: \\d+\\.\\d s\nSlowest: \\w+ \\d"_s)));
     EXPECT_FALSE(r.out.contains('\033'));
     // The library's own messages stay in its log unless asked for.
     EXPECT_FALSE(r.out.contains("Running KVK test") || r.err.contains("Running KVK test")) << r.err.constData();
-    EXPECT_TRUE(testutil::ReadFile(dir.filePath(QStringLiteral("harness.log"))).contains("Running KVK test"));
-    const ToolResult verbose = Tool({QStringLiteral("run"), QStringLiteral("--verbose"), QStringLiteral("IClock")});
+    EXPECT_TRUE(testutil::ReadFile(dir.filePath(u"harness.log"_s)).contains("Running KVK test"));
+    const ToolResult verbose = Tool({u"run"_s, u"--verbose"_s, u"IClock"_s});
     EXPECT_TRUE(verbose.err.contains("Running KVK test IClock")) << verbose.err.constData();
     EXPECT_FALSE(verbose.err.contains("\n\n"));
 
-    const QStringList arguments = WithLog({QStringLiteral("run"), QStringLiteral("ITimer")});
+    const QStringList arguments = WithLog({u"run"_s, u"ITimer"_s});
     const QByteArray coloured = OnTerminal(arguments, env, dir.path());
     if (coloured.isEmpty())
         GTEST_SKIP() << "no terminal to try colour on ('script' is missing or did not run)";
     EXPECT_TRUE(coloured.contains("\033[32m3 passed\033[0m \033[31m1 failed\033[0m")) << coloured.constData();
     QProcessEnvironment plain = env;
-    plain.insert(QStringLiteral("NO_COLOR"), QStringLiteral("1"));
+    plain.insert(u"NO_COLOR"_s, u"1"_s);
     const QByteArray noColour = OnTerminal(arguments, plain, dir.path());
     EXPECT_TRUE(noColour.contains("ITimer  3 passed 1 failed 1 unsupported")) << noColour.constData();
     EXPECT_FALSE(noColour.contains("\033[3"));
@@ -634,39 +572,35 @@ TEST_F(DemoRun, ProgressShowsOneLinePerModuleAndColourOnlyOnATerminal)
 TEST_F(DemoRun, AModulePastItsTimeoutIsStoppedRemovedAndReportedWhileTheRunGoesOn)
 {
     HangITimer(root);
-    const QString junit = dir.filePath(QStringLiteral("junit.xml"));
+    const QString junit = dir.filePath(u"junit.xml"_s);
     // 150 s on the library's clock: instant at time scale 0.
-    const QStringList arguments{
-        QStringLiteral("run"),    QStringLiteral("--timeout"), QStringLiteral("150"), QStringLiteral("--junit"), junit,
-        QStringLiteral("ITimer"), QStringLiteral("IClock")};
+    const QStringList arguments{u"run"_s, u"--timeout"_s, u"150"_s, u"--junit"_s, junit, u"ITimer"_s, u"IClock"_s};
     const ToolResult r = Tool(arguments);
     EXPECT_EQ(r.status, 1) << r.err.constData();
     EXPECT_TRUE(r.out.contains("Not finished: ITimer on demo-phone: stopped after its time limit of 150 s"))
         << r.out.constData();
-    EXPECT_EQ(Rows(r.out).value(QStringLiteral("IClock")), QStringLiteral("demo-phone 3 0 0 0"));
+    EXPECT_EQ(Rows(r.out).value(u"IClock"_s), u"demo-phone 3 0 0 0"_s);
     // Off a terminal, a long module shows it is alive once a minute.
     const QString out = QString::fromUtf8(r.out);
     EXPECT_EQ(out.count(QRegularExpression(QStringLiteral(
                   R"(\n\[\.\.\.\] demo-phone  ITimer  still running: waiting for its log, [12] min \d+ s\n)"))),
               2)
         << r.out.constData();
-    EXPECT_EQ(Installed(QStringLiteral("demo-phone")), QStringList());
+    EXPECT_EQ(Installed(u"demo-phone"_s), QStringList());
     ExpectValidJUnit(junit);
-    EXPECT_EQ(ReadXml(junit).attribute(QStringLiteral("errors")), QStringLiteral("5"));
+    EXPECT_EQ(ReadXml(junit).attribute(u"errors"_s), u"5"_s);
 
     // On a terminal the same wait is a status line rewritten in place.
-    const QByteArray terminal = OnTerminal(
-        WithLog({QStringLiteral("run"), QStringLiteral("--timeout"), QStringLiteral("20"), QStringLiteral("ITimer")}),
-        env, dir.path());
-    if (testutil::HaveProgram(QStringLiteral("script"))) {
+    const QByteArray terminal = OnTerminal(WithLog({u"run"_s, u"--timeout"_s, u"20"_s, u"ITimer"_s}), env, dir.path());
+    if (testutil::HaveProgram(u"script"_s)) {
         EXPECT_TRUE(QString::fromUtf8(terminal).contains(
-            QRegularExpression(QStringLiteral("\r\033\\[KITimer on demo-phone: waiting for its log, 1\\d s"))))
+            QRegularExpression(u"\r\033\\[KITimer on demo-phone: waiting for its log, 1\\d s"_s)))
             << terminal.constData();
         EXPECT_FALSE(terminal.contains("still running"));
     }
 
     for (const char *bad : {"0", "-3", "soon", "1e9"}) {
-        const ToolResult refused = Tool({QStringLiteral("run"), QStringLiteral("--timeout"), QLatin1String(bad)});
+        const ToolResult refused = Tool({u"run"_s, u"--timeout"_s, QLatin1String(bad)});
         EXPECT_EQ(refused.status, 2) << bad;
         EXPECT_TRUE(refused.err.contains("--timeout needs a number of seconds")) << refused.err.constData();
     }
@@ -674,97 +608,93 @@ TEST_F(DemoRun, AModulePastItsTimeoutIsStoppedRemovedAndReportedWhileTheRunGoesO
 
 TEST_F(DemoRun, ADryRunSaysWhatWouldRunWhereAndInWhichOrderAndTouchesNothing)
 {
-    ASSERT_EQ(Tool({QStringLiteral("run"), QStringLiteral("IClock")}).status, 0);
+    ASSERT_EQ(Tool({u"run"_s, u"IClock"_s}).status, 0);
     const QByteArray before = testutil::ReadFile(results);
-    AddHandset(QStringLiteral("demo-phone2"));
+    AddHandset(u"demo-phone2"_s);
     // Not even an offline handset is a reason to stop: nothing is connected.
-    testutil::WriteFile(handsets + QStringLiteral("/demo-phone2/offline"), "");
-    const ToolResult r
-        = Tool({QStringLiteral("run"), QStringLiteral("--dry-run"), QStringLiteral("--retry"),
-                QStringLiteral("--timeout"), QStringLiteral("90"), QStringLiteral("--target"),
-                QStringLiteral("demo-phone"), QStringLiteral("--target"), QStringLiteral("demo-phone2")});
+    testutil::WriteFile(handsets + u"/demo-phone2/offline"_s, "");
+    const ToolResult r = Tool({u"run"_s, u"--dry-run"_s, u"--retry"_s, u"--timeout"_s, u"90"_s, u"--target"_s,
+                               u"demo-phone"_s, u"--target"_s, u"demo-phone2"_s});
     EXPECT_EQ(r.status, 0) << r.err.constData();
     EXPECT_EQ(QString::fromUtf8(r.out),
-              QStringLiteral("Dry run: nothing is installed or started.\n"
-                             "5 modules shared by demo-phone, demo-phone2 (one queue in this order; each handset takes "
-                             "the next module when it is free):\n"
-                             "1. ITimer           ctf  KVK  5 test cases\n"
-                             "2. PlatformVersion  ctf  PVS  2 test cases\n"
-                             "3. Widgets          ctfapplet  KVK  3 test cases\n"
-                             "4. OatAudio         oat  KVK  4 test cases\n"
-                             "5. Sockets          uitf  KVK  4 test cases\n"
-                             "--retry leaves out what the processed results show passed: IClock\n"
-                             "A module still running after 90 s is stopped.\n"));
+              u"Dry run: nothing is installed or started.\n"
+              "5 modules shared by demo-phone, demo-phone2 (one queue in this order; each handset takes "
+              "the next module when it is free):\n"
+              "1. ITimer           ctf  KVK  5 test cases\n"
+              "2. PlatformVersion  ctf  PVS  2 test cases\n"
+              "3. Widgets          ctfapplet  KVK  3 test cases\n"
+              "4. OatAudio         oat  KVK  4 test cases\n"
+              "5. Sockets          uitf  KVK  4 test cases\n"
+              "--retry leaves out what the processed results show passed: IClock\n"
+              "A module still running after 90 s is stopped.\n"_s);
     EXPECT_EQ(testutil::ReadFile(results), before);
-    EXPECT_FALSE(
-        QFileInfo::exists(targets + QStringLiteral("/demo-phone2/Logs/ProcessedResults/ProcessedResults.xml")));
-    EXPECT_FALSE(QFileInfo::exists(targets + QStringLiteral("/demo-phone/run.lock")));
-    EXPECT_EQ(Installed(QStringLiteral("demo-phone")), QStringList());
+    EXPECT_FALSE(QFileInfo::exists(targets + u"/demo-phone2/Logs/ProcessedResults/ProcessedResults.xml"_s));
+    EXPECT_FALSE(QFileInfo::exists(targets + u"/demo-phone/run.lock"_s));
+    EXPECT_EQ(Installed(u"demo-phone"_s), QStringList());
 }
 
 TEST_F(DemoRun, TheHtmlReportOfARunCutShortShowsItsNotRunModules)
 {
-    AddToIni(QStringLiteral("demo-phone"), "offlineAfter=12\n");
-    const QString html = dir.filePath(QStringLiteral("out/report.html"));
-    QDir().mkpath(dir.filePath(QStringLiteral("out")));
-    const ToolResult r = Tool({QStringLiteral("run"), QStringLiteral("--html"), html});
+    AddToIni(u"demo-phone"_s, "offlineAfter=12\n");
+    const QString html = dir.filePath(u"out/report.html"_s);
+    QDir().mkpath(dir.filePath(u"out"_s));
+    const ToolResult r = Tool({u"run"_s, u"--html"_s, html});
     EXPECT_EQ(r.status, 1) << r.err.constData();
     EXPECT_TRUE(r.out.contains("HTML report: " + html.toUtf8() + "\n")) << r.out.constData();
     const QString page = QString::fromUtf8(testutil::ReadFile(html));
-    EXPECT_TRUE(page.contains(QStringLiteral("<b data-count=\"not finished\">6</b>"))) << page.toStdString();
-    EXPECT_TRUE(page.contains(QStringLiteral("Not finished: not run: every handset was lost")));
-    EXPECT_EQ(page.count(QStringLiteral("<tr class=\"module\"")), 6);
-    EXPECT_EQ(page.count(QStringLiteral("<span class=\"outcome notfinished\">not finished</span>")), 6);
+    EXPECT_TRUE(page.contains(u"<b data-count=\"not finished\">6</b>"_s)) << page.toStdString();
+    EXPECT_TRUE(page.contains(u"Not finished: not run: every handset was lost"_s));
+    EXPECT_EQ(page.count(u"<tr class=\"module\""_s), 6);
+    EXPECT_EQ(page.count(u"<span class=\"outcome notfinished\">not finished</span>"_s), 6);
     // Self-contained: its style is inline and nothing is fetched from anywhere.
-    EXPECT_TRUE(page.contains(QStringLiteral("<style>")));
-    EXPECT_FALSE(page.contains(QRegularExpression(QStringLiteral("(src|href)=\"(https?:|//)"))));
+    EXPECT_TRUE(page.contains(u"<style>"_s));
+    EXPECT_FALSE(page.contains(QRegularExpression(u"(src|href)=\"(https?:|//)"_s)));
     // A run's page has the columns of a run; the history's has not (below).
-    EXPECT_TRUE(page.contains(QStringLiteral(">Duration</th>")));
+    EXPECT_TRUE(page.contains(u">Duration</th>"_s));
 }
 
 TEST_F(DemoRun, TheHtmlReportEscapesNamesAndSaysThatNoHistoryIsRecorded)
 {
-    const QString file = dir.filePath(QStringLiteral("results.xml"));
+    const QString file = dir.filePath(u"results.xml"_s);
     testutil::WriteFile(
         file,
         "<testmodules><module name=\"&lt;script&gt;alert(1)&lt;/script&gt;\" family=\"a&amp;b\" source=\"KVK\">"
         "<testcase name=\"&lt;img src=x onerror=alert(2)&gt;\" result=\"fail\"/></module></testmodules>");
-    const QString html = dir.filePath(QStringLiteral("history.html"));
-    const ToolResult r = RunTool({QStringLiteral("report"), file, QStringLiteral("--html"), html}, env, dir.path());
+    const QString html = dir.filePath(u"history.html"_s);
+    const ToolResult r = RunTool({u"report"_s, file, u"--html"_s, html}, env, dir.path());
     EXPECT_EQ(r.status, 1) << r.err.constData();
     const QString page = QString::fromUtf8(testutil::ReadFile(html));
-    EXPECT_TRUE(page.contains(QStringLiteral("&lt;script&gt;alert(1)&lt;/script&gt;"))) << page.toStdString();
-    EXPECT_TRUE(page.contains(QStringLiteral("&lt;img src=x onerror=alert(2)&gt;")));
-    EXPECT_TRUE(page.contains(QStringLiteral("a&amp;b")));
-    EXPECT_FALSE(page.contains(QStringLiteral("<script>alert")));
-    EXPECT_FALSE(page.contains(QStringLiteral("<img")));
-    EXPECT_EQ(page.count(QStringLiteral("<script>")), 1); // the page's own
-    EXPECT_TRUE(page.contains(QStringLiteral("no history across runs is recorded")));
-    EXPECT_FALSE(page.contains(QStringLiteral(">Duration</th>")));
+    EXPECT_TRUE(page.contains(u"&lt;script&gt;alert(1)&lt;/script&gt;"_s)) << page.toStdString();
+    EXPECT_TRUE(page.contains(u"&lt;img src=x onerror=alert(2)&gt;"_s));
+    EXPECT_TRUE(page.contains(u"a&amp;b"_s));
+    EXPECT_FALSE(page.contains(u"<script>alert"_s));
+    EXPECT_FALSE(page.contains(u"<img"_s));
+    EXPECT_EQ(page.count(u"<script>"_s), 1); // the page's own
+    EXPECT_TRUE(page.contains(u"no history across runs is recorded"_s));
+    EXPECT_FALSE(page.contains(u">Duration</th>"_s));
 }
 
 // Headless Chromium renders the report of a run shared by two handsets.
 TEST_F(DemoRun, TheHtmlReportWorksInARealBrowser)
 {
-    QString chromium = QStandardPaths::findExecutable(QStringLiteral("chromium"));
+    QString chromium = QStandardPaths::findExecutable(u"chromium"_s);
     if (chromium.isEmpty())
         GTEST_SKIP()
             << "headless browser test skipped: no 'chromium' on PATH (./run installs Debian's chromium package)";
-    AddHandset(QStringLiteral("demo-phone2"));
-    const QString html = dir.filePath(QStringLiteral("report.html"));
-    const ToolResult r = Tool({QStringLiteral("run"), QStringLiteral("--all-targets"), QStringLiteral("--test-data"),
-                               testData, QStringLiteral("--html"), html});
+    AddHandset(u"demo-phone2"_s);
+    const QString html = dir.filePath(u"report.html"_s);
+    const ToolResult r = Tool({u"run"_s, u"--all-targets"_s, u"--test-data"_s, testData, u"--html"_s, html});
     ASSERT_EQ(r.status, 1) << r.err.constData();
 
     // Every link is a relative one to a copied log, or one within the page.
     const QString page = QString::fromUtf8(testutil::ReadFile(html));
     int logLinks = 0;
-    static const QRegularExpression link(QStringLiteral("href=\"([^\"]*)\""));
+    static const QRegularExpression link(u"href=\"([^\"]*)\""_s);
     for (QRegularExpressionMatchIterator it = link.globalMatch(page); it.hasNext();) {
         const QString target = it.next().captured(1);
-        if (target.startsWith(QLatin1Char('#')))
+        if (target.startsWith(u'#'))
             continue;
-        EXPECT_TRUE(target.startsWith(QStringLiteral("demo/data/Norvane/Targets/demo-phone"))) << target.toStdString();
+        EXPECT_TRUE(target.startsWith(u"demo/data/Norvane/Targets/demo-phone"_s)) << target.toStdString();
         EXPECT_TRUE(QFileInfo(dir.filePath(QUrl::fromPercentEncoding(target.toUtf8()))).isFile())
             << target.toStdString();
         ++logLinks;
@@ -777,12 +707,10 @@ TEST_F(DemoRun, TheHtmlReportWorksInARealBrowser)
     const auto browse = [&](const QStringList &what, const QString &fragment, QByteArray &err) {
         QProcess browser;
         browser.start(chromium,
-                      QStringList{QStringLiteral("--headless"), QStringLiteral("--no-sandbox"),
-                                  QStringLiteral("--disable-gpu"), QStringLiteral("--disable-quic"),
-                                  QStringLiteral("--no-first-run"), QStringLiteral("--disable-background-networking"),
-                                  QStringLiteral("--disable-component-update"), QStringLiteral("--disable-sync"),
-                                  QStringLiteral("--user-data-dir=") + profile.path(),
-                                  QStringLiteral("--enable-logging=stderr"), QStringLiteral("--v=0")}
+                      QStringList{u"--headless"_s, u"--no-sandbox"_s, u"--disable-gpu"_s, u"--disable-quic"_s,
+                                  u"--no-first-run"_s, u"--disable-background-networking"_s,
+                                  u"--disable-component-update"_s, u"--disable-sync"_s,
+                                  u"--user-data-dir="_s + profile.path(), u"--enable-logging=stderr"_s, u"--v=0"_s}
                           + what + QStringList{QUrl::fromLocalFile(html).toString() + fragment});
         if (!browser.waitForFinished(120000) || browser.exitCode() != 0) {
             browser.kill();
@@ -793,36 +721,35 @@ TEST_F(DemoRun, TheHtmlReportWorksInARealBrowser)
         return browser.readAllStandardOutput();
     };
     QByteArray console;
-    const QString dom = QString::fromUtf8(browse({QStringLiteral("--dump-dom")}, QString(), console));
+    const QString dom = QString::fromUtf8(browse({u"--dump-dom"_s}, QString(), console));
     if (dom.isEmpty())
         GTEST_SKIP() << "headless browser test skipped: chromium did not run here: " << console.constData();
     // The page writes nothing to the console: any line there is an error.
     for (const QByteArray &line : console.split('\n'))
         EXPECT_FALSE(line.contains(":CONSOLE")) << line.constData();
-    EXPECT_TRUE(dom.contains(QStringLiteral("<b data-count=\"passed\">14</b>"))) << dom.toStdString();
-    EXPECT_TRUE(dom.contains(QStringLiteral("<b data-count=\"failed\">4</b>")));
-    EXPECT_TRUE(dom.contains(QStringLiteral("<b data-count=\"unsupported\">3</b>")));
-    EXPECT_EQ(dom.count(QStringLiteral("<g class=\"lane\"")), 2);
-    EXPECT_EQ(dom.count(QStringLiteral("<rect class=\"module ")), 6);
-    EXPECT_TRUE(dom.contains(QStringLiteral("data-filter=\"all\"")));
-    EXPECT_FALSE(dom.contains(QStringLiteral("hidden=\"\"")));
+    EXPECT_TRUE(dom.contains(u"<b data-count=\"passed\">14</b>"_s)) << dom.toStdString();
+    EXPECT_TRUE(dom.contains(u"<b data-count=\"failed\">4</b>"_s));
+    EXPECT_TRUE(dom.contains(u"<b data-count=\"unsupported\">3</b>"_s));
+    EXPECT_EQ(dom.count(u"<g class=\"lane\""_s), 2);
+    EXPECT_EQ(dom.count(u"<rect class=\"module "_s), 6);
+    EXPECT_TRUE(dom.contains(u"data-filter=\"all\""_s));
+    EXPECT_FALSE(dom.contains(u"hidden=\"\""_s));
 
     // "#failures" in the address leaves only the modules with a failure.
-    const QString failures
-        = QString::fromUtf8(browse({QStringLiteral("--dump-dom")}, QStringLiteral("#failures"), console));
-    EXPECT_TRUE(failures.contains(QStringLiteral("data-filter=\"failures\""))) << failures.toStdString();
+    const QString failures = QString::fromUtf8(browse({u"--dump-dom"_s}, u"#failures"_s, console));
+    EXPECT_TRUE(failures.contains(u"data-filter=\"failures\""_s)) << failures.toStdString();
     static const QRegularExpression row(
-        QStringLiteral("<tr class=\"module\" data-module=\"(\\w+)\" data-ok=\"(\\d)\"( hidden=\"\")?>"));
+        u"<tr class=\"module\" data-module=\"(\\w+)\" data-ok=\"(\\d)\"( hidden=\"\")?>"_s);
     int shown = 0;
     for (QRegularExpressionMatchIterator it = row.globalMatch(failures); it.hasNext();) {
         const QRegularExpressionMatch m = it.next();
-        EXPECT_EQ(m.captured(3).isEmpty(), m.captured(2) == QLatin1String("0")) << m.captured(0).toStdString();
+        EXPECT_EQ(m.captured(3).isEmpty(), m.captured(2) == u"0"_s) << m.captured(0).toStdString();
         shown += m.captured(3).isEmpty() ? 1 : 0;
     }
     EXPECT_EQ(shown, 4);
 
-    const QString shot = dir.filePath(QStringLiteral("report.png"));
-    browse({QStringLiteral("--screenshot=") + shot, QStringLiteral("--window-size=1280,1600")}, QString(), console);
+    const QString shot = dir.filePath(u"report.png"_s);
+    browse({u"--screenshot="_s + shot, u"--window-size=1280,1600"_s}, QString(), console);
     EXPECT_TRUE(testutil::ReadFile(shot).startsWith("\x89PNG"));
 }
 
