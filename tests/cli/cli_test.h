@@ -35,6 +35,12 @@ struct Args : QStringList
     void Add(const QStringList &arguments) { append(arguments); }
 };
 
+// The tool run in the current folder: Tool("res list", path).
+template <typename... Parts> ToolResult Tool(const Parts &...parts)
+{
+    return RunTool(Args(parts...));
+}
+
 // Module name -> "[handset ]passed failed unsupported unexecuted" of each row
 // of a summary table.
 QMap<QString, QString> Rows(const QByteArray &out);
