@@ -83,3 +83,9 @@ void ExpectRefused(const ToolResult &result, QByteArrayView message)
         << result.err.constData();
     EXPECT_TRUE(result.out.isEmpty()) << result.out.constData();
 }
+
+QByteArray OutputOf(const ToolResult &result)
+{
+    EXPECT_EQ(result.status, 0) << result.err.constData();
+    return result.out;
+}

@@ -52,6 +52,9 @@ void ExpectXmllintAccepts(const QString &path, const QString &schema = QString()
 // The file as a document; fails the test when it does not parse.
 QDomDocument ReadXml(const QString &path);
 
+// The standard output of a run; fails the test unless it exited with status 0.
+QByteArray OutputOf(const ToolResult &result);
+
 // Fails the test for each part the text lacks (ExpectContains) or holds
 // (ExpectLacks), showing the text.
 void ExpectContains(const QByteArray &text, std::initializer_list<QByteArrayView> parts);
