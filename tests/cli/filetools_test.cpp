@@ -34,18 +34,13 @@ TEST_F(InspectTool, CompiledSourceListsDecodedStringsObjectsAndClassIds)
     WriteFile(u"src.xml"_s, source.arg(QString(80, u'0')).toUtf8());
     const ToolResult compiled = Tool("res compile src.xml out.kar");
     ASSERT_EQ(compiled.status, 0) << compiled.err.constData();
-    const ToolResult list = Tool("res list out.kar");
-    EXPECT_EQ(list.status, 0);
-    ExpectContains(list.out,
+    ExpectContains(OutputOf(Tool("res list out.kar")),
                    {u"UTF-8  \"Gr\u00fc\u00dfe\""_s.toUtf8(), u"\"\u4e2d\u6587\""_s.toUtf8(), "text/plain, 3 bytes"});
     // The class ID list stops at its zero value.
-    const ToolResult mif = Tool("mif out.kar");
-    EXPECT_EQ(mif.status, 0);
-    ExpectContains(mif.out, {"classes: 2\n  0x12345678\n  0xdeadbeef\napplets: 0"});
-    const ToolResult dump = Tool("res dump out.kar");
-    EXPECT_EQ(dump.status, 0);
-    EXPECT_TRUE(dump.out.startsWith("=== Header ===")) << dump.out.left(200).constData();
-    ExpectContains(dump.out, {"Number of Resources:  5 (0x5)\n"});
+    ExpectContains(OutputOf(Tool("mif out.kar")), {"classes: 2\n  0x12345678\n  0xdeadbeef\napplets: 0"});
+    const QByteArray dump = OutputOf(Tool("res dump out.kar"));
+    EXPECT_TRUE(dump.startsWith("=== Header ===")) << dump.left(200).constData();
+    ExpectContains(dump, {"Number of Resources:  5 (0x5)\n"});
 }
 
 TEST_F(InspectTool, BadSourcesAndForeignFilesAreUsageErrors)
@@ -91,17 +86,13 @@ TEST_F(InspectTool, TarListAndCatReadAnArchiveMadeByGnuTar)
     // Whatever follows the end-of-archive blocks is not listed, as with tar -t.
     const QByteArray archive = ReadFile(u"p.tar"_s);
     WriteFile(u"both.tar"_s, archive + ReadFile(u"late.tar"_s));
-    const ToolResult list = Tool("tar list both.tar");
-    EXPECT_EQ(list.status, 0) << list.err.constData();
-    EXPECT_EQ(list.out,
+    EXPECT_EQ(OutputOf(Tool("tar list both.tar")),
               QByteArray("d\t0\tmod/\n"
                          "-\t6\tmod/a.txt\n"
                          "-\t0\tmod/empty\n"
                          "l\t0\tmod/link -> a.txt\n"
                          "-\t1\tmod/red\\033[31m\\n\n"));
-    ToolResult r = Tool("tar cat p.tar mod/a.txt");
-    EXPECT_EQ(r.status, 0);
-    EXPECT_EQ(r.out, QByteArray("alpha\n"));
+    EXPECT_EQ(OutputOf(Tool("tar cat p.tar mod/a.txt")), QByteArray("alpha\n"));
     // A name is found as the listing shows it too.
     EXPECT_EQ(Tool("tar cat p.tar", u"mod/red\\033[31m\\n"_s).out, QByteArray("x"));
     WriteFile(u"cut.tar"_s, archive.left(1300));
@@ -117,12 +108,12 @@ TEST_F(InspectTool, TarListAndCatReadAnArchiveMadeByGnuTar)
         {"pkg/mod/a.txt a", "a.txt: does not look like a tar archive"},
     };
     for (const auto &refusal : refusals) {
-        r = Tool("tar cat", refusal.arguments);
+        const ToolResult r = Tool("tar cat", refusal.arguments);
         ExpectRefused(r, refusal.message);
         EXPECT_TRUE(r.err.startsWith("harness tar: ")) << r.err.constData();
     }
     // A damaged archive lists what comes before the damage, then says why.
-    r = Tool("tar list cut.tar");
+    const ToolResult r = Tool("tar list cut.tar");
     EXPECT_EQ(r.status, 2);
     EXPECT_EQ(r.out, QByteArray("d\t0\tmod/\n-\t6\tmod/a.txt\n"));
     EXPECT_TRUE(r.err.endsWith("cut.tar: unexpected end of archive at offset 1300\n")) << r.err.constData();
@@ -152,9 +143,8 @@ TEST_F(InspectTool, EncodeMatchesIconvAfterTheMarkAndDecodeReadsItBack)
         ASSERT_EQ(encoded.status, 0);
         const QByteArray bytes = QByteArray::fromHex(encoded.out.trimmed().replace(' ', ""));
         EXPECT_EQ(bytes, row.mark + expected) << encoded.out.constData();
-        const ToolResult decoded = Tool("decode", QString::fromLatin1(encoded.out.trimmed()));
-        EXPECT_EQ(decoded.status, 0);
-        EXPECT_EQ(QString::fromUtf8(decoded.out), QString::fromLatin1(row.format) + u'\t' + text + u'\n');
+        EXPECT_EQ(QString::fromUtf8(OutputOf(Tool("decode", QString::fromLatin1(encoded.out.trimmed())))),
+                  QString::fromLatin1(row.format) + u'\t' + text + u'\n');
     }
     EXPECT_EQ(Tool("encode EBCDIC x").status, 2);
     EXPECT_EQ(Tool("decode 0g").status, 2);

@@ -200,9 +200,7 @@ TEST_F(DemoRun, ReportsEveryModuleOfThisRunWithItsHandsetTimesLogsAndProgress)
     EXPECT_GE(summary[u"modules"][0][u"durationMs"].toInteger(-1), 0);
 
     // "-" is standard output, and the summary then goes to standard error.
-    const ToolResult toOutput = Tool("run IClock --json -");
-    EXPECT_EQ(toOutput.status, 0) << toOutput.err.constData();
-    EXPECT_EQ(QJsonDocument::fromJson(toOutput.out)[u"totals"][u"passed"].toInt(), 3) << toOutput.out.constData();
+    EXPECT_EQ(QJsonDocument::fromJson(OutputOf(Tool("run IClock --json -")))[u"totals"][u"passed"].toInt(), 3);
     EXPECT_FALSE(QFile::exists(dir.filePath(u"-"_s)));
     const ToolResult verbose = Tool("run --verbose IClock");
     ExpectContains(verbose.err, {"Running KVK test IClock"});
@@ -305,9 +303,7 @@ TEST_F(DemoRun, OneRunAtATimeOnAHandsetUnlessAskedToWait)
 TEST_F(DemoRun, TheNamedHandsetIsTheOneUsed)
 {
     AddHandset(u"demo-phone2"_s);
-    const ToolResult exact = Tool("run --target demo-phone IClock");
-    EXPECT_EQ(exact.status, 0) << exact.err.constData();
-    EXPECT_EQ(Rows(exact.out).value(u"IClock"_s), u"demo-phone 3 0 0 0"_s);
+    EXPECT_EQ(Rows(OutputOf(Tool("run --target demo-phone IClock"))).value(u"IClock"_s), u"demo-phone 3 0 0 0"_s);
 
     ExpectRefused(Tool("run --target phone IClock"), "'phone' matches several handsets: demo-phone, demo-phone2");
     WriteFile(handsets + u"/demo-phone/offline"_s, "");
@@ -321,10 +317,9 @@ TEST_F(DemoRun, AnUnreadableHistoryIsSaidOutLoud)
     WriteFile(results, ReadFile(results).left(60));
     ExpectRefused(Tool("run --retry"), "cannot retry: the processed results of demo-phone are unreadable");
 
-    const ToolResult run = Tool("run IClock");
-    EXPECT_EQ(run.status, 0) << run.err.constData();
-    const QRegularExpressionMatch kept = QRegularExpression(u"were kept as (\\S+)"_s).match(QString::fromUtf8(run.out));
-    ASSERT_TRUE(kept.hasMatch()) << run.out.constData();
+    const QString run = QString::fromUtf8(OutputOf(Tool("run IClock")));
+    const QRegularExpressionMatch kept = QRegularExpression(u"were kept as (\\S+)"_s).match(run);
+    ASSERT_TRUE(kept.hasMatch()) << run.toStdString();
     EXPECT_EQ(ReadFile(kept.captured(1)).size(), 60);
 }
 
@@ -377,16 +372,13 @@ TEST_F(DemoRun, SetUpFailuresAndBadFiltersAreRefusedBeforeAnythingRuns)
 
 TEST_F(DemoRun, FiltersSelectWhatTheyName)
 {
-    const ToolResult modules = Tool("modules");
-    ASSERT_EQ(modules.status, 0) << modules.err.constData();
-    ExpectContains(modules.out,
-                   {"ITimer\tctf\tsystem\ttimer\tKVK\t5\n", "PlatformVersion\tctf\tcore\tversion\tPVS\t2\n"});
-    ExpectLacks(modules.out, {"Helper"}); // secondary modules are never offered
+    const QByteArray modules = OutputOf(Tool("modules"));
+    ExpectContains(modules, {"ITimer\tctf\tsystem\ttimer\tKVK\t5\n", "PlatformVersion\tctf\tcore\tversion\tPVS\t2\n"});
+    ExpectLacks(modules, {"Helper"}); // secondary modules are never offered
 
     const ToolResult family = Tool("run --family SYSTEM --subfamily timer I*");
     EXPECT_EQ(Rows(family.out).keys(), QStringList{u"ITimer"_s}) << family.out.constData() << family.err.constData();
-    const ToolResult cases = Tool("run --test-cases ReadClock *clock");
-    EXPECT_EQ(cases.status, 0) << cases.err.constData();
+    OutputOf(Tool("run --test-cases ReadClock *clock"));
 }
 
 TEST_F(DemoRun, RetryAndProcessWorkFromTheHistory)
@@ -413,8 +405,7 @@ TEST_F(DemoRun, RetryAndProcessWorkFromTheHistory)
 TEST_F(DemoRun, ManifestKeepsBothCatalogues)
 {
     const QString folder = dir.filePath(u"catalogues"_s);
-    const ToolResult r = Tool("manifest -o", folder);
-    EXPECT_EQ(r.status, 0) << r.err.constData();
+    OutputOf(Tool("manifest -o", folder));
     ExpectContains(ReadXml(folder + u"/KVKManifest.xml"_s).toByteArray(), {"ITimer"});
     ExpectContains(ReadXml(folder + u"/PlatformManifest.xml"_s).toByteArray(), {"PlatformVersion"});
     EXPECT_EQ(Tool("manifest -o", dir.filePath(u"harness.log"_s)).status, 2);
@@ -447,9 +438,8 @@ TEST_F(DemoRun, RunAndProcessTakeTheKitPlatformAndLogTheyAreGiven)
         env.remove(QString::fromLatin1(name));
     const QString log = dir.filePath(u"given.log"_s), processLog = dir.filePath(u"process.log"_s);
     EXPECT_EQ(RunTool(Args("run IClock"), env, dir.path()).status, 2);
-    const ToolResult run = RunTool(Args("run", kit, "--log", log, "IClock PlatformVersion"), env, dir.path());
-    EXPECT_EQ(run.status, 0) << run.err.constData();
-    EXPECT_EQ(Rows(run.out).size(), 2) << run.out.constData(); // a kit module and a platform module
+    const QByteArray run = OutputOf(RunTool(Args("run", kit, "--log", log, "IClock PlatformVersion"), env, dir.path()));
+    EXPECT_EQ(Rows(run).size(), 2) << run.constData(); // a kit module and a platform module
     ExpectContains(ReadFile(log), {"Running KVK test IClock"});
 
     const QStringList process = Args("process", kit, "--log", processLog, "--log-dir", targets + u"/demo-phone/Logs"_s);
@@ -460,9 +450,7 @@ TEST_F(DemoRun, RunAndProcessTakeTheKitPlatformAndLogTheyAreGiven)
 TEST_F(DemoRun, ShardsOfOneSelectionMergeIntoTheVerdictsOfOneRun)
 {
     // The plan touches no handset.
-    const ToolResult plan = Tool("run --plan --shard-count 2");
-    EXPECT_EQ(plan.status, 0) << plan.err.constData();
-    ExpectContains(plan.out, {"Shard 0 of 2", "Shard 1 of 2"});
+    ExpectContains(OutputOf(Tool("run --plan --shard-count 2")), {"Shard 0 of 2", "Shard 1 of 2"});
     EXPECT_FALSE(QFile::exists(results));
     EXPECT_EQ(Tool("run --shard-index 2 --shard-count 2").status, 2);
 
@@ -489,9 +477,7 @@ TEST_F(DemoRun, ShardsOfOneSelectionMergeIntoTheVerdictsOfOneRun)
     EXPECT_EQ(rows.value(u"OatAudio"_s).section(u' ', 1), u"2 1 1 0"_s);
     EXPECT_EQ(rows.value(u"PlatformVersion"_s).section(u' ', 1), u"2 0 0 0"_s);
     // Each shard's module times came along, and plan the next split.
-    const ToolResult balanced = Tool("run --plan --shard-count 2 --timings", timings);
-    EXPECT_EQ(balanced.status, 0) << balanced.err.constData();
-    ExpectContains(balanced.out, {" ms"});
+    ExpectContains(OutputOf(Tool("run --plan --shard-count 2 --timings", timings)), {" ms"});
 
     // A shard that never reported leaves its modules not run.
     const ToolResult half = Tool("report --merge", results, "--expect-all");
@@ -537,9 +523,8 @@ TEST_F(DemoRun, ADryRunSaysWhatWouldRunWhereAndInWhichOrderAndTouchesNothing)
     AddHandset(u"demo-phone2"_s);
     // Not even an offline handset is a reason to stop: nothing is connected.
     WriteFile(handsets + u"/demo-phone2/offline"_s, "");
-    const ToolResult r = Tool("run --dry-run --retry --timeout 90 --target demo-phone --target demo-phone2");
-    EXPECT_EQ(r.status, 0) << r.err.constData();
-    EXPECT_EQ(QString::fromUtf8(r.out),
+    EXPECT_EQ(QString::fromUtf8(
+                  OutputOf(Tool("run --dry-run --retry --timeout 90 --target demo-phone --target demo-phone2"))),
               u"Dry run: nothing is installed or started.\n"
               "5 modules shared by demo-phone, demo-phone2 (one queue in this order; each handset takes "
               "the next module when it is free):\n"
