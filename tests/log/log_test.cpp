@@ -2,7 +2,6 @@
 
 #include "support/testutil.h"
 
-#include <QDir>
 #include <QTemporaryDir>
 
 #include <gtest/gtest.h>
@@ -48,14 +47,10 @@ TEST(Log, FirstOpenOfTheProcessTruncatesAndEveryLaterOpenAppends)
 TEST(Log, EmptyPathNamesLogTxtInTheCurrentDirectory)
 {
     QTemporaryDir dir;
-    const QString previous = QDir::currentPath();
-    ASSERT_TRUE(QDir::setCurrent(dir.path()));
-    {
-        Log log;
-        log.SetLogPath(QString());
-        log.LogMessage(u"hello\n"_s, false);
-    }
-    QDir::setCurrent(previous);
+    testutil::CurrentDirectory current(dir.path());
+    Log log;
+    log.SetLogPath(QString());
+    log.LogMessage(u"hello\n"_s, false);
     EXPECT_EQ(ReadFile(dir.filePath(u"log.txt"_s)), QByteArray("hello\n"));
 }
 
@@ -67,10 +62,8 @@ TEST(Log, FileGetsLatin1WhileTheConsoleGetsTheWholeText)
     const QString message = u"caf\u00e9 \u0141\u00f3d\u017a"_s;
     testing::internal::CaptureStdout();
     log.LogMessage(message, true);
-    const std::string console = testing::internal::GetCapturedStdout();
-    EXPECT_EQ(console, message.toStdString() + "\n");
-    EXPECT_EQ(ReadFile(dir.filePath(u"l.txt"_s)), message.toLatin1());
-    EXPECT_EQ(ReadFile(dir.filePath(u"l.txt"_s)).at(3), '\xe9');
+    EXPECT_EQ(testing::internal::GetCapturedStdout(), message.toStdString() + "\n");
+    EXPECT_EQ(ReadFile(dir.filePath(u"l.txt"_s)), QByteArray("caf\xe9 ?\xf3\x64?")); // "?" for what Latin-1 lacks
 }
 
 TEST(Log, EchoesWhenAskedOrVerboseWhateverTheFile)
