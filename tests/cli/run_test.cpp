@@ -4,9 +4,7 @@
 
 #include <QDir>
 #include <QFile>
-#include <QJsonArray>
 #include <QJsonDocument>
-#include <QJsonObject>
 #include <QLockFile>
 #include <QProcess>
 #include <QRegularExpression>
@@ -56,8 +54,7 @@ QByteArray OnTerminal(const QStringList &arguments, const QProcessEnvironment &e
 void HangITimer(const QString &root)
 {
     const QString folder = root + u"/kits/DemoKit/tests/system/timer/ITimer/package"_s;
-    const QString package = folder + u"/ITimer_Win32_Release.kestix"_s;
-    const QString work = folder + u"/unpacked"_s;
+    const QString package = folder + u"/ITimer_Win32_Release.kestix"_s, work = folder + u"/unpacked"_s;
     ASSERT_TRUE(QDir().mkpath(work));
     ASSERT_EQ(testutil::RunProgram(u"tar"_s, {u"-xf"_s, package, u"-C"_s, work}), 0);
     const QString behaviour = work + u"/itimer/behaviour"_s;
@@ -74,11 +71,8 @@ class DemoRun : public ::testing::Test
 protected:
     void SetUp() override
     {
-        ASSERT_TRUE(dir.isValid());
-        root = dir.filePath(u"demo"_s);
         const ToolResult init = RunTool(Args("demo init", root));
         ASSERT_EQ(init.status, 0) << init.err.constData();
-        env = QProcessEnvironment::systemEnvironment();
         static const QRegularExpression line(u"^export (\\w+)='(.*)'$"_s);
         for (const QString &text : QString::fromUtf8(init.out).split(u'\n', Qt::SkipEmptyParts)) {
             const QRegularExpressionMatch m = line.match(text);
@@ -87,9 +81,6 @@ protected:
         }
         env.insert(u"KESTIX_TIME_SCALE"_s, u"0"_s);
         handsets = env.value(u"KESTIX_HANDSETS"_s);
-        targets = root + u"/data/Norvane/Targets"_s;
-        results = Results(u"demo-phone"_s);
-        testData = root + u"/testdata/demo.ksx"_s;
     }
 
     QStringList WithLog(QStringList arguments) const
@@ -127,10 +118,12 @@ protected:
         WriteFile(handsets + u'/' + name + u"/handset.ini"_s,
                   ReadFile(handsets + u"/demo-phone/handset.ini"_s) + extra);
     }
-    void AddToIni(const QString &name, const QByteArray &extra)
+
+    // The JUnit file, checked against the schema CI servers read.
+    static QDomElement JUnit(const QString &path)
     {
-        const QString ini = handsets + u'/' + name + u"/handset.ini"_s;
-        WriteFile(ini, ReadFile(ini) + extra);
+        ExpectXmllintAccepts(path, u"junit/junit.xsd"_s);
+        return ReadXml(path).documentElement();
     }
 
     // How many progress lines "[n/6] demo-phone  ..." the output holds.
@@ -140,7 +133,7 @@ protected:
             QRegularExpression(u"^\\[[1-6]/6\\] demo-phone  "_s, QRegularExpression::MultilineOption));
     }
 
-    // What is left installed on a handset besides the framework folder.
+    // What is left installed on the demo's handset besides the framework folder.
     QStringList Installed() const
     {
         QStringList left
@@ -150,17 +143,19 @@ protected:
     }
 
     QTemporaryDir dir;
-    QString root;
+    const QString root = dir.filePath(u"demo"_s);
+    const QString targets = root + u"/data/Norvane/Targets"_s;
+    const QString results = Results(u"demo-phone"_s);
+    const QString ini = root + u"/handsets/demo-phone/handset.ini"_s;
+    const QString testData = root + u"/testdata/demo.ksx"_s;
+    const QString junit = dir.filePath(u"junit.xml"_s);
     QString handsets;
-    QString targets;
-    QString results;
-    QString testData;
-    QProcessEnvironment env;
+    QProcessEnvironment env = QProcessEnvironment::systemEnvironment();
 };
 
 TEST_F(DemoRun, ReportsEveryModuleOfThisRunWithItsHandsetTimesLogsAndProgress)
 {
-    const QString junit = dir.filePath(u"junit.xml"_s), json = dir.filePath(u"summary.json"_s);
+    const QString json = dir.filePath(u"summary.json"_s);
     const ToolResult r = Tool("run --test-data", testData, "--junit", junit, "--json", json);
     EXPECT_EQ(r.status, 1) << r.err.constData(); // some demo test cases fail on purpose
     const QMap<QString, QString> expected{
@@ -179,15 +174,14 @@ TEST_F(DemoRun, ReportsEveryModuleOfThisRunWithItsHandsetTimesLogsAndProgress)
     ExpectLacks(r.out + r.err, {"\033", "Running KVK test"});
     ExpectContains(ReadFile(dir.filePath(u"harness.log"_s)), {"Running KVK test"});
 
-    ExpectXmllintAccepts(junit, u"junit/junit.xsd"_s);
-    const QDomElement suites = ReadXml(junit).documentElement();
+    const QDomElement suites = JUnit(junit);
     EXPECT_EQ(suites.attribute(u"failures"_s), u"4"_s);
     EXPECT_EQ(suites.attribute(u"errors"_s), u"0"_s);
-    const QDomElement timerSuite = suites.elementsByTagName(u"testsuite"_s).at(1).toElement();
-    EXPECT_EQ(timerSuite.attribute(u"name"_s), u"ITimer"_s);
-    EXPECT_EQ(timerSuite.attribute(u"hostname"_s), u"demo-phone"_s);
-    EXPECT_FALSE(timerSuite.attribute(u"timestamp"_s).isEmpty());
-    const QString message = timerSuite.elementsByTagName(u"failure"_s).at(0).toElement().attribute(u"message"_s);
+    const QDomElement timer = suites.elementsByTagName(u"testsuite"_s).at(1).toElement();
+    EXPECT_EQ(timer.attribute(u"name"_s), u"ITimer"_s);
+    EXPECT_EQ(timer.attribute(u"hostname"_s), u"demo-phone"_s);
+    EXPECT_FALSE(timer.attribute(u"timestamp"_s).isEmpty());
+    const QString message = timer.elementsByTagName(u"failure"_s).at(0).toElement().attribute(u"message"_s);
     ExpectContains(message.toUtf8(), {"Test: Expiry / Result: FAIL", "/Logs/ITimer-"});
     // The unit test log gives each test case's time.
     const QDomElement sockets = suites.elementsByTagName(u"testsuite"_s).at(5).toElement();
@@ -206,14 +200,13 @@ TEST_F(DemoRun, ReportsEveryModuleOfThisRunWithItsHandsetTimesLogsAndProgress)
     ExpectContains(verbose.err, {"Running KVK test IClock"});
     ExpectLacks(verbose.err, {"\n\n"});
 
-    const Args arguments = WithLog(Args("run ITimer"));
+    const QStringList arguments = WithLog(Args("run ITimer"));
     const QByteArray coloured = OnTerminal(arguments, env, dir.path());
     if (coloured.isEmpty())
         GTEST_SKIP() << "no terminal to try colour on ('script' is missing or did not run)";
     ExpectContains(coloured, {"\033[32m3 passed\033[0m \033[31m1 failed\033[0m"});
-    QProcessEnvironment plain = env;
-    plain.insert(u"NO_COLOR"_s, u"1"_s);
-    const QByteArray noColour = OnTerminal(arguments, plain, dir.path());
+    env.insert(u"NO_COLOR"_s, u"1"_s);
+    const QByteArray noColour = OnTerminal(arguments, env, dir.path());
     ExpectContains(noColour, {"ITimer  3 passed 1 failed 1 unsupported"});
     ExpectLacks(noColour, {"\033[3"});
 }
@@ -221,20 +214,18 @@ TEST_F(DemoRun, ReportsEveryModuleOfThisRunWithItsHandsetTimesLogsAndProgress)
 TEST_F(DemoRun, AHandsetLostMidRunReportsErrorsNotAnEarlierRunsVerdicts)
 {
     ASSERT_EQ(Tool("run").status, 1); // a history where every module ran
-    AddToIni(u"demo-phone"_s, "offlineAfter=12\n");
-    const QString junit = dir.filePath(u"junit.xml"_s), html = dir.filePath(u"out/report.html"_s);
+    WriteFile(ini, ReadFile(ini) + "offlineAfter=12\n");
+    const QString html = dir.filePath(u"out/report.html"_s);
     QDir().mkpath(dir.filePath(u"out"_s));
     const ToolResult lost = Tool("run --junit", junit, "--html", html);
     EXPECT_EQ(lost.status, 1) << lost.err.constData();
-    const QMap<QString, QString> rows = Rows(lost.out);
-    EXPECT_EQ(rows.size(), 6) << lost.out.constData();
-    EXPECT_EQ(rows.value(u"PlatformVersion"_s), u"0 0 0 2"_s) << lost.out.constData();
+    EXPECT_EQ(Rows(lost.out).size(), 6) << lost.out.constData();
+    EXPECT_EQ(Rows(lost.out).value(u"PlatformVersion"_s), u"0 0 0 2"_s);
     ExpectContains(lost.out,
                    {"Not finished: IClock on demo-phone: handset lost",
                     "Not finished: Sockets: not run: every handset was lost", "HTML report: " + html.toUtf8() + "\n"});
-    ExpectXmllintAccepts(junit, u"junit/junit.xsd"_s);
-    const QDomDocument suites = ReadXml(junit);
-    EXPECT_EQ(suites.documentElement().attribute(u"errors"_s), u"21"_s);
+    const QDomElement suites = JUnit(junit);
+    EXPECT_EQ(suites.attribute(u"errors"_s), u"21"_s);
     EXPECT_EQ(suites.elementsByTagName(u"skipped"_s).size(), 0);
     EXPECT_EQ(suites.elementsByTagName(u"error"_s).at(0).toElement().attribute(u"message"_s), u"handset lost"_s);
 
@@ -251,7 +242,6 @@ TEST_F(DemoRun, AHandsetLostMidRunReportsErrorsNotAnEarlierRunsVerdicts)
 
 TEST_F(DemoRun, AnInterruptedRunEndsTheModuleInHandAndReportsTheRest)
 {
-    const QString junit = dir.filePath(u"junit.xml"_s);
     env.insert(u"KESTIX_TIME_SCALE"_s, u"0.2"_s); // time to stop it mid-run
     for (const int stops : {1, 2}) {
         SCOPED_TRACE(stops);
@@ -278,8 +268,7 @@ TEST_F(DemoRun, AnInterruptedRunEndsTheModuleInHandAndReportsTheRest)
         ExpectContains(out, {"interrupted before it ran"});
         EXPECT_EQ(Rows(out).value(u"IClock"_s), u"demo-phone 3 0 0 0"_s);
         EXPECT_EQ(Installed(), QStringList());
-        ExpectXmllintAccepts(junit, u"junit/junit.xsd"_s);
-        EXPECT_GT(ReadXml(junit).documentElement().attribute(u"errors"_s).toInt(), 0);
+        EXPECT_GT(JUnit(junit).attribute(u"errors"_s).toInt(), 0);
         QFile::remove(junit);
     }
 }
@@ -300,27 +289,34 @@ TEST_F(DemoRun, OneRunAtATimeOnAHandsetUnlessAskedToWait)
     EXPECT_EQ(waiting.exitCode(), 0) << err.constData() << waiting.readAllStandardError().constData();
 }
 
-TEST_F(DemoRun, TheNamedHandsetIsTheOneUsed)
+TEST_F(DemoRun, HandsetsAreTheOnesNamedAndADryRunSaysWhatWouldRunWhereAndTouchesNothing)
 {
     AddHandset(u"demo-phone2"_s);
     EXPECT_EQ(Rows(OutputOf(Tool("run --target demo-phone IClock"))).value(u"IClock"_s), u"demo-phone 3 0 0 0"_s);
-
     ExpectRefused(Tool("run --target phone IClock"), "'phone' matches several handsets: demo-phone, demo-phone2");
+
+    // Not even an offline handset is a reason to stop: nothing is connected.
+    const QByteArray before = ReadFile(results);
+    WriteFile(handsets + u"/demo-phone2/offline"_s, "");
+    EXPECT_EQ(QString::fromUtf8(
+                  OutputOf(Tool("run --dry-run --retry --timeout 90 --target demo-phone --target demo-phone2"))),
+              u"Dry run: nothing is installed or started.\n"
+              "5 modules shared by demo-phone, demo-phone2 (one queue in this order; each handset takes "
+              "the next module when it is free):\n"
+              "1. ITimer           ctf  KVK  5 test cases\n"
+              "2. PlatformVersion  ctf  PVS  2 test cases\n"
+              "3. Widgets          ctfapplet  KVK  3 test cases\n"
+              "4. OatAudio         oat  KVK  4 test cases\n"
+              "5. Sockets          uitf  KVK  4 test cases\n"
+              "--retry leaves out what the processed results show passed: IClock\n"
+              "A module still running after 90 s is stopped.\n"_s);
+    EXPECT_EQ(ReadFile(results), before);
+    EXPECT_FALSE(QFileInfo::exists(targets + u"/demo-phone/run.lock"_s));
+    EXPECT_EQ(Installed(), QStringList());
+
     WriteFile(handsets + u"/demo-phone/offline"_s, "");
     ExpectRefused(Tool("run --target demo-phone IClock"), "handset demo-phone is offline");
     EXPECT_FALSE(QFileInfo::exists(Results(u"demo-phone2"_s)));
-}
-
-TEST_F(DemoRun, AnUnreadableHistoryIsSaidOutLoud)
-{
-    ASSERT_EQ(Tool("run IClock").status, 0);
-    WriteFile(results, ReadFile(results).left(60));
-    ExpectRefused(Tool("run --retry"), "cannot retry: the processed results of demo-phone are unreadable");
-
-    const QString run = QString::fromUtf8(OutputOf(Tool("run IClock")));
-    const QRegularExpressionMatch kept = QRegularExpression(u"were kept as (\\S+)"_s).match(run);
-    ASSERT_TRUE(kept.hasMatch()) << run.toStdString();
-    EXPECT_EQ(ReadFile(kept.captured(1)).size(), 60);
 }
 
 TEST_F(DemoRun, SetUpFailuresAndBadFiltersAreRefusedBeforeAnythingRuns)
@@ -353,6 +349,7 @@ TEST_F(DemoRun, SetUpFailuresAndBadFiltersAreRefusedBeforeAnythingRuns)
         {Args("run"), u"KESTIX_HANDSETS"_s, empty, "no handset attached"},
         {Args("process"), {}, {}, "--log-dir"},
         {Args("process --log-dir", empty), {}, {}, "no logs"},
+        {Args("manifest -o", dir.filePath(u"a-file"_s)), {}, {}, "a-file"},
     };
     for (const auto &row : rows) {
         SCOPED_TRACE((row.arguments.join(u' ') + u' ' + row.variable).toStdString());
@@ -370,22 +367,25 @@ TEST_F(DemoRun, SetUpFailuresAndBadFiltersAreRefusedBeforeAnythingRuns)
         EXPECT_FALSE(QDir(caches.filePath(cache)).isEmpty()) << cache.toStdString();
 }
 
-TEST_F(DemoRun, FiltersSelectWhatTheyName)
+TEST_F(DemoRun, FiltersSelectWhatTheyNameAndTheManifestKeepsBothCatalogues)
 {
     const QByteArray modules = OutputOf(Tool("modules"));
     ExpectContains(modules, {"ITimer\tctf\tsystem\ttimer\tKVK\t5\n", "PlatformVersion\tctf\tcore\tversion\tPVS\t2\n"});
     ExpectLacks(modules, {"Helper"}); // secondary modules are never offered
-
     const ToolResult family = Tool("run --family SYSTEM --subfamily timer I*");
     EXPECT_EQ(Rows(family.out).keys(), QStringList{u"ITimer"_s}) << family.out.constData() << family.err.constData();
     OutputOf(Tool("run --test-cases ReadClock *clock"));
+
+    const QString folder = dir.filePath(u"catalogues"_s);
+    OutputOf(Tool("manifest -o", folder));
+    ExpectContains(ReadXml(folder + u"/KVKManifest.xml"_s).toByteArray(), {"ITimer"});
+    ExpectContains(ReadXml(folder + u"/PlatformManifest.xml"_s).toByteArray(), {"PlatformVersion"});
 }
 
-TEST_F(DemoRun, RetryAndProcessWorkFromTheHistory)
+TEST_F(DemoRun, RetryAndProcessWorkFromTheHistoryAndAnUnreadableOneIsSaidOutLoud)
 {
-    const QString ini = handsets + u"/demo-phone/handset.ini"_s;
     const QByteArray settings = ReadFile(ini);
-    AddToIni(u"demo-phone"_s, "offlineAfter=40\n");
+    WriteFile(ini, settings + "offlineAfter=40\n");
     ASSERT_EQ(Tool("run").status, 1);
     QFile::remove(handsets + u"/demo-phone/offline"_s);
     WriteFile(ini, settings);
@@ -397,18 +397,16 @@ TEST_F(DemoRun, RetryAndProcessWorkFromTheHistory)
 
     const QString again = dir.filePath(u"again.xml"_s);
     const ToolResult process = Tool("process --log-dir", targets + u"/demo-phone/Logs"_s, "--results", again);
-    EXPECT_EQ(process.status, 1) << process.err.constData() << process.out.constData(); // as report: a test case failed
+    EXPECT_EQ(process.status, 1) << process.err.constData(); // as report: a test case failed
     EXPECT_EQ(Rows(process.out).value(u"ITimer"_s), u"3 1 1 0"_s) << process.out.constData();
     EXPECT_TRUE(QFile::exists(again));
-}
 
-TEST_F(DemoRun, ManifestKeepsBothCatalogues)
-{
-    const QString folder = dir.filePath(u"catalogues"_s);
-    OutputOf(Tool("manifest -o", folder));
-    ExpectContains(ReadXml(folder + u"/KVKManifest.xml"_s).toByteArray(), {"ITimer"});
-    ExpectContains(ReadXml(folder + u"/PlatformManifest.xml"_s).toByteArray(), {"PlatformVersion"});
-    EXPECT_EQ(Tool("manifest -o", dir.filePath(u"harness.log"_s)).status, 2);
+    WriteFile(results, ReadFile(results).left(60));
+    ExpectRefused(Tool("run --retry"), "cannot retry: the processed results of demo-phone are unreadable");
+    const QString run = QString::fromUtf8(OutputOf(Tool("run IClock")));
+    const QRegularExpressionMatch kept = QRegularExpression(u"were kept as (\\S+)"_s).match(run);
+    ASSERT_TRUE(kept.hasMatch()) << run.toStdString();
+    EXPECT_EQ(ReadFile(kept.captured(1)).size(), 60);
 }
 
 TEST_F(DemoRun, SharedRunsNameTheHandsetOfEachModule)
@@ -417,7 +415,7 @@ TEST_F(DemoRun, SharedRunsNameTheHandsetOfEachModule)
     AddHandset(u"demo-phone3"_s);
     WriteFile(handsets + u"/demo-phone3/offline"_s, "");
     const ToolResult r = Tool("run --verbose --all-targets --test-data", testData);
-    EXPECT_EQ(r.status, 1) << r.err.constData() << r.out.constData();
+    EXPECT_EQ(r.status, 1) << r.err.constData();
     // Every progress line and every library line names its handset.
     EXPECT_EQ(ProgressLines(r.out), 6) << r.out.constData();
     ExpectContains(r.out,
@@ -425,9 +423,9 @@ TEST_F(DemoRun, SharedRunsNameTheHandsetOfEachModule)
                     "Handset demo-phone3 could not be connected"});
     ExpectContains(r.err, {"\ndemo-phone: Running KVK test ITimer", "\ndemo-phone2: Running "});
     const QMap<QString, QString> rows = Rows(r.out);
-    EXPECT_EQ(rows.value(u"ITimer"_s), u"demo-phone 3 1 1 0"_s) << r.out.constData();
-    EXPECT_EQ(rows.value(u"OatAudio"_s), u"demo-phone 2 1 1 0"_s);
     EXPECT_EQ(rows.size(), 6);
+    EXPECT_EQ(rows.value(u"ITimer"_s), u"demo-phone 3 1 1 0"_s);
+    EXPECT_EQ(rows.value(u"OatAudio"_s), u"demo-phone 2 1 1 0"_s);
 }
 
 TEST_F(DemoRun, RunAndProcessTakeTheKitPlatformAndLogTheyAreGiven)
@@ -441,9 +439,8 @@ TEST_F(DemoRun, RunAndProcessTakeTheKitPlatformAndLogTheyAreGiven)
     const QByteArray run = OutputOf(RunTool(Args("run", kit, "--log", log, "IClock PlatformVersion"), env, dir.path()));
     EXPECT_EQ(Rows(run).size(), 2) << run.constData(); // a kit module and a platform module
     ExpectContains(ReadFile(log), {"Running KVK test IClock"});
-
-    const QStringList process = Args("process", kit, "--log", processLog, "--log-dir", targets + u"/demo-phone/Logs"_s);
-    EXPECT_EQ(RunTool(process, env, dir.path()).status, 0);
+    OutputOf(RunTool(Args("process", kit, "--log", processLog, "--log-dir", targets + u"/demo-phone/Logs"_s), env,
+                     dir.path()));
     ExpectContains(ReadFile(processLog), {"Process Complete"});
 }
 
@@ -489,7 +486,6 @@ TEST_F(DemoRun, ShardsOfOneSelectionMergeIntoTheVerdictsOfOneRun)
 TEST_F(DemoRun, AModulePastItsTimeoutIsStoppedRemovedAndReportedWhileTheRunGoesOn)
 {
     HangITimer(root);
-    const QString junit = dir.filePath(u"junit.xml"_s);
     // 150 s on the library's clock: instant at time scale 0.
     const ToolResult r = Tool("run --timeout 150 --junit", junit, "ITimer IClock");
     EXPECT_EQ(r.status, 1) << r.err.constData();
@@ -500,45 +496,18 @@ TEST_F(DemoRun, AModulePastItsTimeoutIsStoppedRemovedAndReportedWhileTheRunGoesO
         uR"(\n\[\.\.\.\] demo-phone  ITimer  still running: waiting for its log, [12] min \d+ s\n)"_s);
     EXPECT_EQ(QString::fromUtf8(r.out).count(alive), 2) << r.out.constData();
     EXPECT_EQ(Installed(), QStringList());
-    ExpectXmllintAccepts(junit, u"junit/junit.xsd"_s);
-    EXPECT_EQ(ReadXml(junit).documentElement().attribute(u"errors"_s), u"5"_s);
-
-    // On a terminal the same wait is a status line rewritten in place.
-    const QByteArray terminal = OnTerminal(WithLog(Args("run --timeout 20 ITimer")), env, dir.path());
-    if (testutil::HaveProgram(u"script"_s)) {
-        EXPECT_TRUE(QString::fromUtf8(terminal).contains(
-            QRegularExpression(u"\r\033\\[KITimer on demo-phone: waiting for its log, 1\\d s"_s)))
-            << terminal.constData();
-        ExpectLacks(terminal, {"still running"});
-    }
+    EXPECT_EQ(JUnit(junit).attribute(u"errors"_s), u"5"_s);
 
     for (const char *bad : {"0", "-3", "soon", "1e9"})
         ExpectRefused(Tool("run --timeout", bad), "--timeout needs a number of seconds");
-}
-
-TEST_F(DemoRun, ADryRunSaysWhatWouldRunWhereAndInWhichOrderAndTouchesNothing)
-{
-    ASSERT_EQ(Tool("run IClock").status, 0);
-    const QByteArray before = ReadFile(results);
-    AddHandset(u"demo-phone2"_s);
-    // Not even an offline handset is a reason to stop: nothing is connected.
-    WriteFile(handsets + u"/demo-phone2/offline"_s, "");
-    EXPECT_EQ(QString::fromUtf8(
-                  OutputOf(Tool("run --dry-run --retry --timeout 90 --target demo-phone --target demo-phone2"))),
-              u"Dry run: nothing is installed or started.\n"
-              "5 modules shared by demo-phone, demo-phone2 (one queue in this order; each handset takes "
-              "the next module when it is free):\n"
-              "1. ITimer           ctf  KVK  5 test cases\n"
-              "2. PlatformVersion  ctf  PVS  2 test cases\n"
-              "3. Widgets          ctfapplet  KVK  3 test cases\n"
-              "4. OatAudio         oat  KVK  4 test cases\n"
-              "5. Sockets          uitf  KVK  4 test cases\n"
-              "--retry leaves out what the processed results show passed: IClock\n"
-              "A module still running after 90 s is stopped.\n"_s);
-    EXPECT_EQ(ReadFile(results), before);
-    EXPECT_FALSE(QFileInfo::exists(Results(u"demo-phone2"_s)));
-    EXPECT_FALSE(QFileInfo::exists(targets + u"/demo-phone/run.lock"_s));
-    EXPECT_EQ(Installed(), QStringList());
+    // On a terminal the same wait is a status line rewritten in place.
+    const QByteArray terminal = OnTerminal(WithLog(Args("run --timeout 20 ITimer")), env, dir.path());
+    if (terminal.isEmpty())
+        GTEST_SKIP() << "no terminal to try the status line on ('script' is missing or did not run)";
+    EXPECT_TRUE(QString::fromUtf8(terminal).contains(
+        QRegularExpression(u"\r\033\\[KITimer on demo-phone: waiting for its log, 1\\d s"_s)))
+        << terminal.constData();
+    ExpectLacks(terminal, {"still running"});
 }
 
 TEST_F(DemoRun, TheHtmlReportEscapesNamesAndSaysThatNoHistoryIsRecorded)
@@ -547,8 +516,7 @@ TEST_F(DemoRun, TheHtmlReportEscapesNamesAndSaysThatNoHistoryIsRecorded)
     WriteFile(file,
               "<testmodules><module name=\"&lt;script&gt;alert(1)&lt;/script&gt;\" family=\"a&amp;b\" source=\"KVK\">"
               "<testcase name=\"&lt;img src=x onerror=alert(2)&gt;\" result=\"fail\"/></module></testmodules>");
-    const ToolResult r = RunTool(Args("report", file, "--html", html), env, dir.path());
-    EXPECT_EQ(r.status, 1) << r.err.constData();
+    EXPECT_EQ(RunTool(Args("report", file, "--html", html), env, dir.path()).status, 1);
     const QByteArray page = ReadFile(html);
     ExpectContains(page,
                    {"&lt;script&gt;alert(1)&lt;/script&gt;", "&lt;img src=x onerror=alert(2)&gt;", "a&amp;b",
@@ -557,7 +525,6 @@ TEST_F(DemoRun, TheHtmlReportEscapesNamesAndSaysThatNoHistoryIsRecorded)
     EXPECT_EQ(page.count("<script>"), 1); // the page's own
 }
 
-// Headless Chromium renders the report of a run shared by two handsets.
 TEST_F(DemoRun, TheHtmlReportWorksInARealBrowser)
 {
     QString chromium = QStandardPaths::findExecutable(u"chromium"_s);
