@@ -55,7 +55,7 @@ TEST_F(DemoInit, PrintsTheVariablesThatPointAtIt)
     EXPECT_EQ(Tool("demo init empty").status, 0);
 }
 
-TEST_F(DemoInit, PackagesAreTarArchivesWithReadableModuleInformation)
+TEST_F(DemoInit, PackagesScriptsAndDescriptionsAreWhatTarShPerlAndXmllintRead)
 {
     const QStringList packages = Files(u"*.kestix"_s);
     EXPECT_EQ(packages.size(), 4 + 6 + 1); // frameworks; the kit's modules, a secondary one among them; the platform's
@@ -83,10 +83,7 @@ TEST_F(DemoInit, PackagesAreTarArchivesWithReadableModuleInformation)
         }
         EXPECT_TRUE(haveMif);
     }
-}
-
-TEST_F(DemoInit, ScriptsAreValidShellAndPerlAndDescriptionsValidXml)
-{
+    // Scripts are valid shell and Perl, descriptions valid XML.
     const QStringList descriptions = Files(u"*module.xml"_s);
     EXPECT_EQ(descriptions.size(), 6);
     for (const QString &path : descriptions)

@@ -7,13 +7,7 @@
 
 namespace {
 
-class ClockTest : public ::testing::Test
-{
-protected:
-    void TearDown() override { Clock::SetScale(0.0); }
-};
-
-TEST_F(ClockTest, ScaleZeroAdvancesTheClockWithoutWaiting)
+TEST(Clock, ScaleZeroAdvancesTheClockWithoutWaiting)
 {
     Clock::SetScale(0.0);
     QElapsedTimer real;
@@ -30,7 +24,7 @@ TEST_F(ClockTest, ScaleZeroAdvancesTheClockWithoutWaiting)
     EXPECT_LT(timer.Elapsed() - before, 1000);
 }
 
-TEST_F(ClockTest, SkippedTimeBelongsToTheSleepingThreadOnly)
+TEST(Clock, SkippedTimeBelongsToTheSleepingThreadOnly)
 {
     Clock::SetScale(0.0);
     const qint64 before = Clock::Now();

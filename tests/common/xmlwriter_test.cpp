@@ -5,9 +5,7 @@
 #include "support/testutil.h"
 
 #include <QBuffer>
-#include <QDir>
 #include <QFile>
-#include <QProcess>
 #include <QTemporaryDir>
 
 #include <gtest/gtest.h>
