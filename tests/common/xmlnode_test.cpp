@@ -19,14 +19,11 @@ public:
 namespace {
 
 // What Qt's DOM makes of a document, written by our writer: the reference
-// the light tree is held to.
-QString ThroughDom(const QByteArray &bytes, bool *parsed = nullptr)
+// the light tree is held to; null when the DOM refuses it.
+QString ThroughDom(const QByteArray &bytes)
 {
     QDomDocument document;
-    const bool ok = bool(document.setContent(bytes));
-    if (parsed)
-        *parsed = ok;
-    return ok ? XmlWriter::ToString(document.documentElement()) : QString();
+    return document.setContent(bytes) ? XmlWriter::ToString(document.documentElement()) : QString();
 }
 
 QString ThroughTree(const std::unique_ptr<XmlNode> &root)
@@ -97,9 +94,8 @@ TEST(XmlNode, ReadsEveryDocumentAsTheDomDoes)
 {
     for (size_t i = 0; i < std::size(kWellFormed); ++i) {
         const QByteArray bytes(kWellFormed[i]);
-        bool parsed = false;
-        const QString expected = ThroughDom(bytes, &parsed);
-        ASSERT_TRUE(parsed) << bytes.constData();
+        const QString expected = ThroughDom(bytes);
+        ASSERT_FALSE(expected.isNull()) << bytes.constData();
         EXPECT_EQ(ThroughTree(XmlNode::Parse(bytes)), expected) << bytes.constData();
         EXPECT_EQ(ThroughTree(XmlNode::ParseFully(bytes)), expected) << bytes.constData();
         // Plain documents never need the slower reader.
@@ -119,7 +115,6 @@ TEST(XmlNode, RejectsMalformedDocumentsWithTheDomsMessageAndPlace)
         XmlParseError error, fullError;
         EXPECT_EQ(XmlNode::Parse(bytes, &error), nullptr) << text;
         EXPECT_EQ(XmlNode::ParseFully(bytes, &fullError), nullptr) << text;
-        EXPECT_FALSE(error.message.isEmpty()) << text;
         EXPECT_EQ(error.message, domError) << text;
         EXPECT_EQ(error.line, domLine) << text;
         EXPECT_EQ(error.column, domColumn) << text;
@@ -132,10 +127,8 @@ TEST(XmlNode, ReadsTextThatIconvEncodedInUtf16)
     if (!testutil::HaveProgram(u"iconv"_s))
         GTEST_SKIP() << "iconv is not installed";
     QTemporaryDir dir;
-    ASSERT_TRUE(dir.isValid());
     const QString source = dir.filePath(u"in.xml"_s);
-    const QByteArray utf8("<?xml version=\"1.0\" encoding=\"UTF-16\"?><r n=\"\xC3\xA9\">\xE6\x97\xA5</r>");
-    testutil::WriteFile(source, utf8);
+    testutil::WriteFile(source, "<?xml version=\"1.0\" encoding=\"UTF-16\"?><r n=\"\xC3\xA9\">\xE6\x97\xA5</r>");
     QByteArray utf16;
     ASSERT_EQ(testutil::RunProgram(u"iconv"_s, {u"-f"_s, u"UTF-8"_s, u"-t"_s, u"UTF-16"_s, source}, &utf16), 0);
     const std::unique_ptr<XmlNode> root = XmlNode::Parse(utf16);
@@ -157,17 +150,8 @@ TEST(XmlNode, AgreesWithTheFullReaderOnMutatedDocuments)
         for (int e = 0; e < edits && !bytes.isEmpty(); ++e) {
             const int at = random.bounded(int(bytes.size()));
             const char c = alphabet.at(random.bounded(int(alphabet.size())));
-            switch (random.bounded(3)) {
-            case 0:
-                bytes[at] = c;
-                break;
-            case 1:
-                bytes.insert(at, c);
-                break;
-            default:
-                bytes.remove(at, 1);
-                break;
-            }
+            const int kind = random.bounded(3); // replace, insert or remove
+            bytes.replace(at, kind == 1 ? 0 : 1, kind == 2 ? QByteArray() : QByteArray(1, c));
         }
         const std::unique_ptr<XmlNode> quick = XmlNodeTestAccess::ParseQuickly(bytes);
         if (quick) {
