@@ -52,11 +52,7 @@ TEST_F(InspectTool, BadSourcesAndForeignFilesAreUsageErrors)
     WriteFile(u"twice.xml"_s,
               "<resources><string id=\"3\">a</string><object id=\"4\">b</object>\n"
               "<string id=\"3\">c</string></resources>");
-    const struct
-    {
-        const char *arguments;
-        const char *message;
-    } rows[] = {
+    const std::pair<const char *, const char *> rows[] = {
         {"res compile bad.xml o.kar", "bad id"},
         {"res compile twice.xml o.kar", "line 2: duplicate resource ID 3 of type 0x1"},
         {"res compile src.xml missing/o.kar", "missing/o.kar"},
@@ -64,9 +60,9 @@ TEST_F(InspectTool, BadSourcesAndForeignFilesAreUsageErrors)
         {"mif missing.mif", "missing.mif"},
         {"res frobnicate junk.kar", "expected 'dump FILE'"},
     };
-    for (const auto &row : rows) {
-        const ToolResult r = Tool(row.arguments);
-        ExpectRefused(r, row.message);
+    for (const auto &[arguments, message] : rows) {
+        const ToolResult r = Tool(arguments);
+        ExpectRefused(r, message);
         ExpectLacks(r.err, {"()"});
     }
     EXPECT_FALSE(QFile::exists(u"o.kar"_s));
@@ -96,20 +92,16 @@ TEST_F(InspectTool, TarListAndCatReadAnArchiveMadeByGnuTar)
     // A name is found as the listing shows it too.
     EXPECT_EQ(Tool("tar cat p.tar", u"mod/red\\033[31m\\n"_s).out, QByteArray("x"));
     WriteFile(u"cut.tar"_s, archive.left(1300));
-    const struct
-    {
-        const char *arguments;
-        const char *message;
-    } refusals[] = {
+    const std::pair<const char *, const char *> refusals[] = {
         {"p.tar mod/none", "no member mod/none"},
         {"p.tar mod/", "mod/ is a directory"},
         {"p.tar mod/link", "mod/link is a symbolic link to a.txt"},
         {"cut.tar mod/a.txt", "cut.tar: unexpected end of archive at offset 1300"},
         {"pkg/mod/a.txt a", "a.txt: does not look like a tar archive"},
     };
-    for (const auto &refusal : refusals) {
-        const ToolResult r = Tool("tar cat", refusal.arguments);
-        ExpectRefused(r, refusal.message);
+    for (const auto &[arguments, message] : refusals) {
+        const ToolResult r = Tool("tar cat", arguments);
+        ExpectRefused(r, message);
         EXPECT_TRUE(r.err.startsWith("harness tar: ")) << r.err.constData();
     }
     // A damaged archive lists what comes before the damage, then says why.
@@ -125,26 +117,22 @@ TEST_F(InspectTool, EncodeMatchesIconvAfterTheMarkAndDecodeReadsItBack)
         GTEST_SKIP() << "iconv not installed";
     const QString text = u"\u4e2d\u6587 A"_s; // 中文 A
     WriteFile(u"text.txt"_s, text.toUtf8());
-    const struct
-    {
-        const char *format;
-        const char *iconvName;
-        QByteArray mark;
-    } rows[] = {
+    const std::tuple<const char *, const char *, QByteArray> rows[] = {
+        // format, iconv's name for it, mark
         {"S-JIS", "SHIFT_JIS", "\xfd\xfe"},
         {"GB2312", "GB2312", "\xfc\xfe"},
         {"UTF-8", "UTF-8", "\x02"},
     };
-    for (const auto &row : rows) {
-        SCOPED_TRACE(row.format);
+    for (const auto &[format, iconvName, mark] : rows) {
+        SCOPED_TRACE(format);
         QByteArray expected;
-        ASSERT_EQ(testutil::RunProgram(u"iconv"_s, Args("-f UTF-8 -t", row.iconvName, "text.txt"), &expected), 0);
-        const ToolResult encoded = Tool("encode", row.format, text);
+        ASSERT_EQ(testutil::RunProgram(u"iconv"_s, Args("-f UTF-8 -t", iconvName, "text.txt"), &expected), 0);
+        const ToolResult encoded = Tool("encode", format, text);
         ASSERT_EQ(encoded.status, 0);
         const QByteArray bytes = QByteArray::fromHex(encoded.out.trimmed().replace(' ', ""));
-        EXPECT_EQ(bytes, row.mark + expected) << encoded.out.constData();
+        EXPECT_EQ(bytes, mark + expected) << encoded.out.constData();
         EXPECT_EQ(QString::fromUtf8(OutputOf(Tool("decode", QString::fromLatin1(encoded.out.trimmed())))),
-                  QString::fromLatin1(row.format) + u'\t' + text + u'\n');
+                  QString::fromLatin1(format) + u'\t' + text + u'\n');
     }
     EXPECT_EQ(Tool("encode EBCDIC x").status, 2);
     EXPECT_EQ(Tool("decode 0g").status, 2);
@@ -152,24 +140,20 @@ TEST_F(InspectTool, EncodeMatchesIconvAfterTheMarkAndDecodeReadsItBack)
 
 TEST_F(InspectTool, TextAnEncodingCannotHoldIsNamedAndNothingIsStored)
 {
-    const struct
-    {
-        const char *format;
-        QString text;
-        QByteArray lost; // the line on standard error, empty when every character is held
-    } rows[] = {
+    // Format, text, and the line on standard error (empty when every character is held).
+    const std::tuple<const char *, QString, QByteArray> rows[] = {
         {"1", u"H\u00e9llo \u30c6"_s, "character 7 U+30C6 '\xe3\x83\x86'"},
         {"ISOLATIN1", u"H\u00e9llo"_s, {}},
         {"S-JIS", u"\u00e9\u30c6"_s, "character 1 U+00E9 '\xc3\xa9'"},
         {"UTF-8", u"\u30c6\U0001F600"_s, {}},
     };
-    for (const auto &row : rows) {
-        SCOPED_TRACE(row.format);
-        const ToolResult r = Tool("encode", row.format, row.text);
-        EXPECT_EQ(r.status, row.lost.isEmpty() ? 0 : 1) << r.err.constData();
-        EXPECT_EQ(r.out.isEmpty(), !row.lost.isEmpty());
-        EXPECT_EQ(r.err.count('\n'), row.lost.isEmpty() ? 0 : 1);
-        EXPECT_TRUE(r.err.contains(row.lost)) << r.err.constData();
+    for (const auto &[format, text, lost] : rows) {
+        SCOPED_TRACE(format);
+        const ToolResult r = Tool("encode", format, text);
+        EXPECT_EQ(r.status, lost.isEmpty() ? 0 : 1) << r.err.constData();
+        EXPECT_EQ(r.out.isEmpty(), !lost.isEmpty());
+        EXPECT_EQ(r.err.count('\n'), lost.isEmpty() ? 0 : 1);
+        EXPECT_TRUE(r.err.contains(lost)) << r.err.constData();
     }
 
     WriteFile(u"lossy.xml"_s,

@@ -324,13 +324,8 @@ TEST_F(DemoRun, SetUpFailuresAndBadFiltersAreRefusedBeforeAnythingRuns)
     const QString missing = dir.filePath(u"missing/file"_s), empty = dir.filePath(u"empty"_s);
     WriteFile(dir.filePath(u"a-file"_s), "x");
     QDir().mkpath(empty);
-    const struct
-    {
-        QStringList arguments;
-        QString variable;
-        QString value;
-        const char *error;
-    } rows[] = {
+    // Arguments, a variable set for the run and its value, the message.
+    const std::tuple<QStringList, QString, QString, const char *> rows[] = {
         {Args("run --test-data", missing), {}, {}, "--test-data: "},
         {Args("run --dpk", missing), {}, {}, "--dpk: "},
         {Args("run"), u"KESTIX_TOOLSET"_s, missing, "tool set"},
@@ -351,12 +346,12 @@ TEST_F(DemoRun, SetUpFailuresAndBadFiltersAreRefusedBeforeAnythingRuns)
         {Args("process --log-dir", empty), {}, {}, "no logs"},
         {Args("manifest -o", dir.filePath(u"a-file"_s)), {}, {}, "a-file"},
     };
-    for (const auto &row : rows) {
-        SCOPED_TRACE((row.arguments.join(u' ') + u' ' + row.variable).toStdString());
+    for (const auto &[arguments, variable, value, error] : rows) {
+        SCOPED_TRACE((arguments.join(u' ') + u' ' + variable).toStdString());
         const QProcessEnvironment saved = env;
-        if (!row.variable.isEmpty())
-            env.insert(row.variable, row.value);
-        ExpectRefused(Tool(row.arguments), row.error);
+        if (!variable.isEmpty())
+            env.insert(variable, value);
+        ExpectRefused(Tool(arguments), error);
         env = saved;
     }
     EXPECT_FALSE(QFileInfo::exists(results));

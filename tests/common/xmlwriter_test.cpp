@@ -28,11 +28,8 @@ QDomDocument Parse(const QString &text)
 // the nodes the document holds (a declaration, no document type).
 TEST(XmlWriter, WritesParsedDocumentsInOneOrderAndIndentation)
 {
-    const struct
-    {
-        QString read;
-        QString written;
-    } rows[] = {
+    const std::pair<QString, QString> rows[] = {
+        // as read, as written
         {u"<manifest><module zeta='ZETA' name='NAME' alpha='ALPHA' type='TYPE' id='ID' b='B'>"
          "<testcase>Run &amp; &lt;check></testcase></module></manifest>"_s,
          u"<manifest>\n"
@@ -48,10 +45,10 @@ TEST(XmlWriter, WritesParsedDocumentsInOneOrderAndIndentation)
         {u"<?xml version=\"1.0\"?><a/>"_s, u"<?xml version='1.0'?>\n<a/>\n"_s},
         {u"<!DOCTYPE a SYSTEM \"a.dtd\"><a/>"_s, u"<a/>\n"_s},
     };
-    for (const auto &row : rows) {
-        const QDomDocument doc = Parse(row.read);
-        EXPECT_EQ(XmlWriter::ToString(doc), row.written);
-        EXPECT_EQ(XmlWriter::Serialize(doc), row.written.toUtf8());
+    for (const auto &[read, written] : rows) {
+        const QDomDocument doc = Parse(read);
+        EXPECT_EQ(XmlWriter::ToString(doc), written);
+        EXPECT_EQ(XmlWriter::Serialize(doc), written.toUtf8());
     }
 }
 
