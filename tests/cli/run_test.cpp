@@ -96,14 +96,17 @@ protected:
         return RunTool(WithLog(Args(parts...)), env, dir.path());
     }
 
-    // The tool started in the background; its standard error is its read channel.
-    void Start(QProcess &tool, const QStringList &arguments)
+    // Starts the tool in the background; returns its standard error up to where it says text.
+    QByteArray Start(QProcess &tool, const QStringList &arguments, const char *text)
     {
         tool.setProcessEnvironment(env);
         tool.setWorkingDirectory(dir.path());
         tool.setReadChannel(QProcess::StandardError);
         tool.start(HarnessProgram(), WithLog(arguments));
-        ASSERT_TRUE(tool.waitForStarted());
+        EXPECT_TRUE(tool.waitForStarted());
+        QByteArray err;
+        ReadUntil(tool, err, text);
+        return err;
     }
 
     QString Results(const QString &handset) const
@@ -246,11 +249,9 @@ TEST_F(DemoRun, AnInterruptedRunEndsTheModuleInHandAndReportsTheRest)
     for (const int stops : {1, 2}) {
         SCOPED_TRACE(stops);
         QProcess tool;
-        Start(tool, Args("run --verbose --junit", junit));
         // Stop as soon as the first module is under way.
-        QByteArray err;
-        ReadUntil(tool, err, "Running KVK test");
-        ASSERT_GT(tool.processId(), 0) << err.constData();
+        QByteArray err = Start(tool, Args("run --verbose --junit", junit), "Running KVK test");
+        ASSERT_GT(tool.processId(), 0) << err.constData(); // never signal a whole process group
         ::kill(pid_t(tool.processId()), SIGINT);
         if (stops == 2) {
             ReadUntil(tool, err, "signal again");
@@ -281,9 +282,7 @@ TEST_F(DemoRun, OneRunAtATimeOnAHandsetUnlessAskedToWait)
     ExpectRefused(Tool("run IClock"), "handset demo-phone is in use by process " + QByteArray::number(getpid()));
 
     QProcess waiting;
-    Start(waiting, Args("run --wait IClock"));
-    QByteArray err;
-    ReadUntil(waiting, err, "waiting");
+    const QByteArray err = Start(waiting, Args("run --wait IClock"), "waiting");
     held.unlock();
     ASSERT_TRUE(waiting.waitForFinished(60000));
     EXPECT_EQ(waiting.exitCode(), 0) << err.constData() << waiting.readAllStandardError().constData();
