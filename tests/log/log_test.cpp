@@ -17,11 +17,10 @@ using testutil::ReadFile;
 using testutil::WriteFile;
 
 // The program's first test: the process-wide first-open flag is still fresh.
-TEST(Log, FirstOpenOfTheProcessTruncatesAndEveryLaterOpenAppends)
+TEST(Log, FirstOpenOfTheProcessTruncatesEveryLaterOneAppendsAndNoPathIsLogTxt)
 {
     QTemporaryDir dir;
-    const QString first = dir.filePath(u"first.txt"_s);
-    const QString second = dir.filePath(u"second.txt"_s);
+    const QString first = dir.filePath(u"first.txt"_s), second = dir.filePath(u"second.txt"_s);
     WriteFile(first, "old first\n");
     WriteFile(second, "old second\n");
 
@@ -42,15 +41,11 @@ TEST(Log, FirstOpenOfTheProcessTruncatesAndEveryLaterOpenAppends)
     a.SetLogPath(third);
     a.LogMessage(u"four"_s, false);
     EXPECT_EQ(ReadFile(third), QByteArray("kept\nfour"));
-}
 
-TEST(Log, EmptyPathNamesLogTxtInTheCurrentDirectory)
-{
-    QTemporaryDir dir;
+    // An empty path names log.txt in the current folder.
     testutil::CurrentDirectory current(dir.path());
-    Log log;
-    log.SetLogPath(QString());
-    log.LogMessage(u"hello\n"_s, false);
+    a.SetLogPath(QString());
+    a.LogMessage(u"hello\n"_s, false);
     EXPECT_EQ(ReadFile(dir.filePath(u"log.txt"_s)), QByteArray("hello\n"));
 }
 
