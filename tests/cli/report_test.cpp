@@ -69,6 +69,21 @@ TEST_F(ReportTool, JUnitAndJsonFilesCarryTheVerdicts)
     EXPECT_EQ(json[u"totals"][u"passed"].toInt(), 1);
 }
 
+TEST_F(ReportTool, TheHtmlPageEscapesNamesAndSaysThatNoHistoryIsRecorded)
+{
+    testutil::WriteFile(
+        u"results.xml"_s,
+        "<testmodules><module name=\"&lt;script&gt;alert(1)&lt;/script&gt;\" family=\"a&amp;b\" source=\"KVK\">"
+        "<testcase name=\"&lt;img src=x onerror=alert(2)&gt;\" result=\"fail\"/></module></testmodules>");
+    EXPECT_EQ(Tool("report results.xml --html history.html").status, 1);
+    const QByteArray page = testutil::ReadFile(u"history.html"_s);
+    ExpectContains(page,
+                   {"&lt;script&gt;alert(1)&lt;/script&gt;", "&lt;img src=x onerror=alert(2)&gt;", "a&amp;b",
+                    "no history across runs is recorded"});
+    ExpectLacks(page, {"<script>alert", "<img", ">Duration</th>"});
+    EXPECT_EQ(page.count("<script>"), 1); // the page's own
+}
+
 TEST_F(ReportTool, UnreadableOrForeignFilesAreUsageErrors)
 {
     testutil::WriteFile(u"cut.xml"_s, QByteArray(kResults).left(100));

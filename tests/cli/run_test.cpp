@@ -233,7 +233,7 @@ TEST_F(DemoRun, AHandsetLostMidRunReportsErrorsNotAnEarlierRunsVerdicts)
     EXPECT_EQ(suites.elementsByTagName(u"error"_s).at(0).toElement().attribute(u"message"_s), u"handset lost"_s);
 
     // The page is self-contained (inline style, nothing fetched) and has the
-    // columns of a run; the history's page has not (below).
+    // columns of a run, which the page of a results file has not.
     const QByteArray page = ReadFile(html);
     ExpectContains(page,
                    {"<b data-count=\"not finished\">6</b>", "Not finished: not run: every handset was lost", "<style>",
@@ -502,21 +502,6 @@ TEST_F(DemoRun, AModulePastItsTimeoutIsStoppedRemovedAndReportedWhileTheRunGoesO
         QRegularExpression(u"\r\033\\[KITimer on demo-phone: waiting for its log, 1\\d s"_s)))
         << terminal.constData();
     ExpectLacks(terminal, {"still running"});
-}
-
-TEST_F(DemoRun, TheHtmlReportEscapesNamesAndSaysThatNoHistoryIsRecorded)
-{
-    const QString file = dir.filePath(u"results.xml"_s), html = dir.filePath(u"history.html"_s);
-    WriteFile(file,
-              "<testmodules><module name=\"&lt;script&gt;alert(1)&lt;/script&gt;\" family=\"a&amp;b\" source=\"KVK\">"
-              "<testcase name=\"&lt;img src=x onerror=alert(2)&gt;\" result=\"fail\"/></module></testmodules>");
-    EXPECT_EQ(RunTool(Args("report", file, "--html", html), env, dir.path()).status, 1);
-    const QByteArray page = ReadFile(html);
-    ExpectContains(page,
-                   {"&lt;script&gt;alert(1)&lt;/script&gt;", "&lt;img src=x onerror=alert(2)&gt;", "a&amp;b",
-                    "no history across runs is recorded"});
-    ExpectLacks(page, {"<script>alert", "<img", ">Duration</th>"});
-    EXPECT_EQ(page.count("<script>"), 1); // the page's own
 }
 
 // Headless Chromium renders the report of a run shared by two handsets.
