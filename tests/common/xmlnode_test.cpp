@@ -177,8 +177,7 @@ TEST(XmlNode, CopiesToAndFromTheDomAndWritesTheSameBytes)
     root.ChildElements().back()->AppendChild(std::move(section));
 
     QDomDocument document;
-    QDomElement domRoot = document.createElement(u"root"_s);
-    document.appendChild(domRoot);
+    QDomElement domRoot = document.appendChild(document.createElement(u"root"_s)).toElement();
     root.CopyTo(domRoot);
     EXPECT_EQ(domRoot.attribute(u"alpha"_s), u"replaced \xE9 a\"b<c>\n\t&"_s);
     EXPECT_EQ(XmlWriter::Serialize(root), XmlWriter::Serialize(domRoot));

@@ -55,10 +55,9 @@ TEST(XmlWriter, WritesParsedDocumentsInOneOrderAndIndentation)
 TEST(XmlWriter, EscapesAttributesAndReplacesCharactersXmlCannotCarry)
 {
     QDomDocument doc;
-    QDomElement root = doc.createElement(u"r"_s);
+    QDomElement root = doc.appendChild(doc.createElement(u"r"_s)).toElement();
     root.setAttribute(u"v"_s, u"a\"b\nc<d>&"_s);
     root.appendChild(doc.createTextNode(QString(QChar(0x01)) + u"x"_s + QChar(0xD800)));
-    doc.appendChild(root);
     const QString text = XmlWriter::ToString(doc);
     EXPECT_EQ(text, u"<r v=\"a&quot;b&#xa;c&lt;d&gt;&amp;\">"_s + QChar(0xFFFD) + u"x"_s + QChar(0xFFFD) + u"</r>\n"_s);
     QDomDocument back;
@@ -95,21 +94,17 @@ TEST(FileWriter, AtomicWriteReplacesWholeFileOrLeavesItUntouched)
 TEST(XmlWriterDeclarations, EntityReferencesRunInline)
 {
     QDomDocument doc;
-    QDomElement root = doc.createElement(u"a"_s);
-    doc.appendChild(root);
+    QDomElement root = doc.appendChild(doc.createElement(u"a"_s)).toElement();
     root.appendChild(doc.createTextNode(u"x"_s));
     root.appendChild(doc.createEntityReference(u"ref"_s));
-    QDomElement b = doc.createElement(u"b"_s);
-    b.appendChild(doc.createEntityReference(u"only"_s));
-    root.appendChild(b);
+    root.appendChild(doc.createElement(u"b"_s)).appendChild(doc.createEntityReference(u"only"_s));
     EXPECT_EQ(XmlWriter::ToString(doc), u"<a>x&ref;<b>&only;</b>\n</a>\n"_s);
 }
 
 TEST(XmlWriterDeclarations, AsciiStringEscapesEverythingBeyondAscii)
 {
     QDomDocument doc;
-    QDomElement root = doc.createElement(u"r"_s);
-    doc.appendChild(root);
+    QDomElement root = doc.appendChild(doc.createElement(u"r"_s)).toElement();
     root.setAttribute(u"v"_s, u"\u00e9\"\U0001F600"_s);
     root.appendChild(doc.createTextNode(u"caf\u00e9 & \u65e5"_s));
     root.appendChild(doc.createCDATASection(u"a\u00e9]]>b"_s));
@@ -124,8 +119,6 @@ TEST(XmlWriterDeclarations, AsciiStringEscapesEverythingBeyondAscii)
     EXPECT_EQ(back.documentElement().attribute(u"v"_s), u"\u00e9\"\U0001F600"_s);
     EXPECT_EQ(back.documentElement().text(), u"caf\u00e9 & \u65e5a\u00e9]]>b"_s);
 }
-
-} // namespace
 
 // Writing a document piece by piece gives the bytes of writing it whole,
 // escaping and attribute order included; an opened element that receives
@@ -156,8 +149,6 @@ TEST(XmlWriterStream, PiecesGiveTheBytesOfTheWholeDocument)
     EXPECT_EQ(QString::fromUtf8(out.Finish()), XmlWriter::ToString(whole));
     EXPECT_TRUE(out.Finish().isEmpty());
 }
-
-namespace {
 
 TEST(XmlWriterStream, ADeviceReceivesTheSameBytesPieceByPiece)
 {
