@@ -1,9 +1,10 @@
 #include "common/clock.h"
 
 #include <QElapsedTimer>
-#include <QThread>
 
 #include <gtest/gtest.h>
+
+#include <thread>
 
 namespace {
 
@@ -28,10 +29,7 @@ TEST(Clock, SkippedTimeBelongsToTheSleepingThreadOnly)
 {
     Clock::SetScale(0.0);
     const qint64 before = Clock::Now();
-    QThread *other = QThread::create([] { Clock::Sleep(10000000); });
-    other->start();
-    other->wait();
-    delete other;
+    std::thread([] { Clock::Sleep(10000000); }).join();
     EXPECT_LT(Clock::Now() - before, 1000000);
 }
 
