@@ -11,140 +11,115 @@
 
 #include <gtest/gtest.h>
 
+using namespace Qt::StringLiterals;
+using testutil::RunProgram;
+
 namespace {
 
+// A demo environment in a folder whose name has blanks; the test's folder is the current one.
 class DemoInit : public ::testing::Test
 {
 protected:
     void SetUp() override
     {
-        ASSERT_TRUE(dir.isValid());
-        root = dir.filePath(QStringLiteral("demo with blanks"));
-        const ToolResult r = RunTool({QStringLiteral("demo"), QStringLiteral("init"), root});
+        const ToolResult r = Tool("demo init", root);
         ASSERT_EQ(r.status, 0) << r.err.constData();
-        env = QString::fromUtf8(r.out);
+        env = r.out;
     }
+
+    // The files below the demo whose names match pattern.
+    QStringList Files(const QString &pattern) const
+    {
+        QStringList found;
+        for (QDirIterator it(root, {pattern}, QDir::Files, QDirIterator::Subdirectories); it.hasNext();)
+            found << it.next();
+        return found;
+    }
+
     QTemporaryDir dir;
-    QString root;
-    QString env;
+    testutil::CurrentDirectory current{dir.path()};
+    const QString root = dir.filePath(u"demo with blanks"_s);
+    QByteArray env;
 };
 
 TEST_F(DemoInit, PrintsTheVariablesThatPointAtIt)
 {
-    EXPECT_TRUE(env.contains(QStringLiteral("export KESTIX_TESTSET='%1/kits/DemoKit'\n").arg(root)))
-        << env.toStdString();
-    EXPECT_TRUE(env.contains(QStringLiteral("export KESTIX_PLATFORM='%1/platforms/Kesto5 Pro/'\n").arg(root)));
-    EXPECT_EQ(testutil::ReadFile(root + QStringLiteral("/env.sh")), env.toUtf8());
+    ExpectContains(env,
+                   {u"export KESTIX_TESTSET='%1/kits/DemoKit'\n"_s.arg(root).toUtf8(),
+                    u"export KESTIX_PLATFORM='%1/platforms/Kesto5 Pro/'\n"_s.arg(root).toUtf8()});
+    EXPECT_EQ(testutil::ReadFile(root + u"/env.sh"_s), env);
     // A second init into the same folder is refused rather than mixed in;
     // an empty folder is taken.
-    EXPECT_EQ(RunTool({QStringLiteral("demo"), QStringLiteral("init"), root}).status, 2);
-    const QString empty = root + QStringLiteral("-empty");
-    ASSERT_TRUE(QDir().mkpath(empty));
-    EXPECT_EQ(RunTool({QStringLiteral("demo"), QStringLiteral("init"), empty}).status, 0);
+    EXPECT_EQ(Tool("demo init", root).status, 2);
+    ASSERT_TRUE(QDir().mkpath(u"empty"_s));
+    EXPECT_EQ(Tool("demo init empty").status, 0);
 }
 
-TEST_F(DemoInit, PackagesAreTarArchivesWithReadableModuleInformation)
+TEST_F(DemoInit, PackagesScriptsAndDescriptionsAreWhatTarShPerlAndXmllintRead)
 {
-    int packages = 0;
-    QDirIterator it(root, {QStringLiteral("*.kestix")}, QDir::Files, QDirIterator::Subdirectories);
-    while (it.hasNext()) {
-        const QString path = it.next();
-        ++packages;
-        if (testutil::HaveProgram(QStringLiteral("tar"))) {
-            QByteArray listing;
-            EXPECT_EQ(testutil::RunProgram(QStringLiteral("tar"), {QStringLiteral("-tf"), path}, &listing), 0)
-                << path.toStdString() << listing.constData();
-        }
+    const QStringList packages = Files(u"*.kestix"_s);
+    EXPECT_EQ(packages.size(), 4 + 6 + 1); // frameworks; the kit's modules, a secondary one among them; the platform's
+    for (const QString &path : packages) {
+        SCOPED_TRACE(path.toStdString());
+        if (testutil::HaveProgram(u"tar"_s))
+            EXPECT_EQ(RunProgram(u"tar"_s, {u"-tf"_s, path}), 0);
         Tar tar;
         ASSERT_TRUE(tar.Open(QIODevice::ReadOnly, path));
         bool haveMif = false;
         for (unsigned int i = 0; i < tar.EntryCount(); ++i) {
             TarFileEntry entry = tar.Entry(i);
-            if (!entry.name.endsWith(QLatin1String(".mif")))
+            if (!entry.name.endsWith(u".mif"_s))
                 continue;
             KestoResources mif;
             ASSERT_TRUE(mif.LoadFrom(tar.EntryData(entry))) << entry.name.toStdString();
             QVector<unsigned int> classes;
             QVector<Applet> applets;
+            QVector<quint16> programs;
             mif.GetMifClasses(classes);
             mif.GetMifApplets(applets);
-            QVector<quint16> programs;
             mif.GetIDs(KestoResources::kTypeSysResource, programs);
             EXPECT_FALSE(classes.isEmpty() && applets.isEmpty() && programs.isEmpty()) << entry.name.toStdString();
             haveMif = true;
         }
-        EXPECT_TRUE(haveMif) << path.toStdString();
+        EXPECT_TRUE(haveMif);
     }
-    EXPECT_EQ(packages, 4 + 6 + 1); // frameworks; the kit's modules, a secondary one among them; the platform's module
-}
-
-TEST_F(DemoInit, ScriptsAreValidShellAndPerlAndDescriptionsValidXml)
-{
-    if (testutil::HaveProgram(QStringLiteral("xmllint"))) {
-        int descriptions = 0;
-        QDirIterator xml(root, {QStringLiteral("*module.xml")}, QDir::Files, QDirIterator::Subdirectories);
-        while (xml.hasNext()) {
-            QByteArray out;
-            ++descriptions;
-            EXPECT_EQ(testutil::RunProgram(QStringLiteral("xmllint"), {QStringLiteral("--noout"), xml.next()}, &out), 0)
-                << out.constData();
-        }
-        EXPECT_EQ(descriptions, 6);
-    }
-    QDirIterator it(root, {QStringLiteral("*.exe")}, QDir::Files, QDirIterator::Subdirectories);
-    while (it.hasNext()) {
-        const QString path = it.next();
-        QByteArray out;
-        EXPECT_EQ(testutil::RunProgram(QStringLiteral("sh"), {QStringLiteral("-n"), path}, &out), 0) << out.constData();
-    }
-    if (testutil::HaveProgram(QStringLiteral("perl"))) {
-        QByteArray out;
-        EXPECT_EQ(
-            testutil::RunProgram(QStringLiteral("perl"),
-                                 {QStringLiteral("-c"),
-                                  root + QStringLiteral("/kits/DemoKit/testframeworks/oat/tools/bin/PostProcess3.pl")},
-                                 &out),
-            0)
-            << out.constData();
-    }
+    // Scripts are valid shell and Perl, descriptions valid XML.
+    const QStringList descriptions = Files(u"*module.xml"_s);
+    EXPECT_EQ(descriptions.size(), 6);
+    for (const QString &path : descriptions)
+        ExpectXmllintAccepts(path);
+    for (const QString &path : Files(u"*.exe"_s))
+        EXPECT_EQ(RunProgram(u"sh"_s, {u"-n"_s, path}), 0) << path.toStdString();
+    const QString postProcess = root + u"/kits/DemoKit/testframeworks/oat/tools/bin/PostProcess3.pl"_s;
+    QByteArray out;
+    if (testutil::HaveProgram(u"perl"_s))
+        EXPECT_EQ(RunProgram(u"perl"_s, {u"-c"_s, postProcess}, &out), 0) << out.constData();
 }
 
 TEST_F(DemoInit, StandInCompilersProduceRealResourceFiles)
 {
-    const QString tools = root + QStringLiteral("/toolset/bin");
-    const QString car = dir.filePath(QStringLiteral("demo.car"));
-    const QString kar = dir.filePath(QStringLiteral("demo.kar"));
-    const QString dso = dir.filePath(QStringLiteral("device.kar"));
-    QByteArray out;
-    ASSERT_EQ(testutil::RunProgram(tools + QStringLiteral("/kestormc.exe"),
-                                   {QStringLiteral("-convert"), QStringLiteral("-infile"),
-                                    root + QStringLiteral("/testdata/demo.ksx"), QStringLiteral("-outfile"), car},
-                                   &out),
-              0);
-    EXPECT_TRUE(out.contains("Successfully converted file")) << out.constData();
-    ASSERT_EQ(testutil::RunProgram(
-                  tools + QStringLiteral("/kestormc.exe"),
-                  {QStringLiteral("-compile"), QStringLiteral("-infile"), car, QStringLiteral("-outfile"), kar}, &out),
-              0);
-    EXPECT_TRUE(out.contains("Successfully compiled")) << out.constData();
+    // A tool of the demo's tool set run to success; what it printed.
+    const auto tool = [this](const QString &name, const QStringList &arguments) {
+        QByteArray out;
+        EXPECT_EQ(RunProgram(root + u"/toolset/bin/"_s + name, arguments, &out), 0) << out.constData();
+        return out;
+    };
+    ExpectContains(
+        tool(u"kestormc.exe"_s, Args("-convert -infile", root + u"/testdata/demo.ksx"_s, "-outfile demo.car")),
+        {"Successfully converted file"});
+    ExpectContains(tool(u"kestormc.exe"_s, Args("-compile -infile demo.car -outfile demo.kar")),
+                   {"Successfully compiled"});
     KestoResources data;
-    ASSERT_TRUE(data.Read(kar));
+    ASSERT_TRUE(data.Read(u"demo.kar"_s));
     quint16 format = 0;
     QString text;
     ASSERT_TRUE(data.GetString(KestoResources::kTypeStrings, 2, &format, text));
-    EXPECT_EQ(text, QStringLiteral("\u30c6\u30b9\u30c8"));
+    EXPECT_EQ(text, u"\u30c6\u30b9\u30c8"_s);
 
-    ASSERT_EQ(testutil::RunProgram(
-                  tools + QStringLiteral("/deprecated/ResourceEditor/kestorc.exe"),
-                  {QStringLiteral("-nh"), QStringLiteral("-o"), dso,
-                   root
-                       + QStringLiteral(
-                           "/platforms/Kesto5 Pro/pvs/platform/testframeworks/oat/tools/reference/deviceref.dso")},
-                  &out),
-              0)
-        << out.constData();
-    KestoResources pack;
-    EXPECT_TRUE(pack.Read(dso));
+    tool(u"deprecated/ResourceEditor/kestorc.exe"_s,
+         Args("-nh -o device.kar",
+              root + u"/platforms/Kesto5 Pro/pvs/platform/testframeworks/oat/tools/reference/deviceref.dso"_s));
+    EXPECT_TRUE(KestoResources().Read(u"device.kar"_s));
 }
 
 } // namespace

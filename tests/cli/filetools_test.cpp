@@ -2,148 +2,110 @@
 
 #include "support/testutil.h"
 
-#include <QDir>
 #include <QFile>
 #include <QTemporaryDir>
 
 #include <gtest/gtest.h>
+
+using namespace Qt::StringLiterals;
 
 namespace {
 
 using testutil::ReadFile;
 using testutil::WriteFile;
 
+// Each test works in a folder of its own, the current one while it runs.
 class InspectTool : public ::testing::Test
 {
 protected:
-    void SetUp() override { ASSERT_TRUE(dir.isValid()); }
-    QString Path(const QString &name) const { return dir.filePath(name); }
     QTemporaryDir dir;
+    testutil::CurrentDirectory current{dir.path()};
 };
 
 TEST_F(InspectTool, CompiledSourceListsDecodedStringsObjectsAndClassIds)
 {
-    WriteFile(Path(QStringLiteral("src.xml")),
-              "<resources>\n"
-              " <string id=\"1\" format=\"UTF-8\">Gr\xc3\xbc\xc3\x9f"
-              "e</string>\n"
-              " <string id=\"7\" format=\"GB2312\">\xe4\xb8\xad\xe6\x96\x87</string>\n"
-              " <object id=\"2\" mime=\"text/plain\">abc</object>\n"
-              " <binary type=\"0x5000\" id=\"0\" hex=\""
-                  + QByteArray(80, '0')
-                  + "\"/>\n"
-                    " <binary type=\"0x5000\" id=\"1\" hex=\"78563412 efbeadde 00000000 11111111\"/>\n"
-                    "</resources>\n");
-    const ToolResult compiled = RunTool({QStringLiteral("res"), QStringLiteral("compile"),
-                                         Path(QStringLiteral("src.xml")), Path(QStringLiteral("out.kar"))});
+    const QString source = u"<resources>\n"
+                           " <string id=\"1\" format=\"UTF-8\">Gr\u00fc\u00dfe</string>\n"
+                           " <string id=\"7\" format=\"GB2312\">\u4e2d\u6587</string>\n"
+                           " <object id=\"2\" mime=\"text/plain\">abc</object>\n"
+                           " <binary type=\"0x5000\" id=\"0\" hex=\"%1\"/>\n"
+                           " <binary type=\"0x5000\" id=\"1\" hex=\"78563412 efbeadde 00000000 11111111\"/>\n"
+                           "</resources>\n"_s;
+    WriteFile(u"src.xml"_s, source.arg(QString(80, u'0')).toUtf8());
+    const ToolResult compiled = Tool("res compile src.xml out.kar");
     ASSERT_EQ(compiled.status, 0) << compiled.err.constData();
-
-    const ToolResult list = RunTool({QStringLiteral("res"), QStringLiteral("list"), Path(QStringLiteral("out.kar"))});
-    ASSERT_EQ(list.status, 0) << list.err.constData();
-    const QString out = QString::fromUtf8(list.out);
-    EXPECT_TRUE(out.contains(QStringLiteral("UTF-8  \"Gr\u00fc\u00dfe\""))) << list.out.constData();
-    EXPECT_TRUE(out.contains(QStringLiteral("\"\u4e2d\u6587\""))) << list.out.constData();
-    EXPECT_TRUE(out.contains(QStringLiteral("text/plain, 3 bytes")));
-
+    ExpectContains(OutputOf(Tool("res list out.kar")),
+                   {u"UTF-8  \"Gr\u00fc\u00dfe\""_s.toUtf8(), u"\"\u4e2d\u6587\""_s.toUtf8(), "text/plain, 3 bytes"});
     // The class ID list stops at its zero value.
-    const ToolResult mif = RunTool({QStringLiteral("mif"), Path(QStringLiteral("out.kar"))});
-    ASSERT_EQ(mif.status, 0) << mif.err.constData();
-    EXPECT_TRUE(mif.out.contains("classes: 2\n  0x12345678\n  0xdeadbeef\napplets: 0")) << mif.out.constData();
-
-    const ToolResult dump = RunTool({QStringLiteral("res"), QStringLiteral("dump"), Path(QStringLiteral("out.kar"))});
-    EXPECT_EQ(dump.status, 0);
-    EXPECT_TRUE(dump.out.startsWith("=== Header ===")) << dump.out.left(200).constData();
-    EXPECT_TRUE(dump.out.contains("Number of Resources:  5 (0x5)\n")) << dump.out.left(400).constData();
+    ExpectContains(OutputOf(Tool("mif out.kar")), {"classes: 2\n  0x12345678\n  0xdeadbeef\napplets: 0"});
+    const QByteArray dump = OutputOf(Tool("res dump out.kar"));
+    EXPECT_TRUE(dump.startsWith("=== Header ===")) << dump.left(200).constData();
+    ExpectContains(dump, {"Number of Resources:  5 (0x5)\n"});
 }
 
 TEST_F(InspectTool, BadSourcesAndForeignFilesAreUsageErrors)
 {
-    WriteFile(Path(QStringLiteral("bad.xml")), "<resources><string id=\"70000\">x</string></resources>");
-    WriteFile(Path(QStringLiteral("src.xml")), "<resources><string id=\"1\">x</string></resources>");
-    WriteFile(Path(QStringLiteral("junk.kar")), "not a resource file at all");
-    const ToolResult bad = RunTool({QStringLiteral("res"), QStringLiteral("compile"), Path(QStringLiteral("bad.xml")),
-                                    Path(QStringLiteral("o.kar"))});
-    EXPECT_EQ(bad.status, 2);
-    EXPECT_TRUE(bad.err.contains("bad id")) << bad.err.constData();
-    EXPECT_FALSE(QFile::exists(Path(QStringLiteral("o.kar"))));
+    WriteFile(u"bad.xml"_s, "<resources><string id=\"70000\">x</string></resources>");
+    WriteFile(u"src.xml"_s, "<resources><string id=\"1\">x</string></resources>");
+    WriteFile(u"junk.kar"_s, "not a resource file at all");
     // The second of two resources with one type and ID would silently replace the first.
-    WriteFile(Path(QStringLiteral("twice.xml")),
+    WriteFile(u"twice.xml"_s,
               "<resources><string id=\"3\">a</string><object id=\"4\">b</object>\n"
               "<string id=\"3\">c</string></resources>");
-    const ToolResult twice = RunTool({QStringLiteral("res"), QStringLiteral("compile"),
-                                      Path(QStringLiteral("twice.xml")), Path(QStringLiteral("o.kar"))});
-    EXPECT_EQ(twice.status, 2);
-    EXPECT_TRUE(twice.err.contains("line 2: duplicate resource ID 3 of type 0x1")) << twice.err.constData();
-    const ToolResult nowhere = RunTool({QStringLiteral("res"), QStringLiteral("compile"),
-                                        Path(QStringLiteral("src.xml")), Path(QStringLiteral("missing/o.kar"))});
-    EXPECT_EQ(nowhere.status, 2);
-    EXPECT_FALSE(nowhere.err.contains("()")) << nowhere.err.constData();
-    EXPECT_FALSE(QFile::exists(Path(QStringLiteral("o.kar"))));
-    EXPECT_EQ(RunTool({QStringLiteral("res"), QStringLiteral("list"), Path(QStringLiteral("junk.kar"))}).status, 2);
-    EXPECT_EQ(RunTool({QStringLiteral("mif"), Path(QStringLiteral("missing.mif"))}).status, 2);
-    EXPECT_EQ(RunTool({QStringLiteral("res"), QStringLiteral("frobnicate"), Path(QStringLiteral("junk.kar"))}).status,
-              2);
+    const std::pair<const char *, const char *> rows[] = {
+        {"res compile bad.xml o.kar", "bad id"},
+        {"res compile twice.xml o.kar", "line 2: duplicate resource ID 3 of type 0x1"},
+        {"res compile src.xml missing/o.kar", "missing/o.kar"},
+        {"res list junk.kar", "junk.kar"},
+        {"mif missing.mif", "missing.mif"},
+        {"res frobnicate junk.kar", "expected 'dump FILE'"},
+    };
+    for (const auto &[arguments, message] : rows) {
+        const ToolResult r = Tool(arguments);
+        ExpectRefused(r, message);
+        ExpectLacks(r.err, {"()"});
+    }
+    EXPECT_FALSE(QFile::exists(u"o.kar"_s));
 }
 
 TEST_F(InspectTool, TarListAndCatReadAnArchiveMadeByGnuTar)
 {
-    if (!testutil::HaveProgram(QStringLiteral("tar")))
+    if (!testutil::HaveProgram(u"tar"_s))
         GTEST_SKIP() << "tar not installed";
-    WriteFile(Path(QStringLiteral("pkg/mod/a.txt")), "alpha\n");
-    WriteFile(Path(QStringLiteral("pkg/mod/empty")), "");
-    WriteFile(Path(QStringLiteral("pkg/mod/red\x1b[31m\n")), "x");
-    ASSERT_TRUE(QFile::link(QStringLiteral("a.txt"), Path(QStringLiteral("pkg/mod/link"))));
-    WriteFile(Path(QStringLiteral("pkg/late")), "late");
-    const auto makeTar = [this](const QString &name, const QStringList &members) {
-        return testutil::RunProgram(QStringLiteral("tar"),
-                                    QStringList{QStringLiteral("--sort=name"), QStringLiteral("-cf"), Path(name),
-                                                QStringLiteral("-C"), Path(QStringLiteral("pkg"))}
-                                        + members);
-    };
-    ASSERT_EQ(makeTar(QStringLiteral("p.tar"), {QStringLiteral("mod")}), 0);
-    ASSERT_EQ(makeTar(QStringLiteral("late.tar"), {QStringLiteral("late")}), 0);
+    WriteFile(u"pkg/mod/a.txt"_s, "alpha\n");
+    WriteFile(u"pkg/mod/empty"_s, "");
+    WriteFile(u"pkg/mod/red\x1b[31m\n"_s, "x");
+    ASSERT_TRUE(QFile::link(u"a.txt"_s, u"pkg/mod/link"_s));
+    WriteFile(u"pkg/late"_s, "late");
+    ASSERT_EQ(testutil::RunProgram(u"tar"_s, Args("--sort=name -cf p.tar -C pkg mod")), 0);
+    ASSERT_EQ(testutil::RunProgram(u"tar"_s, Args("-cf late.tar -C pkg late")), 0);
     // Whatever follows the end-of-archive blocks is not listed, as with tar -t.
-    const QByteArray archive = ReadFile(Path(QStringLiteral("p.tar")));
-    WriteFile(Path(QStringLiteral("both.tar")), archive + ReadFile(Path(QStringLiteral("late.tar"))));
-    const ToolResult list = RunTool({QStringLiteral("tar"), QStringLiteral("list"), Path(QStringLiteral("both.tar"))});
-    ASSERT_EQ(list.status, 0) << list.err.constData();
-    EXPECT_EQ(list.out,
+    const QByteArray archive = ReadFile(u"p.tar"_s);
+    WriteFile(u"both.tar"_s, archive + ReadFile(u"late.tar"_s));
+    EXPECT_EQ(OutputOf(Tool("tar list both.tar")),
               QByteArray("d\t0\tmod/\n"
                          "-\t6\tmod/a.txt\n"
                          "-\t0\tmod/empty\n"
                          "l\t0\tmod/link -> a.txt\n"
                          "-\t1\tmod/red\\033[31m\\n\n"));
-
-    const auto cat = [this](const QString &file, const QString &member) {
-        return RunTool({QStringLiteral("tar"), QStringLiteral("cat"), Path(file), member});
-    };
-    ToolResult r = cat(QStringLiteral("p.tar"), QStringLiteral("mod/a.txt"));
-    EXPECT_EQ(r.status, 0);
-    EXPECT_EQ(r.out, QByteArray("alpha\n"));
+    EXPECT_EQ(OutputOf(Tool("tar cat p.tar mod/a.txt")), QByteArray("alpha\n"));
     // A name is found as the listing shows it too.
-    EXPECT_EQ(cat(QStringLiteral("p.tar"), QStringLiteral("mod/red\\033[31m\\n")).out, QByteArray("x"));
-    const struct
-    {
-        QString file;
-        QString member;
-        QByteArray message;
-    } refusals[] = {
-        {QStringLiteral("p.tar"), QStringLiteral("mod/none"), "no member mod/none"},
-        {QStringLiteral("p.tar"), QStringLiteral("mod/"), "mod/ is a directory"},
-        {QStringLiteral("p.tar"), QStringLiteral("mod/link"), "mod/link is a symbolic link to a.txt"},
-        {QStringLiteral("cut.tar"), QStringLiteral("mod/a.txt"), "cut.tar: unexpected end of archive at offset 1300"},
-        {QStringLiteral("pkg/mod/a.txt"), QStringLiteral("a"), "a.txt: does not look like a tar archive"},
+    EXPECT_EQ(Tool("tar cat p.tar", u"mod/red\\033[31m\\n"_s).out, QByteArray("x"));
+    WriteFile(u"cut.tar"_s, archive.left(1300));
+    const std::pair<const char *, const char *> refusals[] = {
+        {"p.tar mod/none", "no member mod/none"},
+        {"p.tar mod/", "mod/ is a directory"},
+        {"p.tar mod/link", "mod/link is a symbolic link to a.txt"},
+        {"cut.tar mod/a.txt", "cut.tar: unexpected end of archive at offset 1300"},
+        {"pkg/mod/a.txt a", "a.txt: does not look like a tar archive"},
     };
-    WriteFile(Path(QStringLiteral("cut.tar")), archive.left(1300));
-    for (const auto &refusal : refusals) {
-        r = cat(refusal.file, refusal.member);
-        EXPECT_EQ(r.status, 2) << refusal.message.constData();
-        EXPECT_TRUE(r.out.isEmpty());
+    for (const auto &[arguments, message] : refusals) {
+        const ToolResult r = Tool("tar cat", arguments);
+        ExpectRefused(r, message);
         EXPECT_TRUE(r.err.startsWith("harness tar: ")) << r.err.constData();
-        EXPECT_TRUE(r.err.contains(refusal.message)) << r.err.constData();
     }
     // A damaged archive lists what comes before the damage, then says why.
-    r = RunTool({QStringLiteral("tar"), QStringLiteral("list"), Path(QStringLiteral("cut.tar"))});
+    const ToolResult r = Tool("tar list cut.tar");
     EXPECT_EQ(r.status, 2);
     EXPECT_EQ(r.out, QByteArray("d\t0\tmod/\n-\t6\tmod/a.txt\n"));
     EXPECT_TRUE(r.err.endsWith("cut.tar: unexpected end of archive at offset 1300\n")) << r.err.constData();
@@ -151,71 +113,56 @@ TEST_F(InspectTool, TarListAndCatReadAnArchiveMadeByGnuTar)
 
 TEST_F(InspectTool, EncodeMatchesIconvAfterTheMarkAndDecodeReadsItBack)
 {
-    if (!testutil::HaveProgram(QStringLiteral("iconv")))
+    if (!testutil::HaveProgram(u"iconv"_s))
         GTEST_SKIP() << "iconv not installed";
-    struct Case
-    {
-        const char *format;
-        const char *iconvName;
-        QByteArray mark;
+    const QString text = u"\u4e2d\u6587 A"_s; // 中文 A
+    WriteFile(u"text.txt"_s, text.toUtf8());
+    const std::tuple<const char *, const char *, QByteArray> rows[] = {
+        // format, iconv's name for it, mark
+        {"S-JIS", "SHIFT_JIS", "\xfd\xfe"},
+        {"GB2312", "GB2312", "\xfc\xfe"},
+        {"UTF-8", "UTF-8", "\x02"},
     };
-    const QString text = QStringLiteral("\u4e2d\u6587 A"); // 中文 A
-    WriteFile(Path(QStringLiteral("text.txt")), text.toUtf8());
-    for (const Case &c :
-         {Case{"S-JIS", "SHIFT_JIS", QByteArray("\xfd\xfe")}, Case{"GB2312", "GB2312", QByteArray("\xfc\xfe")},
-          Case{"UTF-8", "UTF-8", QByteArray("\x02")}}) {
+    for (const auto &[format, iconvName, mark] : rows) {
+        SCOPED_TRACE(format);
         QByteArray expected;
-        ASSERT_EQ(testutil::RunProgram(QStringLiteral("sh"),
-                                       {QStringLiteral("-c"),
-                                        QStringLiteral("iconv -f UTF-8 -t %1 '%2'")
-                                            .arg(QLatin1String(c.iconvName), Path(QStringLiteral("text.txt")))},
-                                       &expected),
-                  0);
-        const ToolResult encoded = RunTool({QStringLiteral("encode"), QLatin1String(c.format), text});
-        ASSERT_EQ(encoded.status, 0) << c.format;
+        ASSERT_EQ(testutil::RunProgram(u"iconv"_s, Args("-f UTF-8 -t", iconvName, "text.txt"), &expected), 0);
+        const ToolResult encoded = Tool("encode", format, text);
+        ASSERT_EQ(encoded.status, 0);
         const QByteArray bytes = QByteArray::fromHex(encoded.out.trimmed().replace(' ', ""));
-        EXPECT_TRUE(bytes.startsWith(c.mark)) << c.format << " " << encoded.out.constData();
-        EXPECT_EQ(bytes.mid(c.mark.size()), expected) << c.format;
-
-        const ToolResult decoded = RunTool({QStringLiteral("decode"), QString::fromLatin1(encoded.out.trimmed())});
-        ASSERT_EQ(decoded.status, 0) << c.format;
-        EXPECT_EQ(QString::fromUtf8(decoded.out),
-                  QLatin1String(c.format) + QLatin1Char('\t') + text + QLatin1Char('\n'));
+        EXPECT_EQ(bytes, mark + expected) << encoded.out.constData();
+        EXPECT_EQ(QString::fromUtf8(OutputOf(Tool("decode", QString::fromLatin1(encoded.out.trimmed())))),
+                  QString::fromLatin1(format) + u'\t' + text + u'\n');
     }
-    EXPECT_EQ(RunTool({QStringLiteral("encode"), QStringLiteral("EBCDIC"), QStringLiteral("x")}).status, 2);
-    EXPECT_EQ(RunTool({QStringLiteral("decode"), QStringLiteral("0g")}).status, 2);
+    EXPECT_EQ(Tool("encode EBCDIC x").status, 2);
+    EXPECT_EQ(Tool("decode 0g").status, 2);
 }
 
 TEST_F(InspectTool, TextAnEncodingCannotHoldIsNamedAndNothingIsStored)
 {
-    const struct
-    {
-        const char *format;
-        QString text;
-        QByteArray lost; // the lines on standard error, empty when every character is held
-    } rows[] = {
-        {"1", QStringLiteral("H\u00e9llo \u30c6"), "character 7 U+30C6 '\xe3\x83\x86'"},
-        {"ISOLATIN1", QStringLiteral("H\u00e9llo"), {}},
-        {"S-JIS", QStringLiteral("\u00e9\u30c6"), "character 1 U+00E9 '\xc3\xa9'"},
-        {"UTF-8", QStringLiteral("\u30c6\U0001F600"), {}},
+    // Format, text, and the line on standard error (empty when every character is held).
+    const std::tuple<const char *, QString, QByteArray> rows[] = {
+        {"1", u"H\u00e9llo \u30c6"_s, "character 7 U+30C6 '\xe3\x83\x86'"},
+        {"ISOLATIN1", u"H\u00e9llo"_s, {}},
+        {"S-JIS", u"\u00e9\u30c6"_s, "character 1 U+00E9 '\xc3\xa9'"},
+        {"UTF-8", u"\u30c6\U0001F600"_s, {}},
     };
-    for (const auto &row : rows) {
-        SCOPED_TRACE(row.format);
-        const ToolResult r = RunTool({QStringLiteral("encode"), QLatin1String(row.format), row.text});
-        EXPECT_EQ(r.status, row.lost.isEmpty() ? 0 : 1) << r.err.constData();
-        EXPECT_EQ(r.out.isEmpty(), !row.lost.isEmpty());
-        EXPECT_EQ(r.err.count('\n'), row.lost.isEmpty() ? 0 : 1);
-        EXPECT_TRUE(r.err.contains(row.lost)) << r.err.constData();
+    for (const auto &[format, text, lost] : rows) {
+        SCOPED_TRACE(format);
+        const ToolResult r = Tool("encode", format, text);
+        EXPECT_EQ(r.status, lost.isEmpty() ? 0 : 1) << r.err.constData();
+        EXPECT_EQ(r.out.isEmpty(), !lost.isEmpty());
+        EXPECT_EQ(r.err.count('\n'), lost.isEmpty() ? 0 : 1);
+        EXPECT_TRUE(r.err.contains(lost)) << r.err.constData();
     }
 
-    WriteFile(Path(QStringLiteral("lossy.xml")),
+    WriteFile(u"lossy.xml"_s,
               "<resources>\n<string id=\"1\" format=\"1\">\xe3\x83\x86\xe3\x82\xb9\xe3\x83\x88</string>\n</resources>");
-    const ToolResult compiled = RunTool({QStringLiteral("res"), QStringLiteral("compile"),
-                                         Path(QStringLiteral("lossy.xml")), Path(QStringLiteral("out.kar"))});
+    const ToolResult compiled = Tool("res compile lossy.xml out.kar");
     EXPECT_EQ(compiled.status, 1);
     EXPECT_EQ(compiled.err.count('\n'), 3) << compiled.err.constData();
-    EXPECT_TRUE(compiled.err.contains("line 2, string 1: character 3 U+30C8")) << compiled.err.constData();
-    EXPECT_FALSE(QFile::exists(Path(QStringLiteral("out.kar"))));
+    ExpectContains(compiled.err, {"line 2, string 1: character 3 U+30C8"});
+    EXPECT_FALSE(QFile::exists(u"out.kar"_s));
 }
 
 } // namespace

@@ -7,38 +7,31 @@
 
 #include <gtest/gtest.h>
 
+using namespace Qt::StringLiterals;
+
 namespace {
 
 TEST(ListingTool, KitsPlatformsAndTargetsComeFromTheEnvironment)
 {
     QTemporaryDir dir;
     const QString root = dir.path();
-    for (const char *folder :
-         {"platforms/Alpha Pro/pvs/platform", "platforms/Beta", "platforms/Gamma pro", "tests/kit1", "tests/kit2"})
-        QDir().mkpath(root + QLatin1Char('/') + QLatin1String(folder));
-    testutil::WriteFile(root + QStringLiteral("/handsets/zeta/handset.ini"), "[General]\ndescription=Second phone\n");
-    testutil::WriteFile(root + QStringLiteral("/handsets/alpha/handset.ini"), "[General]\nplatform=arm\n");
-    QDir().mkpath(root + QStringLiteral("/handsets/not-a-handset"));
+    for (const char *folder : {"platforms/Alpha Pro/pvs/platform", "platforms/Beta", "platforms/Gamma pro",
+                               "tests/kit1", "tests/kit2", "handsets/not-a-handset"})
+        QDir().mkpath(root + u'/' + QLatin1String(folder));
+    testutil::WriteFile(root + u"/handsets/zeta/handset.ini"_s, "[General]\ndescription=Second phone\n");
+    testutil::WriteFile(root + u"/handsets/alpha/handset.ini"_s, "[General]\nplatform=arm\n");
 
     QProcessEnvironment env = QProcessEnvironment::systemEnvironment();
-    env.insert(QStringLiteral("KESTIX_PLATFORMS_ALL"), root + QStringLiteral("/platforms"));
-    env.insert(QStringLiteral("KESTIX_PLATFORM"), root + QStringLiteral("/platforms/Gamma pro/"));
-    env.insert(QStringLiteral("KESTIX_TESTSETS_ALL"), root + QStringLiteral("/tests"));
-    env.insert(QStringLiteral("KESTIX_TESTSET"), root + QStringLiteral("/tests/kit2"));
-    env.insert(QStringLiteral("KESTIX_HANDSETS"), root + QStringLiteral("/handsets"));
-
-    const ToolResult kits = RunTool({QStringLiteral("kits")}, env);
-    ASSERT_EQ(kits.status, 0) << kits.err.constData();
-    EXPECT_EQ(QString::fromUtf8(kits.out), QStringLiteral("  kit1\t%1/tests/kit1\n* kit2\t%1/tests/kit2\n").arg(root));
-
-    const ToolResult platforms = RunTool({QStringLiteral("platforms")}, env);
-    ASSERT_EQ(platforms.status, 0);
-    EXPECT_EQ(QString::fromUtf8(platforms.out),
-              QStringLiteral("  Alpha\t%1/platforms/Alpha Pro\n* Gamma\t%1/platforms/Gamma pro\n").arg(root));
-
-    const ToolResult targets = RunTool({QStringLiteral("targets")}, env);
-    ASSERT_EQ(targets.status, 0);
-    EXPECT_EQ(targets.out, QByteArray("alpha\talpha\nzeta\tSecond phone\n"));
+    env.insert(u"KESTIX_PLATFORMS_ALL"_s, root + u"/platforms"_s);
+    env.insert(u"KESTIX_PLATFORM"_s, root + u"/platforms/Gamma pro/"_s);
+    env.insert(u"KESTIX_TESTSETS_ALL"_s, root + u"/tests"_s);
+    env.insert(u"KESTIX_TESTSET"_s, root + u"/tests/kit2"_s);
+    env.insert(u"KESTIX_HANDSETS"_s, root + u"/handsets"_s);
+    EXPECT_EQ(OutputOf(RunTool(Args("kits"), env)),
+              u"  kit1\t%1/tests/kit1\n* kit2\t%1/tests/kit2\n"_s.arg(root).toUtf8());
+    EXPECT_EQ(OutputOf(RunTool(Args("platforms"), env)),
+              u"  Alpha\t%1/platforms/Alpha Pro\n* Gamma\t%1/platforms/Gamma pro\n"_s.arg(root).toUtf8());
+    EXPECT_EQ(OutputOf(RunTool(Args("targets"), env)), QByteArray("alpha\talpha\nzeta\tSecond phone\n"));
 }
 
 } // namespace

@@ -2,14 +2,13 @@
 
 #include "support/testutil.h"
 
-#include <QDomDocument>
-#include <QJsonArray>
 #include <QJsonDocument>
-#include <QJsonObject>
 #include <QRegularExpression>
 #include <QTemporaryDir>
 
 #include <gtest/gtest.h>
+
+using namespace Qt::StringLiterals;
 
 namespace {
 
@@ -25,85 +24,72 @@ const char kResults[] = "<testmodules kvkHash=\"#1\" platformHash=\"\">\n"
                         " </module>\n"
                         "</testmodules>\n";
 
+// A processed-results file with a failed test case, in the current folder.
 class ReportTool : public ::testing::Test
 {
 protected:
-    void SetUp() override
-    {
-        ASSERT_TRUE(dir.isValid());
-        results = dir.filePath(QStringLiteral("ProcessedResults.xml"));
-        testutil::WriteFile(results, kResults);
-    }
+    void SetUp() override { testutil::WriteFile(u"ProcessedResults.xml"_s, kResults); }
     QTemporaryDir dir;
-    QString results;
+    testutil::CurrentDirectory current{dir.path()};
 };
 
 TEST_F(ReportTool, SummarisesExecutedModulesAndFailsWhenATestCaseFailed)
 {
-    const ToolResult r = RunTool({QStringLiteral("report"), results});
+    const ToolResult r = Tool("report ProcessedResults.xml");
     EXPECT_EQ(r.status, 1) << r.err.constData();
-    const QString out = QString::fromUtf8(r.out);
-    EXPECT_TRUE(out.contains(QRegularExpression(QStringLiteral("audio\\s+1\\s+1\\s+1\\s+1\\n")))) << r.out.constData();
-    EXPECT_FALSE(out.contains(QLatin1String("socket")));
-    EXPECT_TRUE(out.contains(QRegularExpression(QStringLiteral("Total \\(1 module\\)\\s+1\\s+1\\s+1\\s+1"))));
-
-    const ToolResult all = RunTool({QStringLiteral("report"), QStringLiteral("--all"), results});
-    EXPECT_TRUE(all.out.contains("socket"));
+    EXPECT_EQ(Rows(r.out), (QMap<QString, QString>{{u"audio"_s, u"1 1 1 1"_s}})) << r.out.constData();
+    EXPECT_TRUE(QString::fromUtf8(r.out).contains(QRegularExpression(u"Total \\(1 module\\)\\s+1\\s+1\\s+1\\s+1"_s)));
+    EXPECT_EQ(Rows(Tool("report --all ProcessedResults.xml").out).value(u"socket"_s), u"0 0 0 1"_s);
 }
 
-TEST_F(ReportTool, JUnitReportReadsBackAndIsWellFormed)
+TEST_F(ReportTool, JUnitAndJsonFilesCarryTheVerdicts)
 {
-    const QString junit = dir.filePath(QStringLiteral("junit.xml"));
-    const ToolResult r
-        = RunTool({QStringLiteral("report"), QStringLiteral("--all"), QStringLiteral("--junit"), junit, results});
-    ASSERT_EQ(r.status, 1) << r.err.constData();
-
-    QDomDocument doc;
-    ASSERT_TRUE(doc.setContent(testutil::ReadFile(junit)));
-    const QDomElement suites = doc.documentElement();
-    EXPECT_EQ(suites.tagName(), QStringLiteral("testsuites"));
-    EXPECT_EQ(suites.attribute(QStringLiteral("tests")), QStringLiteral("5"));
-    EXPECT_EQ(suites.attribute(QStringLiteral("failures")), QStringLiteral("1"));
-    const QDomNodeList suiteList = suites.elementsByTagName(QStringLiteral("testsuite"));
+    ASSERT_EQ(Tool("report --all --junit junit.xml --json summary.json ProcessedResults.xml").status, 1);
+    ExpectXmllintAccepts(u"junit.xml"_s);
+    const QDomElement suites = ReadXml(u"junit.xml"_s).documentElement();
+    EXPECT_EQ(suites.tagName(), u"testsuites"_s);
+    EXPECT_EQ(suites.attribute(u"tests"_s), u"5"_s);
+    EXPECT_EQ(suites.attribute(u"failures"_s), u"1"_s);
+    const QDomNodeList suiteList = suites.elementsByTagName(u"testsuite"_s);
     ASSERT_EQ(suiteList.size(), 2);
     const QDomElement audio = suiteList.at(0).toElement();
-    EXPECT_EQ(audio.attribute(QStringLiteral("name")), QStringLiteral("audio"));
-    EXPECT_EQ(audio.attribute(QStringLiteral("skipped")), QStringLiteral("2"));
-    const QDomNodeList cases = audio.elementsByTagName(QStringLiteral("testcase"));
-    ASSERT_EQ(cases.size(), 4);
-    EXPECT_TRUE(cases.at(0).firstChildElement().isNull());
-    EXPECT_EQ(cases.at(1).firstChildElement().tagName(), QStringLiteral("failure"));
-    EXPECT_EQ(cases.at(2).toElement().attribute(QStringLiteral("name")), QStringLiteral("loop & stop"));
-    EXPECT_EQ(cases.at(2).firstChildElement().tagName(), QStringLiteral("skipped"));
-    EXPECT_EQ(cases.at(2).firstChildElement().attribute(QStringLiteral("message")), QStringLiteral("unsupported"));
-    EXPECT_EQ(cases.at(3).firstChildElement().attribute(QStringLiteral("message")), QStringLiteral("unexecuted"));
+    EXPECT_EQ(audio.attribute(u"name"_s), u"audio"_s);
+    EXPECT_EQ(audio.attribute(u"skipped"_s), u"2"_s);
+    QStringList cases; // "name: verdict element, its message"
+    for (QDomElement c = audio.firstChildElement(); !c.isNull(); c = c.nextSiblingElement())
+        cases << c.attribute(u"name"_s) + u": "_s + c.firstChildElement().tagName() + u", "_s
+                + c.firstChildElement().attribute(u"message"_s);
+    EXPECT_EQ(cases,
+              (QStringList{u"play: , "_s, u"seek: failure, test case seek failed"_s,
+                           u"loop & stop: skipped, unsupported"_s, u"eject: skipped, unexecuted"_s}));
 
-    if (testutil::HaveProgram(QStringLiteral("xmllint"))) {
-        QByteArray lint;
-        EXPECT_EQ(testutil::RunProgram(QStringLiteral("xmllint"), {QStringLiteral("--noout"), junit}, &lint), 0)
-            << lint.constData();
-    }
+    const QJsonDocument json = QJsonDocument::fromJson(testutil::ReadFile(u"summary.json"_s));
+    EXPECT_EQ(json[u"modules"][0][u"failed"].toInt(), 1);
+    EXPECT_EQ(json[u"totals"][u"passed"].toInt(), 1);
 }
 
-TEST_F(ReportTool, JsonSummaryCarriesCountsAndTotals)
+TEST_F(ReportTool, TheHtmlPageEscapesNamesAndSaysThatNoHistoryIsRecorded)
 {
-    const QString json = dir.filePath(QStringLiteral("summary.json"));
-    ASSERT_EQ(RunTool({QStringLiteral("report"), QStringLiteral("--json"), json, results}).status, 1);
-    const QJsonObject root = QJsonDocument::fromJson(testutil::ReadFile(json)).object();
-    const QJsonArray modules = root.value(QStringLiteral("modules")).toArray();
-    ASSERT_EQ(modules.size(), 1);
-    EXPECT_EQ(modules.at(0).toObject().value(QStringLiteral("failed")).toInt(), 1);
-    EXPECT_EQ(root.value(QStringLiteral("totals")).toObject().value(QStringLiteral("passed")).toInt(), 1);
+    testutil::WriteFile(
+        u"results.xml"_s,
+        "<testmodules><module name=\"&lt;script&gt;alert(1)&lt;/script&gt;\" family=\"a&amp;b\" source=\"KVK\">"
+        "<testcase name=\"&lt;img src=x onerror=alert(2)&gt;\" result=\"fail\"/></module></testmodules>");
+    EXPECT_EQ(Tool("report results.xml --html history.html").status, 1);
+    const QByteArray page = testutil::ReadFile(u"history.html"_s);
+    ExpectContains(page,
+                   {"&lt;script&gt;alert(1)&lt;/script&gt;", "&lt;img src=x onerror=alert(2)&gt;", "a&amp;b",
+                    "no history across runs is recorded"});
+    ExpectLacks(page, {"<script>alert", "<img", ">Duration</th>"});
+    EXPECT_EQ(page.count("<script>"), 1); // the page's own
 }
 
 TEST_F(ReportTool, UnreadableOrForeignFilesAreUsageErrors)
 {
-    testutil::WriteFile(dir.filePath(QStringLiteral("cut.xml")), QByteArray(kResults).left(100));
-    testutil::WriteFile(dir.filePath(QStringLiteral("other.xml")), "<manifest/>");
-    for (const QString &name :
-         {QStringLiteral("cut.xml"), QStringLiteral("other.xml"), QStringLiteral("missing.xml")}) {
-        const ToolResult r = RunTool({QStringLiteral("report"), dir.filePath(name)});
-        EXPECT_EQ(r.status, 2) << name.toStdString();
+    testutil::WriteFile(u"cut.xml"_s, QByteArray(kResults).left(100));
+    testutil::WriteFile(u"other.xml"_s, "<manifest/>");
+    for (const char *name : {"cut.xml", "other.xml", "missing.xml"}) {
+        const ToolResult r = Tool("report", name);
+        ExpectRefused(r, name);
         EXPECT_TRUE(r.err.startsWith("harness report: ")) << r.err.constData();
     }
 }

@@ -6,21 +6,16 @@ namespace {
 
 TEST(ToolUsage, HashPrintsTheStoredHashName)
 {
-    const ToolResult r = RunTool({QStringLiteral("hash"), QStringLiteral("abcdefgh")});
-    EXPECT_EQ(r.status, 0);
-    EXPECT_EQ(r.out, QByteArray("#144355384\n"));
+    EXPECT_EQ(OutputOf(Tool("hash abcdefgh")), QByteArray("#144355384\n"));
     // An argument that names a command is still an argument.
-    EXPECT_EQ(RunTool({QStringLiteral("hash"), QStringLiteral("run")}).out, QByteArray("#31166\n"));
+    EXPECT_EQ(Tool("hash run").out, QByteArray("#31166\n"));
 }
 
 TEST(ToolUsage, BadUsageExitsWithTwoAndExplainsOnStandardError)
 {
-    for (const QStringList &arguments :
-         {QStringList{}, QStringList{QStringLiteral("no-such-command")}, QStringList{QStringLiteral("hash")},
-          QStringList{QStringLiteral("hash"), QStringLiteral("--bogus"), QStringLiteral("x")},
-          QStringList{QStringLiteral("manifest"), QStringLiteral("extra")}}) {
-        const ToolResult r = RunTool(arguments);
-        EXPECT_EQ(r.status, 2) << arguments.join(QLatin1Char(' ')).toStdString();
+    for (const char *arguments : {"", "no-such-command", "hash", "hash --bogus x", "manifest extra"}) {
+        const ToolResult r = Tool(arguments);
+        EXPECT_EQ(r.status, 2) << arguments;
         EXPECT_TRUE(r.out.isEmpty());
         EXPECT_FALSE(r.err.isEmpty());
     }
@@ -28,24 +23,18 @@ TEST(ToolUsage, BadUsageExitsWithTwoAndExplainsOnStandardError)
 
 TEST(ToolUsage, EveryCommandHasHelpAndTheToolAVersion)
 {
-    const ToolResult top = RunTool({QStringLiteral("--help")});
-    ASSERT_EQ(top.status, 0);
     QStringList names;
-    for (const QByteArray &line : top.out.split('\n')) {
+    for (const QByteArray &line : OutputOf(Tool("--help")).split('\n')) {
         if (line.startsWith("  ") && !line.trimmed().isEmpty())
             names << QString::fromUtf8(line.trimmed().split(' ').first());
     }
     ASSERT_FALSE(names.isEmpty());
     for (const QString &name : names) {
-        const ToolResult r = RunTool({name, QStringLiteral("--help")});
-        EXPECT_EQ(r.status, 0) << name.toStdString();
-        EXPECT_TRUE(r.out.startsWith("Usage: harness " + name.toUtf8())) << r.out.constData();
+        const QByteArray usage = OutputOf(Tool(name, "--help"));
+        EXPECT_TRUE(usage.startsWith("Usage: harness " + name.toUtf8())) << usage.constData();
     }
-    const ToolResult help = RunTool({QStringLiteral("help"), QStringLiteral("run")});
-    EXPECT_TRUE(help.out.startsWith("Usage: harness run")) << help.out.left(200).constData();
-    const ToolResult version = RunTool({QStringLiteral("--version")});
-    EXPECT_EQ(version.status, 0);
-    EXPECT_TRUE(version.out.startsWith("harness "));
+    EXPECT_TRUE(Tool("help run").out.startsWith("Usage: harness run"));
+    EXPECT_TRUE(OutputOf(Tool("--version")).startsWith("harness "));
 }
 
 } // namespace

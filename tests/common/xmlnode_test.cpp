@@ -19,14 +19,11 @@ public:
 namespace {
 
 // What Qt's DOM makes of a document, written by our writer: the reference
-// the light tree is held to.
-QString ThroughDom(const QByteArray &bytes, bool *parsed = nullptr)
+// the light tree is held to; null when the DOM refuses it.
+QString ThroughDom(const QByteArray &bytes)
 {
     QDomDocument document;
-    const bool ok = bool(document.setContent(bytes));
-    if (parsed)
-        *parsed = ok;
-    return ok ? XmlWriter::ToString(document.documentElement()) : QString();
+    return document.setContent(bytes) ? XmlWriter::ToString(document.documentElement()) : QString();
 }
 
 QString ThroughTree(const std::unique_ptr<XmlNode> &root)
@@ -97,9 +94,8 @@ TEST(XmlNode, ReadsEveryDocumentAsTheDomDoes)
 {
     for (size_t i = 0; i < std::size(kWellFormed); ++i) {
         const QByteArray bytes(kWellFormed[i]);
-        bool parsed = false;
-        const QString expected = ThroughDom(bytes, &parsed);
-        ASSERT_TRUE(parsed) << bytes.constData();
+        const QString expected = ThroughDom(bytes);
+        ASSERT_FALSE(expected.isNull()) << bytes.constData();
         EXPECT_EQ(ThroughTree(XmlNode::Parse(bytes)), expected) << bytes.constData();
         EXPECT_EQ(ThroughTree(XmlNode::ParseFully(bytes)), expected) << bytes.constData();
         // Plain documents never need the slower reader.
@@ -119,7 +115,6 @@ TEST(XmlNode, RejectsMalformedDocumentsWithTheDomsMessageAndPlace)
         XmlParseError error, fullError;
         EXPECT_EQ(XmlNode::Parse(bytes, &error), nullptr) << text;
         EXPECT_EQ(XmlNode::ParseFully(bytes, &fullError), nullptr) << text;
-        EXPECT_FALSE(error.message.isEmpty()) << text;
         EXPECT_EQ(error.message, domError) << text;
         EXPECT_EQ(error.line, domLine) << text;
         EXPECT_EQ(error.column, domColumn) << text;
@@ -132,10 +127,8 @@ TEST(XmlNode, ReadsTextThatIconvEncodedInUtf16)
     if (!testutil::HaveProgram(u"iconv"_s))
         GTEST_SKIP() << "iconv is not installed";
     QTemporaryDir dir;
-    ASSERT_TRUE(dir.isValid());
     const QString source = dir.filePath(u"in.xml"_s);
-    const QByteArray utf8("<?xml version=\"1.0\" encoding=\"UTF-16\"?><r n=\"\xC3\xA9\">\xE6\x97\xA5</r>");
-    testutil::WriteFile(source, utf8);
+    testutil::WriteFile(source, "<?xml version=\"1.0\" encoding=\"UTF-16\"?><r n=\"\xC3\xA9\">\xE6\x97\xA5</r>");
     QByteArray utf16;
     ASSERT_EQ(testutil::RunProgram(u"iconv"_s, {u"-f"_s, u"UTF-8"_s, u"-t"_s, u"UTF-16"_s, source}, &utf16), 0);
     const std::unique_ptr<XmlNode> root = XmlNode::Parse(utf16);
@@ -157,17 +150,8 @@ TEST(XmlNode, AgreesWithTheFullReaderOnMutatedDocuments)
         for (int e = 0; e < edits && !bytes.isEmpty(); ++e) {
             const int at = random.bounded(int(bytes.size()));
             const char c = alphabet.at(random.bounded(int(alphabet.size())));
-            switch (random.bounded(3)) {
-            case 0:
-                bytes[at] = c;
-                break;
-            case 1:
-                bytes.insert(at, c);
-                break;
-            default:
-                bytes.remove(at, 1);
-                break;
-            }
+            const int kind = random.bounded(3); // replace, insert or remove
+            bytes.replace(at, kind == 1 ? 0 : 1, kind == 2 ? QByteArray() : QByteArray(1, c));
         }
         const std::unique_ptr<XmlNode> quick = XmlNodeTestAccess::ParseQuickly(bytes);
         if (quick) {
@@ -182,32 +166,20 @@ TEST(XmlNode, CopiesToAndFromTheDomAndWritesTheSameBytes)
 {
     // Records are written as light trees and handed to DOM callers by CopyTo;
     // DOM elements given to them are read through FromDom.
-    XmlNode root(u"root"_s);
-    root.SetAttribute(u"zeta"_s, u"last"_s);
-    root.SetAttribute(u"alpha"_s, u"a\"b<c>\n\t&"_s);
-    root.SetAttribute(u"alpha"_s, u"replaced \xE9"_s);
-    XmlNode &list = root.AppendElement(u"list"_s);
-    for (int i = 0; i < 3; ++i)
-        list.AppendElement(u"item"_s).SetAttribute(u"n"_s, QString::number(i));
-    root.AppendElement(u"empty"_s);
-    XmlNode &lightText = root.AppendElement(u"text"_s);
-    lightText.AppendText(u"a < b"_s);
-    auto comment = std::make_unique<XmlNode>(QString(), XmlNode::Comment);
-    comment->SetValue(u"c"_s);
-    lightText.AppendChild(std::move(comment));
+    const std::unique_ptr<XmlNode> parsed
+        = XmlNode::Parse("<root zeta='last' alpha='first'><list><item n='0'/><item n='1'/><item n='2'/></list><empty/>"
+                         "<text>a &lt; b<!--c--><?pi data?></text></root>");
+    ASSERT_NE(parsed, nullptr);
+    XmlNode &root = *parsed;
+    root.SetAttribute(u"alpha"_s, u"replaced \xE9 a\"b<c>\n\t&"_s);
     auto section = std::make_unique<XmlNode>(QString(), XmlNode::CData);
     section->SetValue(u"]]>"_s);
-    lightText.AppendChild(std::move(section));
-    auto instruction = std::make_unique<XmlNode>(u"pi"_s, XmlNode::ProcessingInstruction);
-    instruction->SetValue(u"data"_s);
-    lightText.AppendChild(std::move(instruction));
+    root.ChildElements().back()->AppendChild(std::move(section));
 
     QDomDocument document;
-    QDomElement domRoot = document.createElement(u"root"_s);
-    document.appendChild(domRoot);
+    QDomElement domRoot = document.appendChild(document.createElement(u"root"_s)).toElement();
     root.CopyTo(domRoot);
-    EXPECT_EQ(domRoot.attribute(u"alpha"_s), u"replaced \xE9"_s);
-    EXPECT_EQ(domRoot.elementsByTagName(u"item"_s).count(), 3);
+    EXPECT_EQ(domRoot.attribute(u"alpha"_s), u"replaced \xE9 a\"b<c>\n\t&"_s);
     EXPECT_EQ(XmlWriter::Serialize(root), XmlWriter::Serialize(domRoot));
     EXPECT_EQ(XmlWriter::Serialize(*XmlNode::FromDom(domRoot)), XmlWriter::Serialize(root));
 
@@ -223,24 +195,16 @@ TEST(XmlNode, CopiesToAndFromTheDomAndWritesTheSameBytes)
 TEST(XmlNode, KeepsHundredsOfThousandsOfLevelsOffTheStack)
 {
     constexpr int kDepth = 300000;
-    QByteArray bytes;
-    bytes.reserve(kDepth * 7 + 16);
-    for (int i = 0; i < kDepth; ++i)
-        bytes += "<a>";
-    bytes += "deep";
-    for (int i = 0; i < kDepth; ++i)
-        bytes += "</a>";
-    std::unique_ptr<XmlNode> root = XmlNode::Parse(bytes);
+    const QByteArray bytes = QByteArray("<a>").repeated(kDepth) + "deep" + QByteArray("</a>").repeated(kDepth);
+    const std::unique_ptr<XmlNode> root = XmlNode::Parse(bytes);
     ASSERT_NE(root, nullptr);
     EXPECT_EQ(root->InnerText(), u"deep"_s);
     EXPECT_EQ(root->Depth(), kDepth);
-    // Without indentation: indented, the text grows with the square of the
-    // depth.
+    // Without indentation: indented, the text grows with the square of the depth.
     const QByteArray written = XmlWriter::Serialize(*root, 0);
     EXPECT_EQ(written.count("</a>"), kDepth);
     EXPECT_TRUE(written.contains(">deep</a>"));
     EXPECT_LT(written.size(), bytes.size() * 2);
-    root.reset();
 }
 
 TEST(XmlNode, EditsKeepDocumentOrder)
