@@ -16,30 +16,6 @@
 
 using namespace Qt::StringLiterals;
 
-// The Harness befriends this class too.
-class HarnessControllerAccess
-{
-public:
-    static QMap<QString, QString> &Environment(Harness &harness) { return harness.m_environment; }
-    static void SetCatalogues(Harness &harness, QSharedPointer<Manifest> kit, QSharedPointer<Manifest> platform)
-    {
-        harness.m_kitManifest = kit;
-        harness.m_platformManifest = platform;
-        // Set-up must not replace the catalogues given here.
-        harness.m_environmentReady = true;
-    }
-    static Manifest *Kit(Harness &harness) { return harness.m_kitManifest.data(); }
-    static Manifest *Platform(Harness &harness) { return harness.m_platformManifest.data(); }
-    static bool SetupManifest(Harness &harness) { return harness.SetupManifest(); }
-    static void Update(Harness &harness, QSharedPointer<_TestModule> module)
-    {
-        harness.UpdateProcessedModulesXML(module);
-    }
-    static bool KitNotSelected(const Harness &harness) { return harness.m_kitNotSelected; }
-    static void SetKitNotSelected(Harness &harness, bool value) { harness.m_kitNotSelected = value; }
-    static const QStringList &TestCases(const Harness &harness) { return harness.m_testCases; }
-};
-
 namespace controllertest {
 
 // A module whose log parser answers with a prepared record, and whose run
@@ -112,7 +88,6 @@ inline QSharedPointer<Manifest> MakeCatalogue(const QString &path, bool isPlatfo
     return catalogue;
 }
 
-using testutil::ReadResults;
-using testutil::ResultsView;
-
 } // namespace controllertest
+
+using namespace controllertest;

@@ -2,15 +2,7 @@
 
 #include <QElapsedTimer>
 
-using namespace Qt::StringLiterals;
-
 namespace {
-
-using harnesstest::CapturedLog;
-using harnesstest::Toolset;
-using testutil::CurrentDirectory;
-using testutil::ReadFile;
-using testutil::WriteFile;
 
 class HarnessCompileTest : public ::testing::Test
 {

@@ -6,21 +6,11 @@
 #include <QDateTime>
 #include <QUuid>
 
-using namespace Qt::StringLiterals;
-
 namespace {
-
-using harnesstest::CapturedLog;
-using harnesstest::SetModified;
-using harnesstest::Toolset;
-using testutil::CurrentDirectory;
-using testutil::EnvGuard;
-using testutil::ReadFile;
-using testutil::WriteFile;
 
 using Env = QMap<QString, QString>;
 
-const Env &EnvOf(const Harness &harness)
+const Env &EnvOf(Harness &harness)
 {
     return HarnessTestAccess::Environment(harness);
 }

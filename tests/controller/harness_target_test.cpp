@@ -2,13 +2,7 @@
 
 #include "environment/testdirectories.h"
 
-using namespace Qt::StringLiterals;
-
 namespace {
-
-using harnesstest::CapturedLog;
-using testutil::ReadFile;
-using testutil::WriteFile;
 
 // Each test gets its own handsets folder and data root.
 class HarnessTargetTest : public ::testing::Test
@@ -31,10 +25,10 @@ protected:
         const IKestoDevice *device = HarnessTestAccess::Device(m_harness);
         return device ? device->GetConnectTarget().name : QString();
     }
-    const QMap<QString, QString> &Env() const { return HarnessTestAccess::Environment(m_harness); }
+    const QMap<QString, QString> &Env() { return HarnessTestAccess::Environment(m_harness); }
 
-    testutil::KitRun m_run;
-    testutil::HandsetFixture &m_handsets = m_run.Handsets();
+    KitRun m_run;
+    HandsetFixture &m_handsets = m_run.Handsets();
     CapturedLog m_log;
     Harness m_harness;
 };

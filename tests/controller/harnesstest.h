@@ -4,6 +4,7 @@
 // a log captured in a file, and a temporary SDK toolset with stand-in
 // resource compilers.
 
+#include "catalogue/manifest.h"
 #include "controller/harness.h"
 #include "log/log.h"
 
@@ -24,17 +25,30 @@ class HarnessTestAccess
 {
 public:
     static bool SetupEnvironment(Harness &harness) { return harness.SetupEnvironment(); }
-    static const QMap<QString, QString> &Environment(const Harness &harness) { return harness.m_environment; }
+    static QMap<QString, QString> &Environment(Harness &harness) { return harness.m_environment; }
     static quint32 CopyDelay(const Harness &harness) { return harness.m_copyDelay; }
     static bool KitNotSelected(const Harness &harness) { return harness.m_kitNotSelected; }
+    static void SetKitNotSelected(Harness &harness, bool value) { harness.m_kitNotSelected = value; }
     static bool EnvironmentReady(const Harness &harness) { return harness.m_environmentReady; }
     static IKestoDevice *Device(const Harness &harness) { return harness.m_device; }
     static QString Target(const Harness &harness) { return harness.m_target; }
+    static const QStringList &TestCases(const Harness &harness) { return harness.m_testCases; }
+    static void Update(Harness &harness, QSharedPointer<_TestModule> module)
+    {
+        harness.UpdateProcessedModulesXML(module);
+    }
+    // Set-up keeps the catalogues given here.
+    static void SetCatalogues(Harness &harness, QSharedPointer<Manifest> kit, QSharedPointer<Manifest> platform)
+    {
+        harness.m_kitManifest = kit;
+        harness.m_platformManifest = platform;
+        harness.m_environmentReady = true;
+    }
 };
 
-namespace harnesstest {
+using namespace testutil;
 
-using testutil::CapturedLog;
+namespace harnesstest {
 
 // A temporary toolset named by KESTIX_TOOLSET, whose resource compilers are
 // shell scripts. Every call of a stand-in appends its arguments, one per
@@ -60,7 +74,7 @@ public:
     {
         const QString path = m_dir.filePath(QString::fromLatin1(flag));
         if (on)
-            testutil::WriteFile(path, QByteArray());
+            WriteFile(path, QByteArray());
         else
             QFile::remove(path);
     }
@@ -70,7 +84,7 @@ public:
     {
         QList<QStringList> calls;
         QStringList current;
-        const QString text = QString::fromLocal8Bit(testutil::ReadFile(m_dir.filePath(u"calls.txt"_s)));
+        const QString text = QString::fromLocal8Bit(ReadFile(m_dir.filePath(u"calls.txt"_s)));
         for (const QString &line : text.split(u'\n')) {
             if (line == u"--"_s) {
                 calls.append(current);
@@ -84,7 +98,7 @@ public:
 
     static void WriteScript(const QString &path, const char *script)
     {
-        testutil::WriteFile(path, QByteArray(script));
+        WriteFile(path, QByteArray(script));
         QFile::setPermissions(path, QFileDevice::ReadOwner | QFileDevice::WriteOwner | QFileDevice::ExeOwner);
     }
 
@@ -124,7 +138,7 @@ cp "$4" "$3"
 )SH";
 
     QTemporaryDir m_dir;
-    testutil::EnvGuard m_env;
+    EnvGuard m_env;
 };
 
 // Sets a file's modification time, so freshness does not depend on how fast
@@ -137,3 +151,5 @@ inline void SetModified(const QString &path, const QDateTime &when)
 }
 
 } // namespace harnesstest
+
+using namespace harnesstest;

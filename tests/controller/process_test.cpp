@@ -4,17 +4,7 @@
 
 #include <QDir>
 
-using namespace Qt::StringLiterals;
-
 namespace {
-
-using controllertest::CatalogueModule;
-using controllertest::MakeCatalogue;
-using controllertest::ReadResults;
-using controllertest::ResultsView;
-using harnesstest::CapturedLog;
-using testutil::ReadFile;
-using testutil::WriteFile;
 
 QByteArray CtfLog(const char *suite, const QList<QPair<const char *, const char *>> &cases)
 {
@@ -69,7 +59,7 @@ protected:
     {
         harness.SetLogger(log.log());
         harness.SetLogOutputPath(LogFolder());
-        HarnessControllerAccess::SetCatalogues(harness, m_kit, m_platform);
+        HarnessTestAccess::SetCatalogues(harness, m_kit, m_platform);
     }
 
     QTemporaryDir m_dir;
@@ -85,7 +75,7 @@ TEST_F(ProcessTest, WholeTreeFeedsOneResultsFileWithIndentedMessages)
     ASSERT_TRUE(m_harness.Process(0));
 
     const QString results = LogFolder() + u"/ProcessedResults/ProcessedResults.xml"_s;
-    auto &env = HarnessControllerAccess::Environment(m_harness);
+    auto &env = HarnessTestAccess::Environment(m_harness);
     EXPECT_EQ(env.value(u"ProcessedResultsPath"_s), results);
     EXPECT_EQ(env.value(u"LogPath"_s), LogFolder());
     const ResultsView view = ReadResults(results);
@@ -132,14 +122,14 @@ TEST_F(ProcessTest, GivesTheSameFileAsRecordingTheLogsOneByOne)
     Harness single;
     Prepare(single, singleLog);
     const QString separate = m_dir.filePath(u"separate.xml"_s);
-    HarnessControllerAccess::Environment(single).insert(u"ProcessedResultsPath"_s, separate);
+    HarnessTestAccess::Environment(single).insert(u"ProcessedResultsPath"_s, separate);
     for (const char *relative : {"audio-ctf-2026-12-03.log", "menu-2026-12-03.txt", "a-run/menu-2026-12-05.txt",
                                  "b-run/audio-ctf-2026-12-04.log", "b-run/deeper/ghost-ctf-1.log"}) {
         const QString path = LogFolder() + u'/' + QString::fromLatin1(relative);
         QSharedPointer<_TestModule> module = Manifest::CreateTestModuleFromLog(path);
         ASSERT_TRUE(module);
         module->AddDesktopLogFile(path);
-        HarnessControllerAccess::Update(single, module);
+        HarnessTestAccess::Update(single, module);
         // Every step left a complete file behind.
         EXPECT_TRUE(ReadResults(separate).ok);
     }
@@ -172,9 +162,9 @@ TEST_F(ProcessTest, WithoutALogFolderNothingIsCreated)
     CapturedLog log;
     Harness harness;
     harness.SetLogger(log.log());
-    HarnessControllerAccess::SetCatalogues(harness, m_kit, m_platform);
+    HarnessTestAccess::SetCatalogues(harness, m_kit, m_platform);
     EXPECT_FALSE(harness.Process(0));
-    EXPECT_FALSE(HarnessControllerAccess::Environment(harness).contains(u"ProcessedResultsPath"_s));
+    EXPECT_FALSE(HarnessTestAccess::Environment(harness).contains(u"ProcessedResultsPath"_s));
 }
 
 TEST_F(ProcessTest, LinkBackUpTheTreeIsNotFollowed)

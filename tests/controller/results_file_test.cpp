@@ -5,18 +5,7 @@
 #include <QDir>
 #include <QRandomGenerator>
 
-using namespace Qt::StringLiterals;
-
 namespace {
-
-using controllertest::CatalogueModule;
-using controllertest::MakeCatalogue;
-using controllertest::ReadResults;
-using controllertest::ResultsView;
-using controllertest::ScriptedModule;
-using harnesstest::CapturedLog;
-using testutil::ReadFile;
-using testutil::WriteFile;
 
 // ---- Result precedence ----
 
@@ -64,7 +53,7 @@ protected:
         UseCatalogues(u"kit"_s);
     }
 
-    QMap<QString, QString> &Env() { return HarnessControllerAccess::Environment(m_harness); }
+    QMap<QString, QString> &Env() { return HarnessTestAccess::Environment(m_harness); }
 
     // Kit: Audio (a, b, c), Video (x), a secondary module and a framework
     // module; platform: Shell (s1).
@@ -77,7 +66,7 @@ protected:
                                CatalogueModule(u"CtfRunner"_s, u"#14"_s, {u"r"_s}, u"TestFrameworks"_s)});
         m_platform
             = MakeCatalogue(m_dir.filePath(u"platform"_s), true, {CatalogueModule(u"Shell"_s, u"#21"_s, {u"s1"_s})});
-        HarnessControllerAccess::SetCatalogues(m_harness, m_kit, m_platform);
+        HarnessTestAccess::SetCatalogues(m_harness, m_kit, m_platform);
     }
 
     // A run module whose log reports verdicts of the named module.
@@ -91,7 +80,7 @@ protected:
 
     void Record(const QString &name, const QList<TestCaseResult> &verdicts)
     {
-        HarnessControllerAccess::Update(m_harness, Logged(name, verdicts));
+        HarnessTestAccess::Update(m_harness, Logged(name, verdicts));
     }
 
     QString ResultsPath() const
@@ -131,17 +120,16 @@ TEST_F(ResultsFileTest, FirstUpdateWritesTheSkeletonOfBothCataloguesBelowTheLogF
                                       {u"Shell/s1"_s, u"unexecuted"_s},
                                       {u"Video/x"_s, u"unexecuted"_s}}));
 
-    if (testutil::HaveProgram(u"xmllint"_s)) {
+    if (HaveProgram(u"xmllint"_s)) {
         QByteArray output;
-        EXPECT_EQ(testutil::RunProgram(u"xmllint"_s, {u"--noout"_s, ResultsPath()}, &output), 0)
-            << output.toStdString();
+        EXPECT_EQ(RunProgram(u"xmllint"_s, {u"--noout"_s, ResultsPath()}, &output), 0) << output.toStdString();
     }
 }
 
 TEST_F(ResultsFileTest, LogIdHashFindsTheModuleWhateverItsName)
 {
     // The log's hash names Video although the log states Audio.
-    HarnessControllerAccess::Update(m_harness, Logged(u"Audio"_s, {{u"x"_s, u"pass"_s}}, u"#12"_s));
+    HarnessTestAccess::Update(m_harness, Logged(u"Audio"_s, {{u"x"_s, u"pass"_s}}, u"#12"_s));
     const ResultsView view = ReadResults(ResultsPath());
     EXPECT_EQ(view.verdicts.value(u"Video/x"_s), u"pass"_s);
     EXPECT_FALSE(view.verdicts.contains(u"Audio/x"_s));
@@ -158,7 +146,7 @@ TEST_F(ResultsFileTest, ModuleMissingFromTheFileIsAddedWithTheCatalogueFamily)
     WriteFile(ResultsPath(), document.toByteArray(1));
 
     QSharedPointer<ScriptedModule> run = Logged(u"AUDIO"_s, {{u"z"_s, u"fail"_s}});
-    HarnessControllerAccess::Update(m_harness, run);
+    HarnessTestAccess::Update(m_harness, run);
     const ResultsView view = ReadResults(ResultsPath());
     const QDomElement added = view.modules.value(u"AUDIO"_s);
     ASSERT_FALSE(added.isNull());
@@ -189,7 +177,7 @@ TEST_F(ResultsFileTest, UnparsedLogLeavesTheFileUntouched)
 
     QSharedPointer<ScriptedModule> run = Logged(u"Audio"_s, {});
     run->parses = false;
-    HarnessControllerAccess::Update(m_harness, run);
+    HarnessTestAccess::Update(m_harness, run);
     EXPECT_EQ(run->parseCalls, 1);
     EXPECT_EQ(ReadFile(ResultsPath()), before);
 }

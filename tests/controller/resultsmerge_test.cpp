@@ -8,11 +8,7 @@
 
 #include <QTimeZone>
 
-using namespace Qt::StringLiterals;
-
 namespace {
-
-using testutil::WriteFile;
 
 // A processed-results file of one module "M" (source KVK) whose test cases
 // carry the given verdicts, and a module "Idle" that did not run.
@@ -95,8 +91,8 @@ TEST(ResultsMergeTest, RefusesFilesItCannotMergeAndKeepsWhatItHas)
 // the merge gives the same verdicts, and shard 2's modules as not run.
 TEST(ResultsMergeTest, MergedShardsEqualOneRunOfTheSelection)
 {
-    testutil::KitRun run;
-    testutil::AddShardModules(run.Kit(), 8, 2, u"0"_s);
+    KitRun run;
+    AddShardModules(run.Kit(), 8, 2, u"0"_s);
     ASSERT_TRUE(run.KitOk());
     const QStringList names = run.AddHandsets(3);
     const QList<QSharedPointer<_TestModule>> selection = run.Select();

@@ -13,14 +13,7 @@
 #include <QRegularExpression>
 #include <QSet>
 
-using namespace Qt::StringLiterals;
-
 namespace {
-
-using controllertest::MakeCatalogue;
-using controllertest::ScriptedModule;
-using harnesstest::CapturedLog;
-using testutil::EnvGuard;
 
 class RecordingModule : public ScriptedModule
 {
@@ -111,7 +104,7 @@ protected:
         m_kit = MakeCatalogue(m_dir.filePath(u"kit"_s), false, {});
         m_kit->frameworks.insert(m_ctf->name, m_ctf);
         m_kit->frameworks.insert(m_oat->name, m_oat);
-        HarnessControllerAccess::SetCatalogues(m_harness, m_kit, {});
+        HarnessTestAccess::SetCatalogues(m_harness, m_kit, {});
     }
 
     void TearDown() override { m_harness.DisconnectTarget(); }
@@ -121,7 +114,7 @@ protected:
     {
         module.pollsNeeded = 5;
         module.onPoll = [this](IKestoDevice *device) {
-            testutil::WriteFile(m_handsets.HandsetFolder(u"phone"_s) + u"/offline"_s, QByteArray());
+            WriteFile(m_handsets.HandsetFolder(u"phone"_s) + u"/offline"_s, QByteArray());
             device->FileExists(u"fs:/anything"_s);
         };
     }
@@ -136,10 +129,10 @@ protected:
         return module;
     }
 
-    QString ResultsPath() { return HarnessControllerAccess::Environment(m_harness).value(u"ProcessedResultsPath"_s); }
+    QString ResultsPath() { return HarnessTestAccess::Environment(m_harness).value(u"ProcessedResultsPath"_s); }
 
     QTemporaryDir m_dir;
-    testutil::HandsetFixture m_handsets;
+    HandsetFixture m_handsets;
     CapturedLog m_log;
     Harness m_harness;
     QStringList m_events;
@@ -170,7 +163,7 @@ TEST_F(RunLoopTest, ModulesRunByTypeThenNameWithEachFrameworkLoadedOnce)
                                             "   Test Beta Run\n   Removing test Beta\n")));
     EXPECT_TRUE(log.contains(u"Unloading Framework ctf\nLoading Framework oat\n"_s));
     EXPECT_TRUE(log.endsWith(u"Unloading Framework oat\n"_s));
-    const controllertest::ResultsView view = controllertest::ReadResults(ResultsPath());
+    const ResultsView view = ReadResults(ResultsPath());
     EXPECT_EQ(view.verdicts.value(u"Zeta/Zeta_1"_s), u"pass"_s);
     EXPECT_EQ(view.verdicts.value(u"Beta/Beta_1"_s), u"pass"_s);
 }
@@ -265,7 +258,7 @@ TEST_F(RunLoopTest, TestCasesGoToTheFirstModuleOnlyAndTheRunOptionToAll)
     EXPECT_TRUE(second->seenTestCases.isEmpty());
     EXPECT_EQ(first->seenRunOption, u"-fast"_s);
     EXPECT_EQ(second->seenRunOption, u"-fast"_s);
-    EXPECT_TRUE(HarnessControllerAccess::TestCases(m_harness).isEmpty());
+    EXPECT_TRUE(HarnessTestAccess::TestCases(m_harness).isEmpty());
 }
 
 TEST_F(RunLoopTest, LogIsPolledEverySecondOnHandsetsAndCopiedAfterTenMinutesAtMost)
@@ -400,7 +393,7 @@ TEST_F(RunLoopTest, UnloadAllTakesEveryKitFramework)
 TEST_F(RunLoopTest, SecondaryModulesComeFromBothCataloguesBeforeTheModuleStarts)
 {
     QSharedPointer<Manifest> platform = MakeCatalogue(m_dir.filePath(u"platform"_s), true, {});
-    HarnessControllerAccess::SetCatalogues(m_harness, m_kit, platform);
+    HarnessTestAccess::SetCatalogues(m_harness, m_kit, platform);
     QSharedPointer<RecordingModule> module(new RecordingModule(u"Main"_s, u"ctf"_s, &m_events));
     module->secondaryModules = {u"Both"_s, u"Nowhere"_s};
     for (Manifest *catalogue : {m_kit.data(), platform.data()}) {
@@ -428,7 +421,7 @@ TEST_F(RunLoopTest, RunByNameTakesTheKitModule)
 
 namespace {
 
-class ListingModule : public controllertest::ScriptedModule
+class ListingModule : public ScriptedModule
 {
 public:
     ListingModule() : ScriptedModule(u"Lister"_s) { }

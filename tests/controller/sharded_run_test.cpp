@@ -9,11 +9,7 @@
 #include <QDir>
 #include <QRegularExpression>
 
-using namespace Qt::StringLiterals;
-
 namespace {
-
-using testutil::WriteFile;
 
 constexpr int kCtfModules = 20;
 constexpr int kAppletModules = 4;
@@ -54,8 +50,8 @@ protected:
         return done;
     }
 
-    testutil::KitRun m_run;
-    const QStringList m_names = testutil::AddShardModules(m_run.Kit(), kCtfModules, kAppletModules, u"0.05"_s);
+    KitRun m_run;
+    const QStringList m_names = AddShardModules(m_run.Kit(), kCtfModules, kAppletModules, u"0.05"_s);
 };
 
 TEST_F(ShardedRunTest, FourHandsetsShareTheQueueAndMatchAOneHandsetRun)
