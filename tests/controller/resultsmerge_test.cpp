@@ -4,7 +4,6 @@
 
 #include "controller/moduletimings.h"
 #include "controller/resultsmerge.h"
-#include "controller/shardplan.h"
 
 #include <QTimeZone>
 
@@ -85,61 +84,6 @@ TEST(ResultsMergeTest, RefusesFilesItCannotMergeAndKeepsWhatItHas)
     WriteFile(dir.filePath(u"Timings.json"_s), "{}");
     EXPECT_FALSE(merge.Add(good)); // a damaged timings file beside it
     EXPECT_TRUE(merge.ErrorString().contains(u"not a timings file"_s));
-}
-
-// Shards 0 and 1 of 3 on two handsets against the whole selection on a third:
-// the merge gives the same verdicts, and shard 2's modules as not run.
-TEST(ResultsMergeTest, MergedShardsEqualOneRunOfTheSelection)
-{
-    KitRun run;
-    AddShardModules(run.Kit(), 8, 2, u"0"_s);
-    ASSERT_TRUE(run.KitOk());
-    const QStringList names = run.AddHandsets(3);
-    const QList<QSharedPointer<_TestModule>> selection = run.Select();
-    QList<ShardPlan::Module> planned;
-    for (const QSharedPointer<_TestModule> &module : selection)
-        planned.append({module->moduleName, module->Source(), int(module->testCases.size()), -1});
-    const QList<ResultsMerge::Expected> expected = ResultsMerge::ExpectedOf(selection);
-    const ShardPlan plan = ShardPlan::Make(planned, 3);
-
-    // Handset i runs shard i (0, 1); the last handset runs everything.
-    for (int i = 0; i < 3; ++i) {
-        QStringList shard;
-        for (const ShardPlan::Entry &entry : plan.Modules()) {
-            if (i == 2 || entry.shard == i)
-                shard.append(entry.name);
-        }
-        ASSERT_TRUE(run.RunModules(run.NewHarness(names.at(i)), shard)) << run.LogText().toStdString();
-    }
-
-    ResultsMerge shards;
-    ASSERT_TRUE(shards.Add(run.ResultsPath(names.at(0))));
-    ASSERT_TRUE(shards.Add(run.ResultsPath(names.at(1))));
-    shards.Expect(expected);
-    ResultsMerge whole;
-    ASSERT_TRUE(whole.Add(run.ResultsPath(names.at(2))));
-    whole.Expect(expected);
-
-    const QList<ResultsMerge::Row> merged = shards.Rows();
-    const QList<ResultsMerge::Row> reference = whole.Rows();
-    ASSERT_EQ(merged.size(), selection.size());
-    ASSERT_EQ(reference.size(), selection.size());
-    QStringList notRun;
-    for (qsizetype i = 0; i < merged.size(); ++i) {
-        const ShardPlan::Entry &entry = plan.Modules().at(i);
-        ASSERT_EQ(merged.at(i).name, entry.name);
-        EXPECT_TRUE(reference.at(i).ran);
-        if (entry.shard == 2) {
-            notRun.append(entry.name);
-            EXPECT_FALSE(merged.at(i).ran) << entry.name.toStdString();
-            continue;
-        }
-        EXPECT_EQ(merged.at(i).handset, names.at(entry.shard));
-        EXPECT_EQ(merged.at(i).testCases, reference.at(i).testCases) << entry.name.toStdString();
-        EXPECT_EQ(merged.at(i).family, reference.at(i).family);
-    }
-    EXPECT_FALSE(notRun.isEmpty());
-    EXPECT_EQ(shards.NotRun(), notRun);
 }
 
 } // namespace

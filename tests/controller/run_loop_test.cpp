@@ -51,6 +51,11 @@ public:
         return true;
     }
     void PostProcess(QMap<QString, QString> &) override { m_events->append(u"postprocess "_s + moduleName); }
+    bool GetLogFilePaths(IKestoDevice *, QStringList &paths) override
+    {
+        paths << u"fs:/a.log"_s << u"fs:/b.log"_s;
+        return true;
+    }
 
     bool runs = true;
     bool copies = true;
@@ -89,6 +94,28 @@ private:
     QStringList *m_events;
 };
 
+// What the run tells its observer: the start and end of each module, what it waited for and how each ended.
+struct Watcher : RunObserver
+{
+    void ModuleStarted(const ModuleRecord &record) override { events.append(u"start "_s + record.name); }
+    void ModuleWaiting(const ModuleRecord &record, const QString &what, qint64 elapsedMs) override
+    {
+        EXPECT_GE(elapsedMs, lastElapsed);
+        lastElapsed = elapsedMs;
+        waits.insert(record.name + u' ' + what);
+    }
+    void ModuleEnded(const ModuleRecord &record) override
+    {
+        events.append(u"end "_s + record.name);
+        ended.insert(record.name, record);
+        lastElapsed = 0;
+    }
+    QStringList events;
+    QSet<QString> waits;
+    qint64 lastElapsed = 0;
+    QMap<QString, ModuleRecord> ended;
+};
+
 class RunLoopTest : public ::testing::Test
 {
 protected:
@@ -105,9 +132,14 @@ protected:
         m_kit->frameworks.insert(m_ctf->name, m_ctf);
         m_kit->frameworks.insert(m_oat->name, m_oat);
         HarnessTestAccess::SetCatalogues(m_harness, m_kit, {});
+        m_harness.SetRunObserver(&m_watcher);
     }
 
-    void TearDown() override { m_harness.DisconnectTarget(); }
+    void TearDown() override
+    {
+        m_harness.SetRunObserver(nullptr);
+        m_harness.DisconnectTarget();
+    }
 
     // The handset goes offline while module's log is polled.
     void LoseHandsetWhilePolling(RecordingModule &module)
@@ -139,12 +171,18 @@ protected:
     QSharedPointer<RecordingFramework> m_ctf;
     QSharedPointer<RecordingFramework> m_oat;
     QSharedPointer<Manifest> m_kit;
+    Watcher m_watcher;
 };
 
-TEST_F(RunLoopTest, EmptyQueueRunsNothing)
+TEST_F(RunLoopTest, EmptyQueueFailsButModulesWithoutAFrameworkCountAsTakenInHand)
 {
     EXPECT_FALSE(m_harness.Run());
     EXPECT_EQ(m_log.Text(), u"No modules to run."_s);
+    Queue(u"Menu"_s, u"uitf"_s);
+    Queue(u"Other"_s, u"uitf"_s);
+    EXPECT_TRUE(m_harness.Run());
+    EXPECT_TRUE(m_events.isEmpty());
+    EXPECT_EQ(m_log.Text().count(u"Framework uitf not found.\n"_s), 2);
 }
 
 TEST_F(RunLoopTest, ModulesRunByTypeThenNameWithEachFrameworkLoadedOnce)
@@ -189,28 +227,20 @@ TEST_F(RunLoopTest, UnknownFrameworkAndFailedStartSkipTheModuleAndTheRunGoesOn)
     Queue(u"Fine"_s, u"ctf"_s);
     QSharedPointer<RecordingModule> silent = Queue(u"Silent"_s, u"ctf"_s);
     silent->copies = false;
-    // What the run tells its observer about each module it took.
-    struct Records : RunObserver
-    {
-        QMap<QString, ModuleRecord> byName;
-        void ModuleEnded(const ModuleRecord &record) override { byName.insert(record.name, record); }
-    } records;
-    m_harness.SetRunObserver(&records);
 
     EXPECT_TRUE(m_harness.Run());
-    m_harness.SetRunObserver(nullptr);
     const QMap<QString, QString> reasons{{u"Menu"_s, u"no framework for test type uitf"_s},
                                          {u"Broken"_s, u"install or start failed"_s},
                                          {u"Fine"_s, QString()},
                                          {u"Silent"_s, u"no log was found"_s}};
-    ASSERT_EQ(records.byName.keys(), reasons.keys());
+    ASSERT_EQ(m_watcher.ended.keys(), reasons.keys());
     for (auto it = reasons.cbegin(); it != reasons.cend(); ++it) {
-        const ModuleRecord &record = records.byName.value(it.key());
+        const ModuleRecord &record = m_watcher.ended.value(it.key());
         EXPECT_EQ(record.Reason(), it.value()) << it.key().toStdString();
         EXPECT_EQ(record.handset, u"phone"_s);
         EXPECT_EQ(record.start.timeSpec(), Qt::UTC);
     }
-    const ModuleRecord &fine = records.byName.value(u"Fine"_s);
+    const ModuleRecord &fine = m_watcher.ended.value(u"Fine"_s);
     ASSERT_EQ(fine.results.caseResults.size(), 1);
     EXPECT_EQ(fine.results.caseResults.at(0).testCase, u"Fine_1"_s);
     EXPECT_EQ(m_events,
@@ -221,15 +251,6 @@ TEST_F(RunLoopTest, UnknownFrameworkAndFailedStartSkipTheModuleAndTheRunGoesOn)
     EXPECT_TRUE(log.contains(u"   No logs found for Silent\n"_s));
     EXPECT_TRUE(log.contains(u"Framework uitf not found.\n"_s));
     EXPECT_FALSE(log.contains(u"Removing test Silent"_s));
-}
-
-TEST_F(RunLoopTest, OnlyUnknownFrameworksStillCountAsTakenInHand)
-{
-    Queue(u"Menu"_s, u"uitf"_s);
-    Queue(u"Other"_s, u"uitf"_s);
-    EXPECT_TRUE(m_harness.Run());
-    EXPECT_TRUE(m_events.isEmpty());
-    EXPECT_EQ(m_log.Text().count(u"Framework uitf not found.\n"_s), 2);
 }
 
 TEST_F(RunLoopTest, NoDeleteKeepsModulesAndCopyDelayPausesBeforeEachCopy)
@@ -261,7 +282,7 @@ TEST_F(RunLoopTest, TestCasesGoToTheFirstModuleOnlyAndTheRunOptionToAll)
     EXPECT_TRUE(HarnessTestAccess::TestCases(m_harness).isEmpty());
 }
 
-TEST_F(RunLoopTest, LogIsPolledEverySecondOnHandsetsAndCopiedAfterTenMinutesAtMost)
+TEST_F(RunLoopTest, LogIsPolledEverySecondOnHandsetsAQuarterSecondOnSimulatorsAndCopiedAfterTenMinutes)
 {
     QSharedPointer<RecordingModule> slow = Queue(u"Slow"_s, u"ctf"_s);
     slow->pollsNeeded = 3;
@@ -276,67 +297,36 @@ TEST_F(RunLoopTest, LogIsPolledEverySecondOnHandsetsAndCopiedAfterTenMinutesAtMo
     EXPECT_GE(never->pollTimes.size(), 590);
     EXPECT_LE(never->pollTimes.size(), 602);
     EXPECT_TRUE(m_events.contains(u"copy Stuck"_s));
+
+    // Simulators are polled every quarter second.
+    m_handsets.AddHandset(u"sim"_s, QString(), u"win32"_s);
+    m_harness.SetTarget(u"sim"_s);
+    QSharedPointer<RecordingModule> simulated = Queue(u"M"_s, u"ctf"_s);
+    simulated->pollsNeeded = 2;
+    EXPECT_TRUE(m_harness.Run());
+    ASSERT_EQ(simulated->pollTimes.size(), 2);
+    EXPECT_GE(simulated->pollTimes[1] - simulated->pollTimes[0], 250);
+    EXPECT_LT(simulated->pollTimes[1] - simulated->pollTimes[0], 500);
 }
 
 TEST_F(RunLoopTest, AModulePastTheTimeLimitIsRemovedUncopiedAndTheObserverSeesItsWait)
 {
-    QSharedPointer<RecordingModule> stuck = Queue(QStringLiteral("Stuck"), QStringLiteral("ctf"));
+    QSharedPointer<RecordingModule> stuck = Queue(u"Stuck"_s, u"ctf"_s);
     stuck->pollsNeeded = 1000000;
-    QSharedPointer<RecordingModule> next = Queue(QStringLiteral("Zeta"), QStringLiteral("ctf"));
-    struct Watcher : RunObserver
-    {
-        void ModuleStarted(const ModuleRecord &record) override
-        {
-            events.append(QStringLiteral("start ") + record.name);
-        }
-        void ModuleWaiting(const ModuleRecord &record, const QString &what, qint64 elapsedMs) override
-        {
-            EXPECT_GE(elapsedMs, lastElapsed);
-            lastElapsed = elapsedMs;
-            waits.insert(record.name + QLatin1Char(' ') + what);
-        }
-        void ModuleEnded(const ModuleRecord &record) override
-        {
-            events.append(QStringLiteral("end ") + record.name);
-            ended.insert(record.name, record);
-            lastElapsed = 0;
-        }
-        QStringList events;
-        QSet<QString> waits;
-        qint64 lastElapsed = 0;
-        QMap<QString, ModuleRecord> ended;
-    } watcher;
-    m_harness.SetRunObserver(&watcher);
+    Queue(u"Zeta"_s, u"ctf"_s);
     m_harness.SetModuleTimeLimit(5000);
     EXPECT_TRUE(m_harness.Run());
-    m_harness.SetRunObserver(nullptr);
-
-    EXPECT_EQ(watcher.events,
-              (QStringList{QStringLiteral("start Stuck"), QStringLiteral("end Stuck"), QStringLiteral("start Zeta"),
-                           QStringLiteral("end Zeta")}));
-    EXPECT_TRUE(watcher.waits.contains(QStringLiteral("Stuck its log")));
-    const ModuleRecord timedOut = watcher.ended.value(QStringLiteral("Stuck"));
+    EXPECT_EQ(m_watcher.events, (QStringList{u"start Stuck"_s, u"end Stuck"_s, u"start Zeta"_s, u"end Zeta"_s}));
+    EXPECT_TRUE(m_watcher.waits.contains(u"Stuck its log"_s));
+    const ModuleRecord timedOut = m_watcher.ended.value(u"Stuck"_s);
     EXPECT_EQ(timedOut.outcome, ModuleSource::TimedOut);
     EXPECT_GT(timedOut.durationMs, 5000);
     EXPECT_LT(timedOut.durationMs, 6500);
-    EXPECT_EQ(timedOut.Reason(), QStringLiteral("stopped after its time limit of 5 s"));
+    EXPECT_EQ(timedOut.Reason(), u"stopped after its time limit of 5 s"_s);
     EXPECT_LT(stuck->pollTimes.size(), 10);
-    EXPECT_TRUE(m_events.contains(QStringLiteral("remove Stuck")));
-    EXPECT_FALSE(m_events.contains(QStringLiteral("copy Stuck")));
-    EXPECT_EQ(watcher.ended.value(QStringLiteral("Zeta")).outcome, ModuleSource::Recorded);
-}
-
-TEST_F(RunLoopTest, SimulatorHandsetsArePolledEveryQuarterSecond)
-{
-    m_handsets.AddHandset(u"sim"_s, QString(), u"win32"_s);
-    m_harness.SetTarget(u"sim"_s);
-    QSharedPointer<RecordingModule> module = Queue(u"M"_s, u"ctf"_s);
-    module->pollsNeeded = 2;
-
-    EXPECT_TRUE(m_harness.Run());
-    ASSERT_EQ(module->pollTimes.size(), 2);
-    EXPECT_GE(module->pollTimes[1] - module->pollTimes[0], 250);
-    EXPECT_LT(module->pollTimes[1] - module->pollTimes[0], 500);
+    EXPECT_TRUE(m_events.contains(u"remove Stuck"_s));
+    EXPECT_FALSE(m_events.contains(u"copy Stuck"_s));
+    EXPECT_EQ(m_watcher.ended.value(u"Zeta"_s).outcome, ModuleSource::Recorded);
 }
 
 TEST_F(RunLoopTest, LostHandsetEndsTheRunWithoutUnloading)
@@ -350,16 +340,7 @@ TEST_F(RunLoopTest, LostHandsetEndsTheRunWithoutUnloading)
     EXPECT_TRUE(m_log.Text().endsWith(u"Device Connection has died."_s));
 }
 
-TEST_F(RunLoopTest, RunFailsWithoutAHandset)
-{
-    Queue(u"A"_s, u"ctf"_s);
-    m_harness.SetTarget(u"nothing-like-this"_s);
-    EXPECT_FALSE(m_harness.Run());
-    EXPECT_TRUE(m_events.isEmpty());
-    EXPECT_TRUE(m_log.Text().contains(u"Target nothing-like-this not found."_s));
-}
-
-TEST_F(RunLoopTest, FrameworkLookupIgnoresCaseButLoadByNameDoesNot)
+TEST_F(RunLoopTest, FrameworksAreFoundInAnyCaseButLoadedByTheirExactName)
 {
     QSharedPointer<RecordingFramework> upper(new RecordingFramework(u"CTFX"_s, &m_events));
     m_kit->frameworks.insert(upper->name, upper);
@@ -368,26 +349,18 @@ TEST_F(RunLoopTest, FrameworkLookupIgnoresCaseButLoadByNameDoesNot)
     EXPECT_FALSE(m_harness.Load(u"ctfx"_s));
     EXPECT_TRUE(m_events.isEmpty());
     EXPECT_TRUE(m_harness.Load(u"CTFX"_s));
-    EXPECT_EQ(m_events, QStringList{u"load CTFX"_s});
-
     QList<QSharedPointer<_Framework>> frameworks{upper};
     EXPECT_EQ(m_harness.ListFrameworks(frameworks), 3u);
     EXPECT_EQ(frameworks.first()->name, u"CTFX"_s);
-}
 
-TEST_F(RunLoopTest, FailedLoadNamesTheHandsetKind)
-{
+    m_kit->frameworks.remove(upper->name);
+    EXPECT_TRUE(m_harness.Unload());
+    EXPECT_EQ(m_events, (QStringList{"load CTFX", "unload ctf", "unload oat"}));
+    EXPECT_FALSE(m_harness.Unload(QSharedPointer<_Framework>()));
+    EXPECT_FALSE(m_harness.Load(QSharedPointer<_Framework>()));
     m_ctf->loads = false;
     EXPECT_FALSE(m_harness.Load(m_ctf));
     EXPECT_TRUE(m_log.Text().contains(u"Load Error: Kestix framework package for arm not found.\n"_s));
-    EXPECT_FALSE(m_harness.Load(QSharedPointer<_Framework>()));
-}
-
-TEST_F(RunLoopTest, UnloadAllTakesEveryKitFramework)
-{
-    EXPECT_TRUE(m_harness.Unload());
-    EXPECT_EQ(m_events, (QStringList{"unload ctf", "unload oat"}));
-    EXPECT_FALSE(m_harness.Unload(QSharedPointer<_Framework>()));
 }
 
 TEST_F(RunLoopTest, SecondaryModulesComeFromBothCataloguesBeforeTheModuleStarts)
@@ -417,35 +390,21 @@ TEST_F(RunLoopTest, RunByNameTakesTheKitModule)
     EXPECT_EQ(m_events, QStringList{u"run Named"_s});
 }
 
-} // namespace
-
-namespace {
-
-class ListingModule : public ScriptedModule
+TEST_F(RunLoopTest, LogFilePathsComeFromTheModuleAndNothingRunsOrLoadsWithoutAHandset)
 {
-public:
-    ListingModule() : ScriptedModule(u"Lister"_s) { }
-    bool GetLogFilePaths(IKestoDevice *device, QStringList &paths) override
-    {
-        if (!device)
-            return false;
-        paths << u"fs:/a.log"_s << u"fs:/b.log"_s;
-        return true;
-    }
-};
-
-TEST_F(RunLoopTest, LogFilePathsComeFromTheModuleOnceConnected)
-{
-    QSharedPointer<_TestModule> module(new ListingModule);
+    QSharedPointer<RecordingModule> module = Queue(u"A"_s, u"ctf"_s);
     QStringList paths{u"stale"_s};
     EXPECT_EQ(m_harness.GetLogFilePaths(module, paths), 2u);
     EXPECT_EQ(paths, (QStringList{u"fs:/a.log"_s, u"fs:/b.log"_s}));
 
-    m_harness.SetTarget(u"absent"_s);
+    m_harness.SetTarget(u"nothing-like-this"_s);
     EXPECT_EQ(m_harness.GetLogFilePaths(module, paths), 0u);
     EXPECT_TRUE(paths.isEmpty());
+    EXPECT_FALSE(m_harness.Run());
+    EXPECT_TRUE(m_log.Text().contains(u"Target nothing-like-this not found."_s));
     EXPECT_FALSE(m_harness.Unload(m_ctf));
     EXPECT_FALSE(m_harness.Load(m_ctf));
+    EXPECT_TRUE(m_events.isEmpty());
     EXPECT_TRUE(m_log.Text().contains(u"Load Error: A device is not available.\n"_s));
 }
 
