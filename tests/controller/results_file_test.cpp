@@ -7,38 +7,30 @@
 
 namespace {
 
-// ---- Result precedence ----
-
-struct PrecedenceCase
+TEST(ResultPrecedence, KeepsTheStrongerVerdict)
 {
-    const char *stored;
-    const char *reported;
-    const char *kept;
-};
-
-class ResultPrecedence : public ::testing::TestWithParam<PrecedenceCase>
-{
-};
-
-TEST_P(ResultPrecedence, KeepsTheStrongerVerdict)
-{
-    const PrecedenceCase &c = GetParam();
-    EXPECT_EQ(ProcessedResults::Precedence(QString::fromLatin1(c.stored), QString::fromLatin1(c.reported)),
-              QString::fromLatin1(c.kept))
-        << c.stored << " then " << c.reported;
+    const char *rows[][3] = {
+        // stored, reported, kept
+        {"", "fail", "fail"},
+        {"", "unexecuted", "unexecuted"},
+        {"pass", "fail", "pass"},
+        {"pass", "unsupported", "pass"},
+        {"fail", "pass", "pass"},
+        {"unexecuted", "pass", "pass"},
+        {"fail", "unsupported", "unsupported"},
+        {"fail", "unexecuted", "fail"},
+        {"fail", "crashed", "fail"},
+        {"unexecuted", "fail", "fail"},
+        {"unsupported", "fail", "fail"},
+        {"unsupported", "unexecuted", "unsupported"},
+        {"unexecuted", "unexecuted", "unexecuted"},
+        {"crashed", "timeout", "timeout"},
+    };
+    for (const auto &row : rows)
+        EXPECT_EQ(ProcessedResults::Precedence(QString::fromLatin1(row[0]), QString::fromLatin1(row[1])),
+                  QLatin1String(row[2]))
+            << row[0] << " then " << row[1];
 }
-
-INSTANTIATE_TEST_SUITE_P(
-    Verdicts, ResultPrecedence,
-    ::testing::Values(PrecedenceCase{"", "fail", "fail"}, PrecedenceCase{"", "unexecuted", "unexecuted"},
-                      PrecedenceCase{"pass", "fail", "pass"}, PrecedenceCase{"pass", "unsupported", "pass"},
-                      PrecedenceCase{"fail", "pass", "pass"}, PrecedenceCase{"unexecuted", "pass", "pass"},
-                      PrecedenceCase{"fail", "unsupported", "unsupported"},
-                      PrecedenceCase{"fail", "unexecuted", "fail"}, PrecedenceCase{"fail", "crashed", "fail"},
-                      PrecedenceCase{"unexecuted", "fail", "fail"}, PrecedenceCase{"unsupported", "fail", "fail"},
-                      PrecedenceCase{"unsupported", "unexecuted", "unsupported"},
-                      PrecedenceCase{"unexecuted", "unexecuted", "unexecuted"},
-                      PrecedenceCase{"crashed", "timeout", "timeout"}));
 
 // ---- The results file through the Harness ----
 
@@ -69,18 +61,15 @@ protected:
         HarnessTestAccess::SetCatalogues(m_harness, m_kit, m_platform);
     }
 
-    // A run module whose log reports verdicts of the named module.
-    QSharedPointer<ScriptedModule> Logged(const QString &name, const QList<TestCaseResult> &verdicts,
-                                          const QString &hash = QString())
+    // Records a run module whose log reports verdicts of the named module, or cannot be parsed.
+    QSharedPointer<ScriptedModule> Record(const QString &name, const QList<TestCaseResult> &verdicts,
+                                          const QString &hash = QString(), bool parses = true)
     {
         QSharedPointer<ScriptedModule> module(new ScriptedModule(name));
         module->Report(name, verdicts, hash);
+        module->parses = parses;
+        HarnessTestAccess::Update(m_harness, module);
         return module;
-    }
-
-    void Record(const QString &name, const QList<TestCaseResult> &verdicts)
-    {
-        HarnessTestAccess::Update(m_harness, Logged(name, verdicts));
     }
 
     QString ResultsPath() const
@@ -129,7 +118,7 @@ TEST_F(ResultsFileTest, FirstUpdateWritesTheSkeletonOfBothCataloguesBelowTheLogF
 TEST_F(ResultsFileTest, LogIdHashFindsTheModuleWhateverItsName)
 {
     // The log's hash names Video although the log states Audio.
-    HarnessTestAccess::Update(m_harness, Logged(u"Audio"_s, {{u"x"_s, u"pass"_s}}, u"#12"_s));
+    Record(u"Audio"_s, {{u"x"_s, u"pass"_s}}, u"#12"_s);
     const ResultsView view = ReadResults(ResultsPath());
     EXPECT_EQ(view.verdicts.value(u"Video/x"_s), u"pass"_s);
     EXPECT_FALSE(view.verdicts.contains(u"Audio/x"_s));
@@ -145,8 +134,7 @@ TEST_F(ResultsFileTest, ModuleMissingFromTheFileIsAddedWithTheCatalogueFamily)
     root.removeChild(root.firstChildElement(u"module"_s));
     WriteFile(ResultsPath(), document.toByteArray(1));
 
-    QSharedPointer<ScriptedModule> run = Logged(u"AUDIO"_s, {{u"z"_s, u"fail"_s}});
-    HarnessTestAccess::Update(m_harness, run);
+    QSharedPointer<ScriptedModule> run = Record(u"AUDIO"_s, {{u"z"_s, u"fail"_s}});
     const ResultsView view = ReadResults(ResultsPath());
     const QDomElement added = view.modules.value(u"AUDIO"_s);
     ASSERT_FALSE(added.isNull());
@@ -175,10 +163,7 @@ TEST_F(ResultsFileTest, UnparsedLogLeavesTheFileUntouched)
     const QByteArray before = ReadFile(ResultsPath());
     UseCatalogues(u"another-kit"_s);
 
-    QSharedPointer<ScriptedModule> run = Logged(u"Audio"_s, {});
-    run->parses = false;
-    HarnessTestAccess::Update(m_harness, run);
-    EXPECT_EQ(run->parseCalls, 1);
+    EXPECT_EQ(Record(u"Audio"_s, {}, QString(), false)->parseCalls, 1);
     EXPECT_EQ(ReadFile(ResultsPath()), before);
 }
 
@@ -194,15 +179,6 @@ TEST_F(ResultsFileTest, NewKitRebuildsTheSkeletonWithEveryCaseUnexecuted)
     EXPECT_EQ(view.verdicts.value(u"Video/x"_s), u"fail"_s);
     // A rebuilt skeleton is not a damaged file: nothing is kept aside.
     EXPECT_EQ(QDir(QFileInfo(ResultsPath()).path()).entryList(QDir::Files), QStringList{u"ProcessedResults.xml"_s});
-}
-
-TEST_F(ResultsFileTest, GivenResultsPathIsUsedAndItsFolderCreated)
-{
-    const QString path = m_dir.filePath(u"elsewhere/deep/results.xml"_s);
-    Env()[u"ProcessedResultsPath"_s] = path;
-    Record(u"Video"_s, {{u"x"_s, u"pass"_s}});
-    EXPECT_EQ(ReadResults(path).verdicts.value(u"Video/x"_s), u"pass"_s);
-    EXPECT_FALSE(QFileInfo::exists(m_dir.filePath(u"logs/processedResults"_s)));
 }
 
 TEST_F(ResultsFileTest, DamagedOrForeignFileIsKeptAsideAndReplacedByACompleteOne)
@@ -230,15 +206,21 @@ TEST_F(ResultsFileTest, DamagedOrForeignFileIsKeptAsideAndReplacedByACompleteOne
     }
 }
 
-TEST_F(ResultsFileTest, UnwritableResultsFileIsReported)
+TEST_F(ResultsFileTest, GivenResultsPathIsUsedAndItsFolderCreatedOrItsFailureReported)
 {
-    // The results path names a folder, which no file can replace.
-    const QString path = m_dir.filePath(u"taken"_s);
-    QDir().mkpath(path + u"/inside"_s);
+    const QString path = m_dir.filePath(u"elsewhere/deep/results.xml"_s);
     Env()[u"ProcessedResultsPath"_s] = path;
     Record(u"Video"_s, {{u"x"_s, u"pass"_s}});
+    EXPECT_EQ(ReadResults(path).verdicts.value(u"Video/x"_s), u"pass"_s);
+    EXPECT_FALSE(QFileInfo::exists(m_dir.filePath(u"logs/processedResults"_s)));
+
+    // A results path naming a folder, which no file can replace.
+    const QString taken = m_dir.filePath(u"taken"_s);
+    QDir().mkpath(taken + u"/inside"_s);
+    Env()[u"ProcessedResultsPath"_s] = taken;
+    Record(u"Video"_s, {{u"x"_s, u"pass"_s}});
     EXPECT_TRUE(m_log.Text().contains(u"could not"_s));
-    EXPECT_TRUE(QFileInfo(path + u"/inside"_s).isDir());
+    EXPECT_TRUE(QFileInfo(taken + u"/inside"_s).isDir());
 }
 
 // ---- The document on its own ----
@@ -260,41 +242,29 @@ protected:
     const QString path = dir.filePath(u"r.xml"_s);
 };
 
-TEST_F(ProcessedResultsDocument, SameDocumentGivesTheSameBytes)
+TEST_F(ProcessedResultsDocument, SameDocumentGivesTheSameBytesAndWithoutACatalogueVerdictsAccumulate)
 {
     EXPECT_TRUE(RecordOne(path, u"t"_s, u"f"_s));
     EXPECT_TRUE(RecordOne(path + u".2"_s, u"t"_s, u"f"_s));
     EXPECT_EQ(ReadFile(path), ReadFile(path + u".2"_s));
     EXPECT_FALSE(ReadFile(path).startsWith("<?xml"));
-}
-
-TEST_F(ProcessedResultsDocument, WithoutAKitCatalogueVerdictsAccumulate)
-{
-    ASSERT_TRUE(RecordOne(path, u"one"_s));
     ASSERT_TRUE(RecordOne(path, u"two"_s));
-    EXPECT_EQ(ReadResults(path).caseOrder.value(u"M"_s), (QStringList{u"one"_s, u"two"_s}));
+    EXPECT_EQ(ReadResults(path).caseOrder.value(u"M"_s), (QStringList{u"t"_s, u"two"_s}));
 }
 
 TEST_F(ProcessedResultsDocument, WhatTheFileHoldsBesideVerdictsIsKept)
 {
     // Notes a user added by hand, in any form XML has, survive the rewrite.
-    WriteFile(path,
-              "<testmodules kvkHash=\"\" platformHash=\"\">\n"
-              " <!-- checked by hand -->\n"
-              " <module id_hash=\"#1\" name=\"M\" note=\"caf\xC3\xA9 &amp; more\">\n"
-              "  <?review done?>\n"
-              "  <testcase name=\"t\" result=\"fail\"><![CDATA[<see bug 12>]]></testcase>\n"
-              " </module>\n"
-              "</testmodules>\n");
+    const QByteArray file = "<testmodules kvkHash=\"\" platformHash=\"\">\n"
+                            " <!-- checked by hand -->\n"
+                            " <module id_hash=\"#1\" name=\"M\" note=\"caf\xC3\xA9 &amp; more\">\n"
+                            "  <?review done?>\n"
+                            "  <testcase name=\"t\" result=\"fail\"><![CDATA[<see bug 12>]]></testcase>\n"
+                            " </module>\n"
+                            "</testmodules>\n";
+    WriteFile(path, file);
     ASSERT_TRUE(RecordOne(path, u"t"_s));
-    EXPECT_EQ(ReadFile(path),
-              QByteArray("<testmodules kvkHash=\"\" platformHash=\"\">\n"
-                         " <!-- checked by hand -->\n"
-                         " <module id_hash=\"#1\" name=\"M\" note=\"caf\xC3\xA9 &amp; more\">\n"
-                         "  <?review done?>\n"
-                         "  <testcase name=\"t\" result=\"pass\"><![CDATA[<see bug 12>]]></testcase>\n"
-                         " </module>\n"
-                         "</testmodules>\n"));
+    EXPECT_EQ(ReadFile(path), QByteArray(file).replace("result=\"fail\"", "result=\"pass\""));
 }
 
 TEST_F(ProcessedResultsDocument, FileNestedBeyondAnyResultsFileIsKeptAside)
