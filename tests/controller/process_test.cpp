@@ -145,7 +145,7 @@ TEST_F(ProcessTest, DamagedResultsFileIsKeptAsideOnce)
     EXPECT_EQ(ReadResults(folder.filePath(u"ProcessedResults.xml"_s)).verdicts.value(u"Audio/a"_s), u"pass"_s);
 }
 
-TEST_F(ProcessTest, SetupFailureRecordsNothing)
+TEST_F(ProcessTest, SetupFailureOrNoLogFolderRecordsNothing)
 {
     CapturedLog log;
     Harness harness;
@@ -155,16 +155,11 @@ TEST_F(ProcessTest, SetupFailureRecordsNothing)
     EXPECT_FALSE(harness.Process(0));
     EXPECT_TRUE(log.Text().endsWith(u"Harness::Process Setup failed."_s));
     EXPECT_FALSE(QFileInfo::exists(LogFolder() + u"/ProcessedResults/ProcessedResults.xml"_s));
-}
 
-TEST_F(ProcessTest, WithoutALogFolderNothingIsCreated)
-{
-    CapturedLog log;
-    Harness harness;
-    harness.SetLogger(log.log());
-    HarnessTestAccess::SetCatalogues(harness, m_kit, m_platform);
-    EXPECT_FALSE(harness.Process(0));
-    EXPECT_FALSE(HarnessTestAccess::Environment(harness).contains(u"ProcessedResultsPath"_s));
+    Harness unplaced;
+    HarnessTestAccess::SetCatalogues(unplaced, m_kit, m_platform);
+    EXPECT_FALSE(unplaced.Process(0));
+    EXPECT_FALSE(HarnessTestAccess::Environment(unplaced).contains(u"ProcessedResultsPath"_s));
 }
 
 TEST_F(ProcessTest, LinkBackUpTheTreeIsNotFollowed)

@@ -166,6 +166,11 @@ protected:
     }
 
     QString KitPath() const { return m_run.Path(u"kit"_s); }
+    void ChooseBoth(Harness &harness) const
+    {
+        harness.SetTestkit(KitPath());
+        harness.SetPlatform(PlatformSetting());
+    }
     QString PlatformSetting() const { return m_run.Path(u"platform"_s); }
     QString PlatformPath() const { return m_run.Path(u"platform/pvs/platform"_s); }
 
@@ -182,8 +187,7 @@ TEST_F(CatalogueSetupTest, StaleKitCacheIsRegeneratedAndTheDefaultDevicePackTake
         Manifest old(KitPath(), false);
         WriteFile(old.ManifestFilePath(), "<testkit version=\"4\"><testmodules/></testkit>");
     }
-    m_harness.SetTestkit(KitPath());
-    m_harness.SetPlatform(PlatformSetting());
+    ChooseBoth(m_harness);
     Modules modules;
     EXPECT_EQ(m_harness.GetTestModules(modules, QStringList(), QString(), QString()), 2u);
     EXPECT_EQ(Names(modules), (QStringList{u"Audio"_s, u"Shell"_s}));
@@ -202,8 +206,7 @@ TEST_F(CatalogueSetupTest, StaleKitCacheIsRegeneratedAndTheDefaultDevicePackTake
     CapturedLog second;
     Harness again;
     again.SetLogger(second.log());
-    again.SetTestkit(KitPath());
-    again.SetPlatform(PlatformSetting());
+    ChooseBoth(again);
     Modules more;
     EXPECT_EQ(again.GetTestModules(more, QStringList{u"audio"_s}, QString(), QString()), 1u);
     EXPECT_FALSE(second.Text().contains(u"Generating manifest"_s));
@@ -214,8 +217,7 @@ TEST_F(CatalogueSetupTest, DevicePackGivenBeforehandIsKept)
     const QString pack = m_run.Path(u"mine.dso"_s);
     WriteFile(pack, "<dso/>");
     m_harness.SetDPK(pack);
-    m_harness.SetTestkit(KitPath());
-    m_harness.SetPlatform(PlatformSetting());
+    ChooseBoth(m_harness);
     Modules modules;
     m_harness.GetTestModules(modules, QStringList(), QString(), QString());
     EXPECT_FALSE(m_log.Text().contains(u"Using the default device pack."_s));
@@ -224,8 +226,7 @@ TEST_F(CatalogueSetupTest, DevicePackGivenBeforehandIsKept)
 
 TEST_F(CatalogueSetupTest, GenerateManifestWritesEachCatalogueToItsCache)
 {
-    m_harness.SetTestkit(KitPath());
-    m_harness.SetPlatform(PlatformSetting());
+    ChooseBoth(m_harness);
     EXPECT_TRUE(m_harness.GenerateManifest(QString()));
     Manifest kit(KitPath(), false);
     Manifest platform(PlatformPath(), true);
@@ -248,15 +249,14 @@ TEST_F(CatalogueSetupTest, GenerateManifestToARelativePathCreatesItsFolder)
     EXPECT_EQ(document.documentElement().tagName(), u"testkit"_s);
 }
 
-TEST_F(CatalogueSetupTest, GenerateManifestFallsBackToTheHomeFolder)
+TEST_F(CatalogueSetupTest, GenerateManifestFallsBackToTheHomeFolderOrFails)
 {
     const QString home = m_run.Path(u"home"_s);
     QDir().mkpath(home);
     EnvGuard homeGuard("HOME", home);
     // A regular file stands where the output folder should be.
     WriteFile(m_run.Path(u"blocked"_s), "x");
-    m_harness.SetTestkit(KitPath());
-    m_harness.SetPlatform(PlatformSetting());
+    ChooseBoth(m_harness);
     EXPECT_TRUE(m_harness.GenerateManifest(m_run.Path(u"blocked/kits.xml"_s)));
 
     const QString fallback = QDir::cleanPath(home + u"/kits.xml"_s);
@@ -266,13 +266,8 @@ TEST_F(CatalogueSetupTest, GenerateManifestFallsBackToTheHomeFolder)
     QDomDocument document;
     ASSERT_TRUE(document.setContent(ReadFile(fallback)));
     EXPECT_EQ(document.documentElement().attribute(u"path"_s), platform.kitPath);
-}
 
-TEST_F(CatalogueSetupTest, GenerateManifestWithoutAnyWritableFileFails)
-{
-    WriteFile(m_run.Path(u"blocked"_s), "x");
-    EnvGuard homeGuard("HOME", m_run.Path(u"blocked/home"_s));
-    m_harness.SetTestkit(KitPath());
+    homeGuard.Set("HOME", m_run.Path(u"blocked/home"_s));
     EXPECT_FALSE(m_harness.GenerateManifest(m_run.Path(u"blocked/kits.xml"_s)));
     EXPECT_TRUE(m_log.Text().contains(u"Manifest can't be opened for writing."_s));
 }
