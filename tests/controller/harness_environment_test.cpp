@@ -209,72 +209,61 @@ protected:
     EnvGuard m_vars;
 };
 
-TEST_F(HarnessSetupTest, WithNothingChosenTheDefaultKitAndPlatformAreUsed)
+TEST_F(HarnessSetupTest, KitAndPlatformAreTheDefaultsTheFirstListedEntryNamedOrAPath)
 {
-    ASSERT_TRUE(RunSetup());
-    EXPECT_EQ(m_harness.GetTestkit(), Kit("KitTwo"));
-    EXPECT_EQ(m_harness.GetPlatform(), PlatformDir("Beta Pro"));
-    EXPECT_FALSE(HarnessTestAccess::KitNotSelected(m_harness));
-    EXPECT_EQ(EnvOf(m_harness).value(u"PerlCache"_s), TestDirectories::GetOatPerlScripts());
-    EXPECT_EQ(m_log.Text(), u"KVK: %1Platform: %2"_s.arg(Kit("KitTwo"), PlatformDir("Beta Pro")));
+    CurrentDirectory cwd(m_root.path());
+    // "Gamma" is not a professional platform, so "a" cannot choose it.
+    const struct
+    {
+        const char *kit, *platform, *expectedKit, *expectedPlatform;
+        bool kitNotSelected;
+    } rows[] = {
+        {"", "", "kits/KitTwo", "platforms/Beta Pro/pvs/platform", false},
+        {"", "ALPHA", "kits/KitTwo", "platforms/Alpha Pro/pvs/platform", true},
+        {"Kit", "a", "kits/KitOne", "platforms/Alpha Pro/pvs/platform", false},
+        {"elsewhere/kit", "sdk/../sdk/p", "elsewhere/kit", "sdk/p/pvs/platform", false},
+    };
+    for (const auto &row : rows) {
+        SCOPED_TRACE(row.kit + std::string(" ") + row.platform);
+        CapturedLog log;
+        Harness harness;
+        harness.SetLogger(log.log());
+        harness.SetTestkit(QString::fromLatin1(row.kit));
+        harness.SetPlatform(QString::fromLatin1(row.platform));
+        ASSERT_TRUE(HarnessTestAccess::SetupEnvironment(harness));
+        EXPECT_EQ(harness.GetTestkit(), RootPath(QString::fromLatin1(row.expectedKit)));
+        EXPECT_EQ(harness.GetPlatform(), RootPath(QString::fromLatin1(row.expectedPlatform)));
+        EXPECT_EQ(HarnessTestAccess::KitNotSelected(harness), row.kitNotSelected);
+        EXPECT_EQ(EnvOf(harness).value(u"PerlCache"_s), TestDirectories::GetOatPerlScripts());
+        EXPECT_EQ(log.Text(), u"KVK: %1Platform: %2"_s.arg(harness.GetTestkit(), harness.GetPlatform()));
+    }
 }
 
-TEST_F(HarnessSetupTest, OnlyAPlatformLoadsTheDefaultKitAsNotSelected)
+TEST_F(HarnessSetupTest, SettingUpAgainKeepsTheRunAndTheUnselectedKitUntilTheHostChoosesAKit)
 {
     m_harness.SetPlatform(u"ALPHA"_s);
     ASSERT_TRUE(RunSetup());
-    EXPECT_EQ(m_harness.GetTestkit(), Kit("KitTwo"));
-    EXPECT_EQ(m_harness.GetPlatform(), PlatformDir("Alpha Pro"));
-    EXPECT_TRUE(HarnessTestAccess::KitNotSelected(m_harness));
+    const QString runId = EnvOf(m_harness).value(u"TestRunID"_s);
+    EXPECT_FALSE(QUuid::fromString(runId).isNull());
+    EXPECT_TRUE(runId.startsWith(u'{') && runId.endsWith(u'}'));
+    ASSERT_TRUE(RunSetup());
+    EXPECT_EQ(EnvOf(m_harness).value(u"TestRunID"_s), runId);
 
-    // Setting up again after an unrelated change neither selects the kit nor
-    // nests the platform folder a second time.
+    // A new family draws a new run identifier, but neither selects the kit
+    // nor nests the platform folder a second time.
     m_harness.SetFamily(u"family"_s, QString());
     ASSERT_FALSE(HarnessTestAccess::EnvironmentReady(m_harness));
     ASSERT_TRUE(RunSetup());
     EXPECT_TRUE(HarnessTestAccess::KitNotSelected(m_harness));
     EXPECT_EQ(m_harness.GetPlatform(), PlatformDir("Alpha Pro"));
+    const QString familyRunId = EnvOf(m_harness).value(u"TestRunID"_s);
+    EXPECT_NE(familyRunId, runId);
 
-    // A kit chosen by the host is selected.
     m_harness.SetTestkit(u"other"_s);
     ASSERT_TRUE(RunSetup());
     EXPECT_EQ(m_harness.GetTestkit(), Kit("Other"));
     EXPECT_FALSE(HarnessTestAccess::KitNotSelected(m_harness));
-}
-
-TEST_F(HarnessSetupTest, KitAndPlatformNamesMatchTheFirstListedEntry)
-{
-    m_harness.SetTestkit(u"Kit"_s);
-    // "Gamma" is not a professional platform, so it cannot be chosen.
-    m_harness.SetPlatform(u"a"_s);
-    ASSERT_TRUE(RunSetup());
-    EXPECT_EQ(m_harness.GetTestkit(), Kit("KitOne"));
-    EXPECT_EQ(m_harness.GetPlatform(), PlatformDir("Alpha Pro"));
-}
-
-TEST_F(HarnessSetupTest, PathsThatMatchNoNameAreMadeAbsolute)
-{
-    CurrentDirectory cwd(m_root.path());
-    m_harness.SetTestkit(u"elsewhere/kit"_s);
-    m_harness.SetPlatform(u"sdk/../sdk/p"_s);
-    ASSERT_TRUE(RunSetup());
-    EXPECT_EQ(m_harness.GetTestkit(), RootPath(u"elsewhere/kit"_s));
-    EXPECT_EQ(m_harness.GetPlatform(), RootPath(u"sdk/p/pvs/platform"_s));
-}
-
-TEST_F(HarnessSetupTest, TheRunIdentifierLastsUntilTheKitChanges)
-{
-    ASSERT_TRUE(RunSetup());
-    const QString runId = EnvOf(m_harness).value(u"TestRunID"_s);
-    EXPECT_FALSE(QUuid::fromString(runId).isNull());
-    EXPECT_TRUE(runId.startsWith(u'{') && runId.endsWith(u'}'));
-
-    ASSERT_TRUE(RunSetup());
-    EXPECT_EQ(EnvOf(m_harness).value(u"TestRunID"_s), runId);
-
-    m_harness.SetTestkit(u"KitOne"_s);
-    ASSERT_TRUE(RunSetup());
-    EXPECT_NE(EnvOf(m_harness).value(u"TestRunID"_s), runId);
+    EXPECT_NE(EnvOf(m_harness).value(u"TestRunID"_s), familyRunId);
 }
 
 TEST_F(HarnessSetupTest, WithoutAnyKitSetupFails)
