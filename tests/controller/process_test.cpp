@@ -46,7 +46,9 @@ protected:
         Log(u"a-run/menu-2026-12-05.txt"_s, UtLog("Menu", {{"m2", "PASS"}}));
         Log(u"oatRawLogs/trap-ctf-1.log"_s, CtfLog("Audio", {{"trap", "Pass"}}));
         Log(u"ProcessedResults/trap-ctf-2.log"_s, CtfLog("Audio", {{"trap", "Pass"}}));
-        Prepare(m_harness, m_log);
+        m_harness.SetLogger(m_log.log());
+        m_harness.SetLogOutputPath(LogFolder());
+        HarnessTestAccess::SetCatalogues(m_harness, m_kit, m_platform);
     }
 
     void Log(const QString &relative, const QByteArray &content)
@@ -55,17 +57,9 @@ protected:
     }
     QString LogFolder() const { return m_dir.filePath(u"logs"_s); }
 
-    void Prepare(Harness &harness, CapturedLog &log)
-    {
-        harness.SetLogger(log.log());
-        harness.SetLogOutputPath(LogFolder());
-        HarnessTestAccess::SetCatalogues(harness, m_kit, m_platform);
-    }
-
     QTemporaryDir m_dir;
     QSharedPointer<Manifest> m_kit;
     QSharedPointer<Manifest> m_platform;
-    // Set up for the saved tree.
     CapturedLog m_log;
     Harness m_harness;
 };
@@ -111,29 +105,6 @@ TEST_F(ProcessTest, WholeTreeFeedsOneResultsFileWithIndentedMessages)
     // Nothing else was written into the tree.
     EXPECT_EQ(QDir(LogFolder() + u"/ProcessedResults"_s).entryList(QDir::Files),
               (QStringList{u"ProcessedResults.xml"_s, u"trap-ctf-2.log"_s}));
-}
-
-TEST_F(ProcessTest, GivesTheSameFileAsRecordingTheLogsOneByOne)
-{
-    ASSERT_TRUE(m_harness.Process(0));
-    const QByteArray processed = ReadFile(LogFolder() + u"/ProcessedResults/ProcessedResults.xml"_s);
-
-    CapturedLog singleLog;
-    Harness single;
-    Prepare(single, singleLog);
-    const QString separate = m_dir.filePath(u"separate.xml"_s);
-    HarnessTestAccess::Environment(single).insert(u"ProcessedResultsPath"_s, separate);
-    for (const char *relative : {"audio-ctf-2026-12-03.log", "menu-2026-12-03.txt", "a-run/menu-2026-12-05.txt",
-                                 "b-run/audio-ctf-2026-12-04.log", "b-run/deeper/ghost-ctf-1.log"}) {
-        const QString path = LogFolder() + u'/' + QString::fromLatin1(relative);
-        QSharedPointer<_TestModule> module = Manifest::CreateTestModuleFromLog(path);
-        ASSERT_TRUE(module);
-        module->AddDesktopLogFile(path);
-        HarnessTestAccess::Update(single, module);
-        // Every step left a complete file behind.
-        EXPECT_TRUE(ReadResults(separate).ok);
-    }
-    EXPECT_EQ(ReadFile(separate), processed);
 }
 
 TEST_F(ProcessTest, DamagedResultsFileIsKeptAsideOnce)

@@ -141,16 +141,6 @@ protected:
         m_harness.DisconnectTarget();
     }
 
-    // The handset goes offline while module's log is polled.
-    void LoseHandsetWhilePolling(RecordingModule &module)
-    {
-        module.pollsNeeded = 5;
-        module.onPoll = [this](IKestoDevice *device) {
-            WriteFile(m_handsets.HandsetFolder(u"phone"_s) + u"/offline"_s, QByteArray());
-            device->FileExists(u"fs:/anything"_s);
-        };
-    }
-
     // A module queued for the run and known to the kit catalogue.
     QSharedPointer<RecordingModule> Queue(const QString &name, const QString &type)
     {
@@ -329,17 +319,6 @@ TEST_F(RunLoopTest, AModulePastTheTimeLimitIsRemovedUncopiedAndTheObserverSeesIt
     EXPECT_EQ(m_watcher.ended.value(u"Zeta"_s).outcome, ModuleSource::Recorded);
 }
 
-TEST_F(RunLoopTest, LostHandsetEndsTheRunWithoutUnloading)
-{
-    QSharedPointer<RecordingModule> first = Queue(u"A"_s, u"ctf"_s);
-    LoseHandsetWhilePolling(*first);
-    Queue(u"B"_s, u"ctf"_s);
-
-    EXPECT_FALSE(m_harness.Run());
-    EXPECT_EQ(m_events, (QStringList{"load ctf", "run A"}));
-    EXPECT_TRUE(m_log.Text().endsWith(u"Device Connection has died."_s));
-}
-
 TEST_F(RunLoopTest, FrameworksAreFoundInAnyCaseButLoadedByTheirExactName)
 {
     QSharedPointer<RecordingFramework> upper(new RecordingFramework(u"CTFX"_s, &m_events));
@@ -451,12 +430,18 @@ TEST_F(RunLoopTest, SourceRunKeepsFrameworksUntilTheEndWhenAsked)
                            "unload ctf"}));
 }
 
-TEST_F(RunLoopTest, SourceIsToldWhichModuleTheLostHandsetInterrupted)
+TEST_F(RunLoopTest, LostHandsetEndsTheRunWithoutUnloadingAndTheSourceLearnsWhichModuleItInterrupted)
 {
     QSharedPointer<RecordingModule> first = Queue(u"A"_s, u"ctf"_s);
-    LoseHandsetWhilePolling(*first);
-    RecordingSource source({first, Queue(u"B"_s, u"ctf"_s)}, true);
+    first->pollsNeeded = 5;
+    first->onPoll = [this](IKestoDevice *device) {
+        WriteFile(m_handsets.HandsetFolder(u"phone"_s) + u"/offline"_s, QByteArray());
+        device->FileExists(u"fs:/anything"_s);
+    };
+    RecordingSource source({first, Queue(u"B"_s, u"ctf"_s)}, false);
     EXPECT_FALSE(m_harness.Run(source));
+    EXPECT_EQ(m_events, (QStringList{"load ctf", "run A"}));
+    EXPECT_TRUE(m_log.Text().endsWith(u"Device Connection has died."_s));
     EXPECT_EQ(source.outcomes, QStringList{u"A %1"_s.arg(ModuleSource::Interrupted)});
 }
 
