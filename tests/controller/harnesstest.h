@@ -51,8 +51,8 @@ using namespace testutil;
 namespace harnesstest {
 
 // A temporary toolset named by KESTIX_TOOLSET, whose resource compilers are
-// shell scripts. Every call of a stand-in appends its arguments, one per
-// line, followed by a line "--", to calls.txt in the toolset folder.
+// one shell script. Every call of it appends its arguments, joined by tabs,
+// as a line to calls.txt in the toolset folder.
 class Toolset
 {
 public:
@@ -66,10 +66,13 @@ public:
     // unless the toolset holds "convert_fails"; "-compile" writes "compiled:"
     // and the input to the output among lines of noise, unless the toolset
     // holds "compile_fails".
-    void InstallCompiler() { WriteScript(CompilerPath(), kCompilerScript); }
+    void InstallCompiler() { WriteScript(CompilerPath(), QByteArray(kScript).replace("@", Path().toLocal8Bit())); }
     // kestorc: copies the source to the output, or when the toolset holds
     // "alt_empty" leaves an empty output and complains.
-    void InstallAltCompiler() { WriteScript(AltCompilerPath(), kAltCompilerScript); }
+    void InstallAltCompiler()
+    {
+        WriteScript(AltCompilerPath(), QByteArray(kScript).replace("@", Path().toLocal8Bit()));
+    }
     void SetFlag(const char *flag, bool on)
     {
         const QString path = m_dir.filePath(QString::fromLatin1(flag));
@@ -83,58 +86,42 @@ public:
     QList<QStringList> Calls() const
     {
         QList<QStringList> calls;
-        QStringList current;
-        const QString text = QString::fromLocal8Bit(ReadFile(m_dir.filePath(u"calls.txt"_s)));
-        for (const QString &line : text.split(u'\n')) {
-            if (line == u"--"_s) {
-                calls.append(current);
-                current.clear();
-            } else if (!line.isEmpty()) {
-                current.append(line);
-            }
-        }
+        for (const QByteArray &line : ReadFile(m_dir.filePath(u"calls.txt"_s)).split('\n'))
+            if (!line.isEmpty())
+                calls.append(QString::fromLocal8Bit(line).split(u'\t'));
         return calls;
     }
 
-    static void WriteScript(const QString &path, const char *script)
+    static void WriteScript(const QString &path, const QByteArray &script)
     {
-        WriteFile(path, QByteArray(script));
+        WriteFile(path, script);
         QFile::setPermissions(path, QFileDevice::ReadOwner | QFileDevice::WriteOwner | QFileDevice::ExeOwner);
     }
 
 private:
-    static constexpr const char *kCompilerScript = R"SH(#!/bin/sh
-toolset=$(dirname "$(dirname "$0")")
-for a in "$@"; do printf '%s\n' "$a"; done >> "$toolset/calls.txt"
-echo -- >> "$toolset/calls.txt"
+    static constexpr const char *kScript = R"SH(#!/bin/sh
+t='@'
+(IFS='	'; printf '%s\n' "$*") >> "$t/calls.txt"
 case "$1" in
 -convert)
   echo "converting"
-  [ -f "$toolset/convert_fails" ] && { echo "conversion error"; exit 1; }
+  [ -f "$t/convert_fails" ] && { echo "conversion error"; exit 1; }
   cp "$3" "$5" || exit 1
   echo "Successfully converted file $3"
   ;;
 -compile)
   echo "compiling"
-  [ -f "$toolset/compile_fails" ] && { echo "compile error"; exit 1; }
+  [ -f "$t/compile_fails" ] && { echo "compile error"; exit 1; }
   { echo "compiled:"; cat "$3"; } > "$5" || exit 1
   i=0; while [ $i -lt 2000 ]; do echo "noise line $i of the compiler output"; i=$((i+1)); done
   echo "Successfully compiled $5"
   echo "after success"
   ;;
+-nh)
+  [ -f "$t/alt_empty" ] && { : > "$3"; echo "kestorc: syntax error"; echo "stderr line" >&2; exit 1; }
+  cp "$4" "$3"
+  ;;
 esac
-)SH";
-    static constexpr const char *kAltCompilerScript = R"SH(#!/bin/sh
-toolset=$(dirname "$(dirname "$(dirname "$(dirname "$0")")")")
-for a in "$@"; do printf '%s\n' "$a"; done >> "$toolset/calls.txt"
-echo -- >> "$toolset/calls.txt"
-if [ -f "$toolset/alt_empty" ]; then
-  : > "$3"
-  echo "kestorc: syntax error"
-  echo "stderr line" >&2
-  exit 1
-fi
-cp "$4" "$3"
 )SH";
 
     QTemporaryDir m_dir;

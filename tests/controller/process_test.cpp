@@ -107,15 +107,6 @@ TEST_F(ProcessTest, WholeTreeFeedsOneResultsFileWithIndentedMessages)
               (QStringList{u"ProcessedResults.xml"_s, u"trap-ctf-2.log"_s}));
 }
 
-TEST_F(ProcessTest, DamagedResultsFileIsKeptAsideOnce)
-{
-    Log(u"ProcessedResults/ProcessedResults.xml"_s, "<testmodules kvkHash=\"#1\"><mod");
-    ASSERT_TRUE(m_harness.Process(0));
-    const QDir folder(LogFolder() + u"/ProcessedResults"_s);
-    EXPECT_EQ(folder.entryList({u"*.unreadable-*"_s}, QDir::Files).size(), 1);
-    EXPECT_EQ(ReadResults(folder.filePath(u"ProcessedResults.xml"_s)).verdicts.value(u"Audio/a"_s), u"pass"_s);
-}
-
 TEST_F(ProcessTest, SetupFailureOrNoLogFolderRecordsNothing)
 {
     CapturedLog log;

@@ -107,40 +107,25 @@ TEST_F(FeatureListTest, FilterSelectionAppendsKitThenPlatform)
     EXPECT_EQ(Names(modules), (QStringList{u"kept"_s, u"Foo"_s, u"FooPlus"_s}));
 }
 
-struct BadFeatureFile
+TEST_F(FeatureListTest, BadFeatureFilesSelectNothingAndSayWhy)
 {
-    const char *name;
-    const char *content; // null: no file at all
-    const char *message; // a pattern; %1 is the file's path
-};
-
-class BadFeatureFileTest : public FeatureListTest, public ::testing::WithParamInterface<BadFeatureFile>
-{
-};
-
-TEST_P(BadFeatureFileTest, SelectsNothingAndSaysWhy)
-{
-    const BadFeatureFile &c = GetParam();
-    QString path = m_dir.filePath(u"missing.xml"_s);
-    if (c.content)
-        path = Features(c.content);
-    Modules modules{QSharedPointer<_TestModule>(new ScriptedModule(u"stale"_s))};
-    EXPECT_EQ(m_harness.GetTestModules(modules, path), 0u);
-    EXPECT_TRUE(modules.isEmpty());
-    const QRegularExpression message(QString::fromLatin1(c.message).arg(QRegularExpression::escape(path)));
-    EXPECT_TRUE(message.match(m_log.Text()).hasMatch()) << m_log.Text().toStdString();
+    const char *rows[][2] = {
+        // content (null: no file at all), the message as a pattern where %1 is the file's path
+        {nullptr, "BFS File %1 not found\\."},
+        {"<features><feature testModule=\"Foo\">", "Error Parsing BFS File %1, Error:.+ Line:1 Column:\\d+"},
+        {"<features>\n<feature testModule=\"Foo\">\n</x>", "Error Parsing BFS File %1, Error:.+ Line:3 Column:\\d+"},
+        {"<features><module name=\"Foo\"/></features>", "No testcases in BFS File %1\\."},
+    };
+    for (const auto &row : rows) {
+        SCOPED_TRACE(row[1]);
+        const QString path = row[0] ? Features(row[0]) : m_dir.filePath(u"missing.xml"_s);
+        Modules modules{QSharedPointer<_TestModule>(new ScriptedModule(u"stale"_s))};
+        EXPECT_EQ(m_harness.GetTestModules(modules, path), 0u);
+        EXPECT_TRUE(modules.isEmpty());
+        const QRegularExpression message(QString::fromLatin1(row[1]).arg(QRegularExpression::escape(path)));
+        EXPECT_TRUE(message.match(m_log.Text()).hasMatch()) << m_log.Text().toStdString();
+    }
 }
-
-INSTANTIATE_TEST_SUITE_P(Files, BadFeatureFileTest,
-                         ::testing::Values(BadFeatureFile{"Missing", nullptr, "BFS File %1 not found\\."},
-                                           BadFeatureFile{"Truncated", "<features><feature testModule=\"Foo\">",
-                                                          "Error Parsing BFS File %1, Error:.+ Line:1 Column:\\d+"},
-                                           BadFeatureFile{"Mismatched",
-                                                          "<features>\n<feature testModule=\"Foo\">\n</x>",
-                                                          "Error Parsing BFS File %1, Error:.+ Line:3 Column:\\d+"},
-                                           BadFeatureFile{"NoFeatures", "<features><module name=\"Foo\"/></features>",
-                                                          "No testcases in BFS File %1\\."}),
-                         [](const ::testing::TestParamInfo<BadFeatureFile> &info) { return info.param.name; });
 
 // ---- Catalogues of real kits ----
 

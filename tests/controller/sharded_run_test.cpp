@@ -93,12 +93,10 @@ TEST_F(ShardedRunTest, FourHandsetsShareTheQueueAndMatchAOneHandsetRun)
         // Once on the solo handset, once on one of the four.
         EXPECT_EQ(done.value(name).size(), 2) << name.toStdString();
     }
-    int total = 0;
     for (const ShardedRun::HandsetResult &handset : run.Handsets()) {
         EXPECT_TRUE(handset.connected);
         EXPECT_FALSE(handset.lost);
         EXPECT_EQ(handset.modulesRun, byHandset.value(handset.handset).size());
-        total += handset.modulesRun;
         // Everything the run put on the handset is gone again.
         EXPECT_TRUE(QDir(m_run.Handsets().HostPath(handset.handset, u"fs:/usermods"_s))
                         .entryList(QDir::Dirs | QDir::NoDotAndDotDot)
@@ -106,7 +104,6 @@ TEST_F(ShardedRunTest, FourHandsetsShareTheQueueAndMatchAOneHandsetRun)
                         .isEmpty())
             << handset.handset.toStdString();
     }
-    EXPECT_EQ(total, selection.size());
     EXPECT_TRUE(run.NotRun().isEmpty());
     // Each module's wall time was recorded beside the results of its handset.
     for (const ShardedRun::ModuleResult &module : modules) {
