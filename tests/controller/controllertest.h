@@ -1,8 +1,7 @@
 #pragma once
 
-// Fixture pieces for the selection, run, results and reprocessing tests:
-// access to the Harness's private operations, a scripted test module, and
-// catalogues filled in memory.
+// Fixture pieces for the selection, run, results and reprocessing tests: access to the Harness's private operations, a
+// scripted test module, and catalogues filled in memory.
 
 #include "harnesstest.h"
 
@@ -18,8 +17,7 @@ using namespace Qt::StringLiterals;
 
 namespace controllertest {
 
-// A module whose log parser answers with a prepared record, and whose run
-// steps only count their calls.
+// A module whose log parser answers with a prepared record, and whose run steps only count their calls.
 class ScriptedModule : public _TestModule
 {
 public:
@@ -74,8 +72,7 @@ inline QSharedPointer<ScriptedModule> CatalogueModule(const QString &name, const
     return module;
 }
 
-// A catalogue held in memory only (its cache folder is created below the
-// test's data root).
+// A catalogue held in memory only (its cache folder is created below the test's data root).
 inline QSharedPointer<Manifest> MakeCatalogue(const QString &path, bool isPlatform,
                                               const QList<QSharedPointer<ScriptedModule>> &modules)
 {

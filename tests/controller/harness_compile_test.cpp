@@ -20,16 +20,19 @@ protected:
     Harness m_harness;
 };
 
-TEST_F(HarnessCompileTest, UpperCaseKsxIsConvertedThenCompiledAndTheCarRemoved)
+// The name would run commands if it ever reached a shell.
+TEST_F(HarnessCompileTest, UpperCaseKsxIsConvertedThenCompiledWithItsNamePassedUnchangedAndTheCarRemoved)
 {
     m_toolset.InstallCompiler();
-    const QString source = WorkPath(u"strings.KSX"_s);
-    const QString car = WorkPath(u"strings.car"_s);
-    const QString output = WorkPath(u"strings.kar"_s);
+    m_toolset.InstallAltCompiler();
+    CurrentDirectory cwd(m_work.path());
+    const QString name = u"my data \"q\" 'x' $HOME $(touch injected) `touch injected2`; x"_s;
+    const QString source = WorkPath(name + u".KSX"_s);
+    const QString car = WorkPath(name + u".car"_s);
+    const QString output = WorkPath(u"out $PATH \"1\".kar"_s);
     WriteFile(source, "<resources/>\n");
 
     EXPECT_TRUE(m_harness.CompileResource(source, output));
-
     const QList<QStringList> calls = m_toolset.Calls();
     ASSERT_EQ(calls.size(), 2);
     EXPECT_EQ(calls[0], (QStringList{u"-convert"_s, u"-infile"_s, source, u"-outfile"_s, car}));
@@ -37,10 +40,15 @@ TEST_F(HarnessCompileTest, UpperCaseKsxIsConvertedThenCompiledAndTheCarRemoved)
     EXPECT_FALSE(QFileInfo::exists(car));
     EXPECT_EQ(ReadFile(output), QByteArray("compiled:\n<resources/>\n"));
     // Only the success lines reach the log, each on a line of its own.
-    EXPECT_EQ(m_log.Text(),
-              QStringLiteral("Successfully converted file %1\n"
-                             "Successfully compiled %2\n")
-                  .arg(source, output));
+    EXPECT_EQ(m_log.Text(), u"Successfully converted file %1\nSuccessfully compiled %2\n"_s.arg(source, output));
+
+    const QString altOutput = WorkPath(u"dpk $(touch injected3).kar"_s);
+    EXPECT_TRUE(m_harness.AltCompileResource(source, altOutput));
+    EXPECT_EQ(ReadFile(altOutput), QByteArray("<resources/>\n"));
+    EXPECT_EQ(m_toolset.Calls().value(2), (QStringList{u"-nh"_s, u"-o"_s, altOutput, source}));
+    EXPECT_FALSE(m_log.Text().contains(u"Compiliation"_s));
+    for (const char *file : {"injected", "injected2", "injected3"})
+        EXPECT_FALSE(QFileInfo::exists(WorkPath(QString::fromLatin1(file)))) << file;
 }
 
 TEST_F(HarnessCompileTest, OnlyKsxIsConvertedAndAFailedStepKeepsTheSourceAndNoIntermediate)
@@ -79,35 +87,6 @@ TEST_F(HarnessCompileTest, OnlyKsxIsConvertedAndAFailedStepKeepsTheSourceAndNoIn
         EXPECT_FALSE(QFileInfo::exists(car));
     }
     EXPECT_FALSE(m_log.Text().contains(u"conversion error"_s));
-}
-
-// The name would run commands if it ever reached a shell.
-TEST_F(HarnessCompileTest, FileNamesWithShellCharactersArePassedUnchanged)
-{
-    m_toolset.InstallCompiler();
-    m_toolset.InstallAltCompiler();
-    CurrentDirectory cwd(m_work.path());
-    const QString name = u"my data \"q\" 'x' $HOME $(touch injected) `touch injected2`; x.ksx"_s;
-    const QString source = WorkPath(name);
-    WriteFile(source, "payload");
-    const QString output = WorkPath(u"out $PATH \"1\".kar"_s);
-
-    EXPECT_TRUE(m_harness.CompileResource(source, output));
-    EXPECT_EQ(ReadFile(output), QByteArray("compiled:\npayload"));
-    const QList<QStringList> calls = m_toolset.Calls();
-    ASSERT_EQ(calls.size(), 2);
-    EXPECT_EQ(calls[0].value(2), source);
-    EXPECT_EQ(calls[1].value(4), output);
-
-    const QString altOutput = WorkPath(u"dpk $(touch injected3).kar"_s);
-    EXPECT_TRUE(m_harness.AltCompileResource(source, altOutput));
-    EXPECT_EQ(ReadFile(altOutput), QByteArray("payload"));
-    EXPECT_EQ(m_toolset.Calls().value(2), (QStringList{u"-nh"_s, u"-o"_s, altOutput, source}));
-    EXPECT_TRUE(m_log.Text().startsWith(u"Successfully converted file "_s));
-    EXPECT_FALSE(m_log.Text().contains(u"Compiliation"_s));
-
-    for (const char *file : {"injected", "injected2", "injected3"})
-        EXPECT_FALSE(QFileInfo::exists(WorkPath(QString::fromLatin1(file)))) << file;
 }
 
 TEST_F(HarnessCompileTest, AltCompileWithAnEmptyOutputFailsWithTheCommandAndTheToolOutput)

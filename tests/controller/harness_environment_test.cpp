@@ -28,8 +28,7 @@ protected:
     }
     QString RootPath(const QString &name) const { return m_root.filePath(name); }
 
-    // A source file last modified an hour ago, so that a cache written now is
-    // newer.
+    // A source file last modified an hour ago, so that a cache written now is newer.
     QString OldFile(const QString &name, const QByteArray &content)
     {
         const QString path = RootPath(name);
@@ -183,8 +182,7 @@ TEST_F(HarnessEnvironmentTest, DevicePackThatFailsKeepsItsOtherEntries)
     EXPECT_EQ(m_toolset.Calls().size(), 2);
 }
 
-// Platforms "Alpha Pro", "Beta Pro" (the default) and "Gamma"; kits "KitOne",
-// "KitTwo" (the default) and "Other".
+// Platforms "Alpha Pro", "Beta Pro" (the default) and "Gamma"; kits "KitOne", "KitTwo" (the default) and "Other".
 class HarnessSetupTest : public HarnessEnvironmentTest
 {
 protected:
@@ -249,8 +247,7 @@ TEST_F(HarnessSetupTest, SettingUpAgainKeepsTheRunAndTheUnselectedKitUntilTheHos
     ASSERT_TRUE(RunSetup());
     EXPECT_EQ(EnvOf(m_harness).value(u"TestRunID"_s), runId);
 
-    // A new family draws a new run identifier, but neither selects the kit
-    // nor nests the platform folder a second time.
+    // A new family draws a new run identifier, but neither selects the kit nor nests the platform folder a second time.
     m_harness.SetFamily(u"family"_s, QString());
     ASSERT_FALSE(HarnessTestAccess::EnvironmentReady(m_harness));
     ASSERT_TRUE(RunSetup());

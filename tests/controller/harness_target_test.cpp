@@ -150,7 +150,7 @@ TEST_F(HarnessTargetTest, SetTargetKeepsTheConnectionForTheSameNameAndDisconnect
     EXPECT_EQ(targets.first().name, u"Alpha"_s);
 }
 
-TEST(HarnessConfiguration, CopyDelayTakesUnsigned32BitDecimalsOnly)
+TEST(HarnessConfiguration, CopyDelayTakesUnsigned32BitDecimalsOnlyAndAnEmptyKitOrPlatformChangesNothing)
 {
     const QList<QPair<QString, quint32>> cases{{u"1500"_s, 1500u},    {u"abc"_s, 0u},  {u"0x10"_s, 0u},
                                                {u"-1"_s, 0u},         {QString(), 0u}, {u"4294967295"_s, 4294967295u},
@@ -161,11 +161,6 @@ TEST(HarnessConfiguration, CopyDelayTakesUnsigned32BitDecimalsOnly)
         harness.SetCopyDelay(text);
         EXPECT_EQ(HarnessTestAccess::CopyDelay(harness), expected) << text.toStdString();
     }
-}
-
-TEST(HarnessConfiguration, EmptyOrUnchangedKitAndPlatformChangeNothing)
-{
-    Harness harness;
     harness.SetTestkit(u"kit"_s);
     harness.SetPlatform(u"platform"_s);
     harness.SetTestkit(QString());

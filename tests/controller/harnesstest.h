@@ -1,8 +1,7 @@
 #pragma once
 
-// Shared fixture pieces for the Harness tests: access to the private state,
-// a log captured in a file, and a temporary SDK toolset with stand-in
-// resource compilers.
+// Shared fixture pieces for the Harness tests: access to the private state, a log captured in a file, and a temporary
+// SDK toolset with stand-in resource compilers.
 
 #include "catalogue/manifest.h"
 #include "controller/harness.h"
@@ -19,8 +18,7 @@
 
 using namespace Qt::StringLiterals;
 
-// The Harness befriends this class so that tests can reach its private
-// operations and fields.
+// The Harness befriends this class so that tests can reach its private operations and fields.
 class HarnessTestAccess
 {
 public:
@@ -50,9 +48,8 @@ using namespace testutil;
 
 namespace harnesstest {
 
-// A temporary toolset named by KESTIX_TOOLSET, whose resource compilers are
-// one shell script. Every call of it appends its arguments, joined by tabs,
-// as a line to calls.txt in the toolset folder.
+// A temporary toolset named by KESTIX_TOOLSET, whose resource compilers are one shell script. Every call of it appends
+// its arguments, joined by tabs, as a line to calls.txt in the toolset folder.
 class Toolset
 {
 public:
@@ -62,13 +59,12 @@ public:
     QString CompilerPath() const { return m_dir.filePath(u"bin/kestormc.exe"_s); }
     QString AltCompilerPath() const { return m_dir.filePath(u"bin/deprecated/ResourceEditor/kestorc.exe"_s); }
 
-    // kestormc: "-convert" copies the input to the output and reports it
-    // unless the toolset holds "convert_fails"; "-compile" writes "compiled:"
-    // and the input to the output among lines of noise, unless the toolset
-    // holds "compile_fails".
+    // kestormc: "-convert" copies the input to the output and reports it unless the toolset holds "convert_fails";
+    // "-compile" writes "compiled:" and the input to the output among lines of noise, unless the toolset holds
+    // "compile_fails".
     void InstallCompiler() { WriteScript(CompilerPath(), QByteArray(kScript).replace("@", Path().toLocal8Bit())); }
-    // kestorc: copies the source to the output, or when the toolset holds
-    // "alt_empty" leaves an empty output and complains.
+    // kestorc: copies the source to the output, or when the toolset holds "alt_empty" leaves an empty output and
+    // complains.
     void InstallAltCompiler()
     {
         WriteScript(AltCompilerPath(), QByteArray(kScript).replace("@", Path().toLocal8Bit()));
@@ -128,8 +124,7 @@ esac
     EnvGuard m_env;
 };
 
-// Sets a file's modification time, so freshness does not depend on how fast
-// the test runs.
+// Sets a file's modification time, so freshness does not depend on how fast the test runs.
 inline void SetModified(const QString &path, const QDateTime &when)
 {
     QFile file(path);

@@ -35,8 +35,7 @@ protected:
                                CatalogueModule(u"Menu"_s, u"#102"_s, {u"m1"_s, u"m2"_s}, QString(), u"uitf"_s)});
         m_platform = MakeCatalogue(m_dir.filePath(u"platform"_s), true, {});
 
-        // The saved tree; the folders of raw OAT logs and of results hold
-        // logs that must not be read.
+        // The saved tree; the folders of raw OAT logs and of results hold logs that must not be read.
         Log(u"audio-ctf-2026-12-03.log"_s, CtfLog("Audio", {{"a", "Fail"}, {"b", "Fail"}}));
         Log(u"menu-2026-12-03.txt"_s, UtLog("Menu", {{"m1", "PASS"}, {"m2", "FAIL"}}));
         Log(u"readme.dat"_s, "Suite: Audio\n");

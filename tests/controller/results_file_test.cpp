@@ -47,8 +47,7 @@ protected:
 
     QMap<QString, QString> &Env() { return HarnessTestAccess::Environment(m_harness); }
 
-    // Kit: Audio (a, b, c), Video (x), a secondary module and a framework
-    // module; platform: Shell (s1).
+    // Kit: Audio (a, b, c), Video (x), a secondary module and a framework module; platform: Shell (s1).
     void UseCatalogues(const QString &kitName)
     {
         m_kit = MakeCatalogue(m_dir.filePath(kitName), false,
@@ -269,8 +268,7 @@ TEST_F(ProcessedResultsDocument, WhatTheFileHoldsBesideVerdictsIsKept)
 
 TEST_F(ProcessedResultsDocument, FileNestedBeyondAnyResultsFileIsKeptAside)
 {
-    // Written back with its indentation, a file nested a hundred thousand
-    // levels deep would need tens of gigabytes.
+    // Written back with its indentation, a file nested a hundred thousand levels deep would need tens of gigabytes.
     QByteArray deep = "<testmodules kvkHash=\"\" platformHash=\"\">";
     for (int i = 0; i < 100000; ++i)
         deep += "<m>";
@@ -287,10 +285,9 @@ TEST_F(ProcessedResultsDocument, FileNestedBeyondAnyResultsFileIsKeptAside)
 
 TEST_F(ProcessedResultsDocument, LongRunsOfRenamesAndNewCasesMatchTheRules)
 {
-    // Verdicts at random against the rules applied to a plain list: the
-    // first case in the module named as reported, or as reported without a
-    // ".1" or "_1" ending, takes the verdict (renamed and moved last when
-    // the names differ); no match appends a case.
+    // Verdicts at random against the rules applied to a plain list: the first case in the module named as reported, or
+    // as reported without a ".1" or "_1" ending, takes the verdict (renamed and moved last when the names differ); no
+    // match appends a case.
     QRandomGenerator random(7);
     const QStringList verdicts{u"pass"_s, u"fail"_s, u"unsupported"_s, u"unexecuted"_s};
     QList<QPair<QString, QString>> model;

@@ -9,8 +9,8 @@
 
 namespace {
 
-// A processed-results file of one module "M" (source KVK) whose test cases
-// carry the given verdicts, and a module "Idle" that did not run.
+// A processed-results file of one module "M" (source KVK) whose test cases carry the given verdicts, and a module
+// "Idle" that did not run.
 QByteArray ResultsFile(const QStringList &verdicts, const QByteArray &kitHash = "#1")
 {
     QByteArray text = "<testmodules kvkHash=\"" + kitHash

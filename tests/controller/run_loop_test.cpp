@@ -1,5 +1,5 @@
-// The run loop's order, waits and messages, driven against an emulated
-// handset with modules and frameworks that record what is asked of them.
+// The run loop's order, waits and messages, driven against an emulated handset with modules and frameworks that record
+// what is asked of them.
 
 #include "controllertest.h"
 
@@ -15,6 +15,13 @@
 
 namespace {
 
+// Notes a call in events and answers it with result.
+bool Note(QStringList *events, const QString &call, bool result = true)
+{
+    events->append(call);
+    return result;
+}
+
 class RecordingModule : public ScriptedModule
 {
 public:
@@ -27,10 +34,9 @@ public:
 
     bool Run(IKestoDevice *, const QMap<QString, QString> &) override
     {
-        m_events->append(u"run "_s + moduleName);
         seenTestCases = selectedTestCases;
         seenRunOption = runOption;
-        return runs;
+        return Note(m_events, u"run "_s + moduleName, runs);
     }
     bool IsLogComplete(IKestoDevice *device) override
     {
@@ -42,15 +48,10 @@ public:
     bool CopyLog(IKestoDevice *, QMap<QString, QString> &) override
     {
         copyTime = Clock::Now();
-        m_events->append(u"copy "_s + moduleName);
-        return copies;
+        return Note(m_events, u"copy "_s + moduleName, copies);
     }
-    bool RemoveTest(IKestoDevice *) override
-    {
-        m_events->append(u"remove "_s + moduleName);
-        return true;
-    }
-    void PostProcess(QMap<QString, QString> &) override { m_events->append(u"postprocess "_s + moduleName); }
+    bool RemoveTest(IKestoDevice *) override { return Note(m_events, u"remove "_s + moduleName); }
+    void PostProcess(QMap<QString, QString> &) override { Note(m_events, u"postprocess "_s + moduleName); }
     bool GetLogFilePaths(IKestoDevice *, QStringList &paths) override
     {
         paths << u"fs:/a.log"_s << u"fs:/b.log"_s;
@@ -75,17 +76,9 @@ class RecordingFramework : public _Framework
 public:
     RecordingFramework(const QString &frameworkName, QStringList *events) : m_events(events) { name = frameworkName; }
     bool IsLoaded(IKestoDevice *) override { return onHandset; }
-    bool Load(IKestoDevice *, QMap<QString, QString> &) override
-    {
-        m_events->append(u"load "_s + name);
-        return loads;
-    }
-    bool PostLoad(IKestoDevice *, QMap<QString, QString> &) override
-    {
-        m_events->append(u"postload "_s + name);
-        return true;
-    }
-    void Unload(IKestoDevice *, QMap<QString, QString> &) override { m_events->append(u"unload "_s + name); }
+    bool Load(IKestoDevice *, QMap<QString, QString> &) override { return Note(m_events, u"load "_s + name, loads); }
+    bool PostLoad(IKestoDevice *, QMap<QString, QString> &) override { return Note(m_events, u"postload "_s + name); }
+    void Unload(IKestoDevice *, QMap<QString, QString> &) override { Note(m_events, u"unload "_s + name); }
 
     bool onHandset = false;
     bool loads = true;

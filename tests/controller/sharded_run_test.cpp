@@ -1,5 +1,5 @@
-// One selection run on several emulated handsets at once: a shared queue,
-// one Harness per handset in its own thread, handsets dropping out.
+// One selection run on several emulated handsets at once: a shared queue, one Harness per handset in its own thread,
+// handsets dropping out.
 
 #include "controllertest.h"
 
@@ -70,8 +70,7 @@ TEST_F(ShardedRunTest, FourHandsetsShareTheQueueAndMatchAOneHandsetRun)
     const QList<Harness *> workers = AddWorkers(run, handsets);
     ASSERT_TRUE(run.Run(selection)) << m_run.LogText().toStdString();
 
-    // Every module ran once, on one handset, and its verdicts are in that
-    // handset's own results file.
+    // Every module ran once, on one handset, and its verdicts are in that handset's own results file.
     QMap<QString, QStringList> byHandset;
     const QList<ShardedRun::ModuleResult> modules = run.Modules();
     ASSERT_EQ(modules.size(), selection.size());
@@ -138,8 +137,7 @@ TEST_F(ShardedRunTest, AHandsetGoingOfflineHandsItsModuleToTheOthers)
     EXPECT_LT(results.at(1).lostAfterMs, 600000);
     EXPECT_TRUE(m_run.LogText().contains(u"Handset h2 dropped out at "_s));
 
-    // The module h2 had in hand started there, ran to the end on h1, and
-    // nothing ran to the end twice.
+    // The module h2 had in hand started there, ran to the end on h1, and nothing ran to the end twice.
     QString interrupted;
     for (const QString &line : m_run.Runs()) {
         if (line.startsWith(u"start "_s) && line.endsWith(u" h2"_s))

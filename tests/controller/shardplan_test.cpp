@@ -1,5 +1,5 @@
-// Splitting a selection between hosts: the plan, the shard a process runs
-// (options and job-engine variables) and the recorded module times.
+// Splitting a selection between hosts: the plan, the shard a process runs (options and job-engine variables) and the
+// recorded module times.
 
 #include "controller/moduletimings.h"
 #include "controller/shardplan.h"
@@ -72,8 +72,8 @@ TEST(ShardPlanTest, PlanIsTheSameWhateverTheSelectionOrder)
 
 TEST(ShardPlanTest, LongestFirstBalancesAndUnknownModulesCountTheirTestCases)
 {
-    // Known: 6000 ms for 3 test cases and 1000 ms for 1: the median is 1500
-    // ms per test case (of 2000 and 1000), so 4 test cases count 6000 ms.
+    // Known: 6000 ms for 3 test cases and 1000 ms for 1: the median is 1500 ms per test case (of 2000 and 1000), so 4
+    // test cases count 6000 ms.
     const QList<Module> selection{{u"a"_s, u"KVK"_s, 3, 6000},
                                   {u"b"_s, u"KVK"_s, 1, 1000},
                                   {u"c"_s, u"KVK"_s, 4, -1},
@@ -104,8 +104,8 @@ TEST(ShardPlanTest, LongestFirstBalancesAndUnknownModulesCountTheirTestCases)
 
 TEST(ShardSettingTest, ReadsOptionsAndEngineVariables)
 {
-    // The options (null: not given), the engine variables "NAME=value;...", and the error a refused row gives or
-    // the shard an accepted one takes.
+    // The options (null: not given), the engine variables "NAME=value;...", and the error a refused row gives or the
+    // shard an accepted one takes.
     const struct
     {
         const char *what, *index, *count, *variables, *error;
