@@ -88,3 +88,26 @@ inline QSharedPointer<Manifest> MakeCatalogue(const QString &path, bool isPlatfo
 } // namespace controllertest
 
 using namespace controllertest;
+
+// A Harness logging to a captured log, with catalogues held in memory below a temporary folder.
+class CatalogueHarnessTest : public ::testing::Test
+{
+protected:
+    CatalogueHarnessTest() { m_harness.SetLogger(m_log.log()); }
+
+    // Gives the harness a kit (in the folder kitName) and a platform holding these modules.
+    void UseCatalogues(const QList<QSharedPointer<ScriptedModule>> &kit,
+                       const QList<QSharedPointer<ScriptedModule>> &platform, const QString &kitName = u"kit"_s)
+    {
+        m_kit = MakeCatalogue(m_dir.filePath(kitName), false, kit);
+        m_platform = MakeCatalogue(m_dir.filePath(u"platform"_s), true, platform);
+        HarnessTestAccess::SetCatalogues(m_harness, m_kit, m_platform);
+    }
+    QMap<QString, QString> &Env() { return HarnessTestAccess::Environment(m_harness); }
+
+    QTemporaryDir m_dir;
+    CapturedLog m_log;
+    Harness m_harness;
+    QSharedPointer<Manifest> m_kit;
+    QSharedPointer<Manifest> m_platform;
+};

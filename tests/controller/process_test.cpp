@@ -24,16 +24,15 @@ QByteArray UtLog(const char *suite, const QList<QPair<const char *, const char *
     return log + "----\nElapsed Time: 3\n";
 }
 
-class ProcessTest : public ::testing::Test
+class ProcessTest : public CatalogueHarnessTest
 {
 protected:
     void SetUp() override
     {
-        ASSERT_TRUE(m_dir.isValid());
-        m_kit = MakeCatalogue(m_dir.filePath(u"kit"_s), false,
-                              {CatalogueModule(u"Audio"_s, u"#101"_s, {u"a"_s, u"b"_s, u"c"_s}),
-                               CatalogueModule(u"Menu"_s, u"#102"_s, {u"m1"_s, u"m2"_s}, QString(), u"uitf"_s)});
-        m_platform = MakeCatalogue(m_dir.filePath(u"platform"_s), true, {});
+        UseCatalogues({CatalogueModule(u"Audio"_s, u"#101"_s, {u"a"_s, u"b"_s, u"c"_s}),
+                       CatalogueModule(u"Menu"_s, u"#102"_s, {u"m1"_s, u"m2"_s}, QString(), u"uitf"_s)},
+                      {});
+        m_harness.SetLogOutputPath(LogFolder());
 
         // The saved tree; the folders of raw OAT logs and of results hold logs that must not be read.
         Log(u"audio-ctf-2026-12-03.log"_s, CtfLog("Audio", {{"a", "Fail"}, {"b", "Fail"}}));
@@ -45,22 +44,10 @@ protected:
         Log(u"a-run/menu-2026-12-05.txt"_s, UtLog("Menu", {{"m2", "PASS"}}));
         Log(u"oatRawLogs/trap-ctf-1.log"_s, CtfLog("Audio", {{"trap", "Pass"}}));
         Log(u"ProcessedResults/trap-ctf-2.log"_s, CtfLog("Audio", {{"trap", "Pass"}}));
-        m_harness.SetLogger(m_log.log());
-        m_harness.SetLogOutputPath(LogFolder());
-        HarnessTestAccess::SetCatalogues(m_harness, m_kit, m_platform);
     }
 
-    void Log(const QString &relative, const QByteArray &content)
-    {
-        WriteFile(m_dir.filePath(u"logs/"_s + relative), content);
-    }
+    void Log(const QString &relative, const QByteArray &content) { WriteFile(LogFolder() + u'/' + relative, content); }
     QString LogFolder() const { return m_dir.filePath(u"logs"_s); }
-
-    QTemporaryDir m_dir;
-    QSharedPointer<Manifest> m_kit;
-    QSharedPointer<Manifest> m_platform;
-    CapturedLog m_log;
-    Harness m_harness;
 };
 
 TEST_F(ProcessTest, WholeTreeFeedsOneResultsFileWithIndentedMessages)

@@ -34,30 +34,24 @@ TEST(ResultPrecedence, KeepsTheStrongerVerdict)
 
 // ---- The results file through the Harness ----
 
-class ResultsFileTest : public ::testing::Test
+class ResultsFileTest : public CatalogueHarnessTest
 {
 protected:
     void SetUp() override
     {
-        ASSERT_TRUE(m_dir.isValid());
-        m_harness.SetLogger(m_log.log());
         Env()[u"LogPath"_s] = m_dir.filePath(u"logs"_s);
         UseCatalogues(u"kit"_s);
     }
 
-    QMap<QString, QString> &Env() { return HarnessTestAccess::Environment(m_harness); }
-
     // Kit: Audio (a, b, c), Video (x), a secondary module and a framework module; platform: Shell (s1).
     void UseCatalogues(const QString &kitName)
     {
-        m_kit = MakeCatalogue(m_dir.filePath(kitName), false,
-                              {CatalogueModule(u"Audio"_s, u"#11"_s, {u"a"_s, u"b"_s, u"c"_s}, u"media"_s),
-                               CatalogueModule(u"Video"_s, u"#12"_s, {u"x"_s}),
-                               CatalogueModule(u"Helper"_s, u"#13"_s, {u"h"_s}, QString(), u"secondary"_s),
-                               CatalogueModule(u"CtfRunner"_s, u"#14"_s, {u"r"_s}, u"TestFrameworks"_s)});
-        m_platform
-            = MakeCatalogue(m_dir.filePath(u"platform"_s), true, {CatalogueModule(u"Shell"_s, u"#21"_s, {u"s1"_s})});
-        HarnessTestAccess::SetCatalogues(m_harness, m_kit, m_platform);
+        CatalogueHarnessTest::UseCatalogues(
+            {CatalogueModule(u"Audio"_s, u"#11"_s, {u"a"_s, u"b"_s, u"c"_s}, u"media"_s),
+             CatalogueModule(u"Video"_s, u"#12"_s, {u"x"_s}),
+             CatalogueModule(u"Helper"_s, u"#13"_s, {u"h"_s}, QString(), u"secondary"_s),
+             CatalogueModule(u"CtfRunner"_s, u"#14"_s, {u"r"_s}, u"TestFrameworks"_s)},
+            {CatalogueModule(u"Shell"_s, u"#21"_s, {u"s1"_s})}, kitName);
     }
 
     // Records a run module whose log reports verdicts of the named module, or cannot be parsed.
@@ -75,12 +69,6 @@ protected:
     {
         return QDir::cleanPath(m_dir.filePath(u"logs/processedResults/ProcessedResults.xml"_s));
     }
-
-    QTemporaryDir m_dir;
-    CapturedLog m_log;
-    Harness m_harness;
-    QSharedPointer<Manifest> m_kit;
-    QSharedPointer<Manifest> m_platform;
 };
 
 TEST_F(ResultsFileTest, FirstUpdateWritesTheSkeletonOfBothCataloguesBelowTheLogFolder)

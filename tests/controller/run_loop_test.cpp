@@ -109,22 +109,19 @@ struct Watcher : RunObserver
     QMap<QString, ModuleRecord> ended;
 };
 
-class RunLoopTest : public ::testing::Test
+class RunLoopTest : public CatalogueHarnessTest
 {
 protected:
     void SetUp() override
     {
-        ASSERT_TRUE(m_dir.isValid());
         m_handsets.AddHandset(u"phone"_s, u"Emulated phone"_s, u"arm"_s);
-        m_harness.SetLogger(m_log.log());
         m_harness.SetTarget(u"phone"_s);
         m_harness.SetLogOutputPath(m_dir.filePath(u"logs"_s));
         m_ctf.reset(new RecordingFramework(u"ctf"_s, &m_events));
         m_oat.reset(new RecordingFramework(u"oat"_s, &m_events));
-        m_kit = MakeCatalogue(m_dir.filePath(u"kit"_s), false, {});
+        UseCatalogues({}, {});
         m_kit->frameworks.insert(m_ctf->name, m_ctf);
         m_kit->frameworks.insert(m_oat->name, m_oat);
-        HarnessTestAccess::SetCatalogues(m_harness, m_kit, {});
         m_harness.SetRunObserver(&m_watcher);
     }
 
@@ -144,16 +141,10 @@ protected:
         return module;
     }
 
-    QString ResultsPath() { return HarnessTestAccess::Environment(m_harness).value(u"ProcessedResultsPath"_s); }
-
-    QTemporaryDir m_dir;
     HandsetFixture m_handsets;
-    CapturedLog m_log;
-    Harness m_harness;
     QStringList m_events;
     QSharedPointer<RecordingFramework> m_ctf;
     QSharedPointer<RecordingFramework> m_oat;
-    QSharedPointer<Manifest> m_kit;
     Watcher m_watcher;
 };
 
@@ -184,7 +175,7 @@ TEST_F(RunLoopTest, ModulesRunByTypeThenNameWithEachFrameworkLoadedOnce)
                                             "   Test Beta Run\n   Removing test Beta\n")));
     EXPECT_TRUE(log.contains(u"Unloading Framework ctf\nLoading Framework oat\n"_s));
     EXPECT_TRUE(log.endsWith(u"Unloading Framework oat\n"_s));
-    const ResultsView view = ReadResults(ResultsPath());
+    const ResultsView view = ReadResults(Env().value(u"ProcessedResultsPath"_s));
     EXPECT_EQ(view.verdicts.value(u"Zeta/Zeta_1"_s), u"pass"_s);
     EXPECT_EQ(view.verdicts.value(u"Beta/Beta_1"_s), u"pass"_s);
 }
@@ -337,11 +328,9 @@ TEST_F(RunLoopTest, FrameworksAreFoundInAnyCaseButLoadedByTheirExactName)
 
 TEST_F(RunLoopTest, SecondaryModulesComeFromBothCataloguesBeforeTheModuleStarts)
 {
-    QSharedPointer<Manifest> platform = MakeCatalogue(m_dir.filePath(u"platform"_s), true, {});
-    HarnessTestAccess::SetCatalogues(m_harness, m_kit, platform);
     QSharedPointer<RecordingModule> module(new RecordingModule(u"Main"_s, u"ctf"_s, &m_events));
     module->secondaryModules = {u"Both"_s, u"Nowhere"_s};
-    for (Manifest *catalogue : {m_kit.data(), platform.data()}) {
+    for (Manifest *catalogue : {m_kit.data(), m_platform.data()}) {
         QSharedPointer<RecordingModule> both(new RecordingModule(u"Both"_s, u"secondary"_s, &m_events));
         catalogue->testModules.insert(u"both"_s, both);
     }

@@ -19,20 +19,14 @@ QStringList Names(const Modules &modules)
 
 // ---- Feature lists over catalogues held in memory ----
 
-class FeatureListTest : public ::testing::Test
+class FeatureListTest : public CatalogueHarnessTest
 {
 protected:
     void SetUp() override
     {
-        ASSERT_TRUE(m_dir.isValid());
-        m_harness.SetLogger(m_log.log());
-        m_kit = MakeCatalogue(m_dir.filePath(u"kit"_s), false,
-                              {CatalogueModule(u"Foo"_s, u"#1"_s, {}), CatalogueModule(u"Bar"_s, u"#2"_s, {}),
-                               CatalogueModule(u"Lib"_s, u"#3"_s, {}, QString(), u"secondary"_s)});
-        m_platform
-            = MakeCatalogue(m_dir.filePath(u"platform"_s), true,
-                            {CatalogueModule(u"Shell"_s, u"#4"_s, {}), CatalogueModule(u"FooPlus"_s, u"#5"_s, {})});
-        HarnessTestAccess::SetCatalogues(m_harness, m_kit, m_platform);
+        UseCatalogues({CatalogueModule(u"Foo"_s, u"#1"_s, {}), CatalogueModule(u"Bar"_s, u"#2"_s, {}),
+                       CatalogueModule(u"Lib"_s, u"#3"_s, {}, QString(), u"secondary"_s)},
+                      {CatalogueModule(u"Shell"_s, u"#4"_s, {}), CatalogueModule(u"FooPlus"_s, u"#5"_s, {})});
     }
 
     QString Features(const QByteArray &xml)
@@ -41,12 +35,6 @@ protected:
         WriteFile(path, xml);
         return path;
     }
-
-    QTemporaryDir m_dir;
-    CapturedLog m_log;
-    Harness m_harness;
-    QSharedPointer<Manifest> m_kit;
-    QSharedPointer<Manifest> m_platform;
 };
 
 TEST_F(FeatureListTest, FeaturesSelectTheirModulesAndUnknownNamesAreWarnedOneByOne)
@@ -141,14 +129,7 @@ protected:
         ASSERT_TRUE(m_run.KitOk() && m_platform.Ok());
     }
 
-    static kitbuilder::Module Module(const QString &name)
-    {
-        kitbuilder::Module module;
-        module.kind = u"ctf"_s;
-        module.name = name;
-        module.testCases = {name + u"_a"_s};
-        return module;
-    }
+    static kitbuilder::Module Module(const QString &name) { return {u"ctf"_s, name, {}, {}, {name + u"_a"_s}}; }
 
     QString KitPath() const { return m_run.Path(u"kit"_s); }
     void ChooseBoth(Harness &harness) const
