@@ -54,23 +54,7 @@ TEST_F(HarnessTargetTest, ConnectsToTheFirstTargetWhoseNameOrDescriptionContains
     }
 }
 
-TEST_F(HarnessTargetTest, AMatchThatDoesNotConnectGivesWayToTheNextMatch)
-{
-    AddHandset(u"Alpha-1234"_s, u"Kesto Phone"_s, QString(), true);
-    AddHandset(u"Beta-5678"_s, u"Kesto Phone"_s);
-
-    ASSERT_TRUE(m_harness.ConnectToTarget(u"kesto"_s));
-    EXPECT_EQ(Connected(), u"Beta-5678"_s);
-    const QString log = m_log.Text();
-    EXPECT_TRUE(log.contains(u"Gateway could not connect to device Alpha-1234."_s));
-    EXPECT_TRUE(log.endsWith(u"Connected to target: Beta-5678"_s));
-
-    // While connected every request is satisfied by the open connection.
-    EXPECT_TRUE(m_harness.ConnectToTarget(u"no such handset"_s));
-    EXPECT_EQ(Connected(), u"Beta-5678"_s);
-}
-
-TEST_F(HarnessTargetTest, NoMatchingHandsetNamesTheStoredTarget)
+TEST_F(HarnessTargetTest, NoMatchingHandsetNamesTheStoredTargetAndAMatchThatDoesNotConnectGivesWayToTheNext)
 {
     m_harness.SetTarget(u"Delta"_s);
     EXPECT_FALSE(m_harness.IsTargetAvailable());
@@ -79,14 +63,23 @@ TEST_F(HarnessTargetTest, NoMatchingHandsetNamesTheStoredTarget)
     EXPECT_FALSE(m_harness.CopyFileFromDevice(u"fs:/a.txt"_s, WorkPath(u"a.txt"_s)));
     EXPECT_EQ(m_log.Text(), u"Target Delta not found."_s.repeated(3));
 
-    AddHandset(u"Alpha-1234"_s, u"Phone"_s, QString(), true);
+    AddHandset(u"Alpha-1234"_s, u"Kesto Phone"_s, QString(), true);
     EXPECT_TRUE(m_harness.IsTargetAvailable());
     EXPECT_FALSE(m_harness.ConnectToTarget(u"alpha"_s));
     EXPECT_TRUE(m_log.Text().endsWith(u"Target Delta not found."_s));
     EXPECT_EQ(HarnessTestAccess::Device(m_harness), nullptr);
+
+    AddHandset(u"Beta-5678"_s, u"Kesto Phone"_s);
+    ASSERT_TRUE(m_harness.ConnectToTarget(u"kesto"_s));
+    EXPECT_EQ(Connected(), u"Beta-5678"_s);
+    EXPECT_TRUE(m_log.Text().contains(u"Gateway could not connect to device Alpha-1234."_s));
+    EXPECT_TRUE(m_log.Text().endsWith(u"Connected to target: Beta-5678"_s));
+    // While connected every request is satisfied by the open connection.
+    EXPECT_TRUE(m_harness.ConnectToTarget(u"no such handset"_s));
+    EXPECT_EQ(Connected(), u"Beta-5678"_s);
 }
 
-TEST_F(HarnessTargetTest, ConnectingFillsTheHandsetEntriesOfTheEnvironment)
+TEST_F(HarnessTargetTest, ConnectingFillsTheHandsetEntriesOfTheEnvironmentOnce)
 {
     AddHandset(u"My Phone:1"_s, u"Phone"_s, u"Kesto 4.2"_s);
     AddHandset(u"Other"_s, u"Other"_s);
@@ -102,18 +95,17 @@ TEST_F(HarnessTargetTest, ConnectingFillsTheHandsetEntriesOfTheEnvironment)
     EXPECT_EQ(Connected(), u"Other"_s);
     EXPECT_EQ(Env().value(u"LogPath"_s), TestDirectories::GetLogDirectory(u"My Phone:1"_s));
     EXPECT_EQ(Env().value(u"KestoVersion"_s), u"Kesto 4.2"_s);
-}
 
-TEST_F(HarnessTargetTest, LogOutputPathSetBeforeConnectingIsKept)
-{
-    AddHandset(u"Alpha"_s, u"Phone"_s);
+    // A log folder set beforehand is kept, and a handset without a version text adds none.
+    Harness preset;
     const QString logs = WorkPath(u"my logs"_s);
-    m_harness.SetLogOutputPath(logs);
-    ASSERT_TRUE(m_harness.ConnectToTarget(QString()));
-    EXPECT_EQ(Env().value(u"LogPath"_s), logs);
-    EXPECT_TRUE(Env().contains(u"ProcessedResultsPath"_s));
-    // A handset without a version text adds none.
-    EXPECT_FALSE(Env().contains(u"KestoVersion"_s));
+    preset.SetLogOutputPath(logs);
+    preset.SetTarget(u"other"_s);
+    ASSERT_TRUE(preset.ConnectToTarget(QString()));
+    EXPECT_EQ(HarnessTestAccess::Environment(preset).value(u"LogPath"_s), logs);
+    EXPECT_TRUE(HarnessTestAccess::Environment(preset).contains(u"ProcessedResultsPath"_s));
+    EXPECT_FALSE(HarnessTestAccess::Environment(preset).contains(u"KestoVersion"_s));
+    preset.DisconnectTarget();
 }
 
 TEST_F(HarnessTargetTest, SetTargetKeepsTheConnectionForTheSameNameAndDisconnectingAllowsAnother)
