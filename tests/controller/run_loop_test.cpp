@@ -227,32 +227,24 @@ TEST_F(RunLoopTest, UnknownFrameworkAndFailedStartSkipTheModuleAndTheRunGoesOn)
     EXPECT_FALSE(log.contains(u"Removing test Silent"_s));
 }
 
-TEST_F(RunLoopTest, NoDeleteKeepsModulesAndCopyDelayPausesBeforeEachCopy)
+TEST_F(RunLoopTest, NoDeleteKeepsModulesCopyDelayPausesBeforeEachCopyAndTestCasesGoToTheFirstModuleOnly)
 {
     m_harness.SetNoDelete(true);
     m_harness.SetCopyDelay(u"1500"_s);
-    QSharedPointer<RecordingModule> a = Queue(u"A"_s, u"ctf"_s);
-    QSharedPointer<RecordingModule> b = Queue(u"B"_s, u"ctf"_s);
-
-    EXPECT_TRUE(m_harness.Run());
-    EXPECT_FALSE(m_events.join(u',').contains(u"remove"_s));
-    EXPECT_EQ(m_log.Text().count(u"   Sleeping 1500 Milliseconds\n"_s), 2);
-    for (const auto &module : {a, b})
-        EXPECT_GE(module->copyTime - module->pollTimes.last(), 1500);
-}
-
-TEST_F(RunLoopTest, TestCasesGoToTheFirstModuleOnlyAndTheRunOptionToAll)
-{
     m_harness.SetTestCases({u"t1"_s, u"t2"_s});
     m_harness.SetRunOption(u"-fast"_s);
     QSharedPointer<RecordingModule> second = Queue(u"B"_s, u"ctf"_s);
     QSharedPointer<RecordingModule> first = Queue(u"A"_s, u"ctf"_s);
 
     EXPECT_TRUE(m_harness.Run());
+    EXPECT_FALSE(m_events.join(u',').contains(u"remove"_s));
+    EXPECT_EQ(m_log.Text().count(u"   Sleeping 1500 Milliseconds\n"_s), 2);
+    for (const auto &module : {first, second}) {
+        EXPECT_GE(module->copyTime - module->pollTimes.last(), 1500);
+        EXPECT_EQ(module->seenRunOption, u"-fast"_s);
+    }
     EXPECT_EQ(first->seenTestCases, (QStringList{u"t1"_s, u"t2"_s}));
     EXPECT_TRUE(second->seenTestCases.isEmpty());
-    EXPECT_EQ(first->seenRunOption, u"-fast"_s);
-    EXPECT_EQ(second->seenRunOption, u"-fast"_s);
     EXPECT_TRUE(HarnessTestAccess::TestCases(m_harness).isEmpty());
 }
 
@@ -326,7 +318,7 @@ TEST_F(RunLoopTest, FrameworksAreFoundInAnyCaseButLoadedByTheirExactName)
     EXPECT_TRUE(m_log.Text().contains(u"Load Error: Kestix framework package for arm not found.\n"_s));
 }
 
-TEST_F(RunLoopTest, SecondaryModulesComeFromBothCataloguesBeforeTheModuleStarts)
+TEST_F(RunLoopTest, SecondaryModulesComeFromBothCataloguesBeforeTheModuleStartsAndByNameTheKitModuleRuns)
 {
     QSharedPointer<RecordingModule> module(new RecordingModule(u"Main"_s, u"ctf"_s, &m_events));
     module->secondaryModules = {u"Both"_s, u"Nowhere"_s};
@@ -341,32 +333,13 @@ TEST_F(RunLoopTest, SecondaryModulesComeFromBothCataloguesBeforeTheModuleStarts)
         "Loading Secondary Modules\n   Loading Secondary Module from KVK: Both\n"
         "   Loading Secondary Module from PVS: Both\n   Warning: Secondary Module Nowhere not found.\n")));
     EXPECT_FALSE(m_harness.Run(QSharedPointer<_TestModule>()));
-}
 
-TEST_F(RunLoopTest, RunByNameTakesTheKitModule)
-{
+    // By name, the kit's module runs.
+    m_events.clear();
     Queue(u"Named"_s, u"ctf"_s);
     EXPECT_TRUE(m_harness.Run(u"NAMED"_s));
     EXPECT_FALSE(m_harness.Run(u"unknown"_s));
     EXPECT_EQ(m_events, QStringList{u"run Named"_s});
-}
-
-TEST_F(RunLoopTest, LogFilePathsComeFromTheModuleAndNothingRunsOrLoadsWithoutAHandset)
-{
-    QSharedPointer<RecordingModule> module = Queue(u"A"_s, u"ctf"_s);
-    QStringList paths{u"stale"_s};
-    EXPECT_EQ(m_harness.GetLogFilePaths(module, paths), 2u);
-    EXPECT_EQ(paths, (QStringList{u"fs:/a.log"_s, u"fs:/b.log"_s}));
-
-    m_harness.SetTarget(u"nothing-like-this"_s);
-    EXPECT_EQ(m_harness.GetLogFilePaths(module, paths), 0u);
-    EXPECT_TRUE(paths.isEmpty());
-    EXPECT_FALSE(m_harness.Run());
-    EXPECT_TRUE(m_log.Text().contains(u"Target nothing-like-this not found."_s));
-    EXPECT_FALSE(m_harness.Unload(m_ctf));
-    EXPECT_FALSE(m_harness.Load(m_ctf));
-    EXPECT_TRUE(m_events.isEmpty());
-    EXPECT_TRUE(m_log.Text().contains(u"Load Error: A device is not available.\n"_s));
 }
 
 // Hands out modules in the order given and records how each ended.
