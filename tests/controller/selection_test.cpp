@@ -74,8 +74,12 @@ TEST_F(FeatureListTest, FeaturesSelectTheirModulesAndUnknownNamesAreWarnedOneByO
     }
 }
 
-TEST_F(FeatureListTest, PlatformOnlySelectionDrawsOnThePlatformCatalogue)
+TEST_F(FeatureListTest, FilterSelectionAppendsKitThenPlatformAndAPlatformOnlySelectionDrawsOnThePlatformAlone)
 {
+    Modules kept{QSharedPointer<_TestModule>(new ScriptedModule(u"kept"_s))};
+    EXPECT_EQ(m_harness.GetTestModules(kept, QStringList{u"foo*"_s}, QString(), QString()), 3u);
+    EXPECT_EQ(Names(kept), (QStringList{u"kept"_s, u"Foo"_s, u"FooPlus"_s}));
+
     HarnessTestAccess::SetKitNotSelected(m_harness, true);
     const QString path = Features("<f><feature testModule=\"Foo\"/><feature testModule=\"FooPlus\"/></f>");
     Modules modules;
@@ -86,13 +90,6 @@ TEST_F(FeatureListTest, PlatformOnlySelectionDrawsOnThePlatformCatalogue)
     Modules filtered;
     EXPECT_EQ(m_harness.GetTestModules(filtered, QStringList{u"*"_s}, QString(), QString()), 2u);
     EXPECT_EQ(Names(filtered), (QStringList{u"FooPlus"_s, u"Shell"_s}));
-}
-
-TEST_F(FeatureListTest, FilterSelectionAppendsKitThenPlatform)
-{
-    Modules modules{QSharedPointer<_TestModule>(new ScriptedModule(u"kept"_s))};
-    EXPECT_EQ(m_harness.GetTestModules(modules, QStringList{u"foo*"_s}, QString(), QString()), 3u);
-    EXPECT_EQ(Names(modules), (QStringList{u"kept"_s, u"Foo"_s, u"FooPlus"_s}));
 }
 
 TEST_F(FeatureListTest, BadFeatureFilesSelectNothingAndSayWhy)
@@ -178,7 +175,7 @@ TEST_F(CatalogueSetupTest, StaleKitCacheIsRegeneratedAndTheDefaultDevicePackTake
     EXPECT_FALSE(second.Text().contains(u"Generating manifest"_s));
 }
 
-TEST_F(CatalogueSetupTest, DevicePackGivenBeforehandIsKept)
+TEST_F(CatalogueSetupTest, DevicePackGivenBeforehandIsKeptAndGenerateManifestWritesEachCatalogueToItsCache)
 {
     const QString pack = m_run.Path(u"mine.dso"_s);
     WriteFile(pack, "<dso/>");
@@ -188,17 +185,12 @@ TEST_F(CatalogueSetupTest, DevicePackGivenBeforehandIsKept)
     m_harness.GetTestModules(modules, QStringList(), QString(), QString());
     EXPECT_FALSE(m_log.Text().contains(u"Using the default device pack."_s));
     EXPECT_EQ(HarnessTestAccess::Environment(m_harness).value(u"DevicePack"_s), QDir::cleanPath(pack));
-}
 
-TEST_F(CatalogueSetupTest, GenerateManifestWritesEachCatalogueToItsCache)
-{
-    ChooseBoth(m_harness);
     EXPECT_TRUE(m_harness.GenerateManifest(QString()));
     Manifest kit(KitPath(), false);
     Manifest platform(PlatformPath(), true);
-    const QString log = m_log.Text();
-    EXPECT_TRUE(log.contains(u"Manifest written to "_s + kit.ManifestFilePath()));
-    EXPECT_TRUE(log.contains(u"Manifest written to "_s + platform.ManifestFilePath()));
+    EXPECT_TRUE(m_log.Text().contains(u"Manifest written to "_s + kit.ManifestFilePath()));
+    EXPECT_TRUE(m_log.Text().contains(u"Manifest written to "_s + platform.ManifestFilePath()));
     EXPECT_TRUE(kit.ReadManifest());
     EXPECT_TRUE(kit.FindTestModule(u"audio"_s));
 }

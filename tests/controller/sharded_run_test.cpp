@@ -161,8 +161,15 @@ TEST_F(ShardedRunTest, AHandsetGoingOfflineHandsItsModuleToTheOthers)
     EXPECT_EQ(onH2.value(interrupted + u"/first"_s), u"unexecuted"_s);
 }
 
-TEST_F(ShardedRunTest, WhenEveryHandsetIsGoneTheModulesLeftAreListed)
+TEST_F(ShardedRunTest, NothingToRunOrNoHandsetIsRefusedAndWhenEveryHandsetIsGoneTheModulesLeftAreListed)
 {
+    ShardedRun unstaffed(m_run.log());
+    EXPECT_FALSE(unstaffed.Run({}));
+    EXPECT_TRUE(m_run.LogText().contains(u"No modules to run."_s));
+    EXPECT_FALSE(unstaffed.Run(m_run.Select()));
+    EXPECT_TRUE(m_run.LogText().contains(u"No handsets to run on.\n"_s));
+    EXPECT_EQ(unstaffed.NotRun().size(), kCtfModules + kAppletModules);
+
     const QStringList handsets = m_run.AddHandsets(3);
     WriteFile(m_run.HandsetFolder(u"h1"_s) + u"/drop-at"_s, "2\n");
     WriteFile(m_run.HandsetFolder(u"h2"_s) + u"/drop-at"_s, "1\n");
@@ -185,16 +192,6 @@ TEST_F(ShardedRunTest, WhenEveryHandsetIsGoneTheModulesLeftAreListed)
         EXPECT_EQ(module.ran, !notRun.contains(module.name)) << module.name.toStdString();
     EXPECT_TRUE(
         m_run.LogText().contains(u"Every handset has dropped out; %1 modules never ran: "_s.arg(notRun.size())));
-}
-
-TEST_F(ShardedRunTest, NothingToRunOrNoHandsetIsRefused)
-{
-    ShardedRun run(m_run.log());
-    EXPECT_FALSE(run.Run({}));
-    EXPECT_TRUE(m_run.LogText().contains(u"No modules to run."_s));
-    EXPECT_FALSE(run.Run(m_run.Select()));
-    EXPECT_TRUE(m_run.LogText().contains(u"No handsets to run on.\n"_s));
-    EXPECT_EQ(run.NotRun().size(), kCtfModules + kAppletModules);
 }
 
 } // namespace
