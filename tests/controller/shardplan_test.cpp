@@ -182,7 +182,7 @@ ModuleTimings::Run At(qint64 ms, const QString &host, int minute)
     return {ms, u"h1"_s, host, QDateTime(QDate(2026, 12, 6), QTime(20, minute), QTimeZone::utc())};
 }
 
-TEST(ModuleTimingsTest, RecordsMergesAndKeepsTheRecentRuns)
+TEST(ModuleTimingsTest, RecordsMergesAndKeepsTheRecentRunsAndRefusesBadOrForeignFiles)
 {
     QTemporaryDir dir;
     const QString a = dir.filePath(u"a/Timings.json"_s);
@@ -218,11 +218,8 @@ TEST(ModuleTimingsTest, RecordsMergesAndKeepsTheRecentRuns)
     ASSERT_TRUE(again.Read(merged));
     EXPECT_EQ(again.Runs(u"Audio"_s, u"KVK"_s), runs);
     EXPECT_EQ(ModuleTimings::PathFor(u"h1"_s).section(u'/', -3), u"Logs/ProcessedResults/Timings.json"_s);
-}
 
-TEST(ModuleTimingsTest, RefusesBadOrForeignFilesAndLosesNothing)
-{
-    QTemporaryDir dir;
+    // Bad or foreign files are refused and lose nothing.
     const QString path = dir.filePath(u"Timings.json"_s);
     const QString good = dir.filePath(u"good.json"_s);
     ASSERT_TRUE(ModuleTimings::Record(good, u"Audio"_s, u"KVK"_s, At(10, u"a"_s, 0)));
@@ -243,18 +240,17 @@ TEST(ModuleTimingsTest, RefusesBadOrForeignFilesAndLosesNothing)
     };
     for (const auto &[bytes, message] : rows) {
         WriteFile(path, bytes);
-        ModuleTimings timings;
-        ASSERT_TRUE(timings.Read(good));
-        EXPECT_FALSE(timings.Merge(path)) << message;
-        EXPECT_TRUE(timings.ErrorString().contains(QLatin1String(message))) << timings.ErrorString().toStdString();
-        EXPECT_EQ(timings.ExpectedMs(u"Audio"_s, u"KVK"_s), 10) << message;
-        QString error;
+        ModuleTimings held;
+        ASSERT_TRUE(held.Read(good));
+        EXPECT_FALSE(held.Merge(path)) << message;
+        EXPECT_TRUE(held.ErrorString().contains(QLatin1String(message))) << held.ErrorString().toStdString();
+        EXPECT_EQ(held.ExpectedMs(u"Audio"_s, u"KVK"_s), 10) << message;
         EXPECT_FALSE(ModuleTimings::Record(path, u"B"_s, u"KVK"_s, At(1, u"a"_s, 1), &error)) << message;
         EXPECT_EQ(ReadFile(path), bytes) << message;
     }
-    ModuleTimings timings;
-    EXPECT_FALSE(timings.Read(dir.filePath(u"missing.json"_s)));
-    EXPECT_TRUE(timings.ErrorString().contains(u"cannot open"_s));
+    ModuleTimings none;
+    EXPECT_FALSE(none.Read(dir.filePath(u"missing.json"_s)));
+    EXPECT_TRUE(none.ErrorString().contains(u"cannot open"_s));
 }
 
 } // namespace
