@@ -126,7 +126,14 @@ protected:
         ASSERT_TRUE(m_run.KitOk() && m_platform.Ok());
     }
 
-    static kitbuilder::Module Module(const QString &name) { return {u"ctf"_s, name, {}, {}, {name + u"_a"_s}}; }
+    // A CTF module with one test case.
+    static kitbuilder::Module Module(const QString &name)
+    {
+        kitbuilder::Module module;
+        module.name = name;
+        module.testCases = {name + u"_a"_s};
+        return module;
+    }
 
     QString KitPath() const { return m_run.Path(u"kit"_s); }
     void ChooseBoth(Harness &harness) const

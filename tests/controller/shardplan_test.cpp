@@ -109,7 +109,7 @@ TEST(ShardSettingTest, ReadsOptionsAndEngineVariables)
     const struct
     {
         const char *what, *index, *count, *variables, *error;
-        int expectedIndex, expectedCount;
+        int expectedIndex = 0, expectedCount = 0;
     } rows[] = {
         {"nothing", nullptr, nullptr, "", nullptr, -1, 1},
         {"options", "2", "5", "", nullptr, 2, 5},
