@@ -10,11 +10,6 @@ namespace {
 
 using Env = QMap<QString, QString>;
 
-const Env &EnvOf(Harness &harness)
-{
-    return HarnessTestAccess::Environment(harness);
-}
-
 // Each test gets its own data root, so caches never leak between tests.
 class HarnessEnvironmentTest : public ::testing::Test
 {
@@ -27,6 +22,7 @@ protected:
         m_harness.SetLogger(m_log.log());
     }
     QString RootPath(const QString &name) const { return m_root.filePath(name); }
+    static Env &EnvOf(Harness &harness) { return HarnessTestAccess::Environment(harness); }
 
     // A source file last modified an hour ago, so that a cache written now is newer.
     QString OldFile(const QString &name, const QByteArray &content)
@@ -179,11 +175,6 @@ protected:
         m_vars.Set("KESTIX_TESTSETS_ALL", RootPath(u"kits"_s));
         m_vars.Set("KESTIX_TESTSET", RootPath(u"kits/KitTwo"_s));
     }
-    QString Kit(const char *name) const { return RootPath(u"kits/"_s + QLatin1String(name)); }
-    QString PlatformDir(const char *name) const
-    {
-        return RootPath(u"platforms/"_s + QLatin1String(name) + u"/pvs/platform"_s);
-    }
     bool RunSetup() { return HarnessTestAccess::SetupEnvironment(m_harness); }
 
     EnvGuard m_vars;
@@ -234,13 +225,13 @@ TEST_F(HarnessSetupTest, SettingUpAgainKeepsTheRunAndTheUnselectedKitUntilTheHos
     ASSERT_FALSE(HarnessTestAccess::EnvironmentReady(m_harness));
     ASSERT_TRUE(RunSetup());
     EXPECT_TRUE(HarnessTestAccess::KitNotSelected(m_harness));
-    EXPECT_EQ(m_harness.GetPlatform(), PlatformDir("Alpha Pro"));
+    EXPECT_EQ(m_harness.GetPlatform(), RootPath(u"platforms/Alpha Pro/pvs/platform"_s));
     const QString familyRunId = EnvOf(m_harness).value(u"TestRunID"_s);
     EXPECT_NE(familyRunId, runId);
 
     m_harness.SetTestkit(u"other"_s);
     ASSERT_TRUE(RunSetup());
-    EXPECT_EQ(m_harness.GetTestkit(), Kit("Other"));
+    EXPECT_EQ(m_harness.GetTestkit(), RootPath(u"kits/Other"_s));
     EXPECT_FALSE(HarnessTestAccess::KitNotSelected(m_harness));
     EXPECT_NE(EnvOf(m_harness).value(u"TestRunID"_s), familyRunId);
 }

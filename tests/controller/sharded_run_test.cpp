@@ -42,11 +42,8 @@ protected:
     QMap<QString, QStringList> Completions() const
     {
         QMap<QString, QStringList> done;
-        for (const QString &line : m_run.Runs()) {
-            const QStringList words = line.split(u' ');
-            if (words.size() == 3 && words.at(0) == u"done"_s)
-                done[words.at(1)].append(words.at(2));
-        }
+        for (const QString &line : m_run.Runs().filter(QRegularExpression(u"^done \\S+ \\S+$"_s)))
+            done[line.section(u' ', 1, 1)].append(line.section(u' ', 2));
         return done;
     }
 
@@ -88,10 +85,8 @@ TEST_F(ShardedRunTest, FourHandsetsShareTheQueueAndMatchAOneHandsetRun)
     EXPECT_GT(byHandset.size(), 1);
 
     const QMap<QString, QStringList> done = Completions();
-    for (const QString &name : m_names) {
-        // Once on the solo handset, once on one of the four.
+    for (const QString &name : m_names) // once on the solo handset, once on one of the four
         EXPECT_EQ(done.value(name).size(), 2) << name.toStdString();
-    }
     for (const ShardedRun::HandsetResult &handset : run.Handsets()) {
         EXPECT_TRUE(handset.connected);
         EXPECT_FALSE(handset.lost);
