@@ -54,18 +54,18 @@ TEST_F(HarnessCompileTest, UpperCaseKsxIsConvertedThenCompiledWithItsNamePassedU
 TEST_F(HarnessCompileTest, OnlyKsxIsConvertedAndAFailedStepKeepsTheSourceAndNoIntermediate)
 {
     m_toolset.InstallCompiler();
+    // The source, the toolset flag that fails a step (or null), what the compiler reads ("car": the converted
+    // intermediate) and whether the compile succeeds.
     const struct
     {
-        const char *source;
-        const char *failing; // the toolset flag, or null
+        const char *source, *failing, *compileInput;
         bool compiled;
-        const char *compileInput; // "car" for the converted intermediate
     } rows[] = {
-        {"data.kar", nullptr, true, "data.kar"},
-        {"data.ksx.txt", nullptr, true, "data.ksx.txt"},
-        {"ksx", nullptr, true, "ksx"},
-        {"strings.ksx", "convert_fails", true, "strings.ksx"},
-        {"strings.ksx", "compile_fails", false, "car"},
+        {"data.kar", nullptr, "data.kar", true},
+        {"data.ksx.txt", nullptr, "data.ksx.txt", true},
+        {"ksx", nullptr, "ksx", true},
+        {"strings.ksx", "convert_fails", "strings.ksx", true},
+        {"strings.ksx", "compile_fails", "car", false},
     };
     for (const auto &row : rows) {
         SCOPED_TRACE(row.source + std::string(" ") + (row.failing ? row.failing : ""));

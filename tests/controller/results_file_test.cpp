@@ -284,15 +284,9 @@ TEST_F(ProcessedResultsDocument, LongRunsOfRenamesAndNewCasesMatchTheRules)
             model.append({reported, verdict});
             continue;
         }
-        QPair<QString, QString> found = model.at(match);
-        found.second = ProcessedResults::Precedence(found.second, verdict);
-        if (found.first != reported) {
-            found.first = reported;
-            model.removeAt(match);
-            model.append(found);
-        } else {
-            model[match] = found;
-        }
+        model[match].second = ProcessedResults::Precedence(model.at(match).second, verdict);
+        if (model.at(match).first != reported)
+            model.append({reported, model.takeAt(match).second});
     }
     ASSERT_TRUE(results.Save());
 
