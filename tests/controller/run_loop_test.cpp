@@ -109,6 +109,25 @@ struct Watcher : RunObserver
     QMap<QString, ModuleRecord> ended;
 };
 
+// Hands out modules in the order given and records how each ended.
+class RecordingSource : public ModuleSource
+{
+public:
+    RecordingSource(const QList<QSharedPointer<_TestModule>> &modules, bool keep) : m_modules(modules), m_keep(keep) { }
+    QSharedPointer<_TestModule> Next() override { return m_modules.isEmpty() ? nullptr : m_modules.takeFirst(); }
+    void Finished(const QSharedPointer<_TestModule> &module, Outcome outcome) override
+    {
+        outcomes.append(module->moduleName + u' ' + QString::number(int(outcome)));
+    }
+    bool KeepFrameworks() const override { return m_keep; }
+
+    QStringList outcomes;
+
+private:
+    QList<QSharedPointer<_TestModule>> m_modules;
+    bool m_keep;
+};
+
 class RunLoopTest : public CatalogueHarnessTest
 {
 protected:
@@ -235,7 +254,7 @@ TEST_F(RunLoopTest, NoDeleteKeepsModulesCopyDelayPausesBeforeEachCopyAndTestCase
     EXPECT_TRUE(HarnessTestAccess::TestCases(m_harness).isEmpty());
 }
 
-TEST_F(RunLoopTest, LogIsPolledEverySecondOnHandsetsAQuarterSecondOnSimulatorsAndCopiedAfterTenMinutes)
+TEST_F(RunLoopTest, LogIsPolledEachSecondOrQuarterSecondOnSimulatorsAndCopiedAfterTenMinutesOrDroppedPastTheLimit)
 {
     QSharedPointer<RecordingModule> slow = Queue(u"Slow"_s, u"ctf"_s);
     slow->pollsNeeded = 3;
@@ -260,25 +279,26 @@ TEST_F(RunLoopTest, LogIsPolledEverySecondOnHandsetsAQuarterSecondOnSimulatorsAn
     ASSERT_EQ(simulated->pollTimes.size(), 2);
     EXPECT_GE(simulated->pollTimes[1] - simulated->pollTimes[0], 250);
     EXPECT_LT(simulated->pollTimes[1] - simulated->pollTimes[0], 500);
-}
 
-TEST_F(RunLoopTest, AModulePastTheTimeLimitIsRemovedUncopiedAndTheObserverSeesItsWait)
-{
-    QSharedPointer<RecordingModule> stuck = Queue(u"Stuck"_s, u"ctf"_s);
+    // Past a time limit, a module is removed uncopied and the observer sees its wait.
+    m_harness.SetTarget(u"phone"_s);
+    m_events.clear();
+    m_watcher.events.clear();
+    QSharedPointer<RecordingModule> stuck = Queue(u"Stopped"_s, u"ctf"_s);
     stuck->pollsNeeded = 1000000;
-    Queue(u"Zeta"_s, u"ctf"_s);
     m_harness.SetModuleTimeLimit(5000);
-    EXPECT_TRUE(m_harness.Run());
-    EXPECT_EQ(m_watcher.events, (QStringList{u"start Stuck"_s, u"end Stuck"_s, u"start Zeta"_s, u"end Zeta"_s}));
-    EXPECT_TRUE(m_watcher.waits.contains(u"Stuck its log"_s));
-    const ModuleRecord timedOut = m_watcher.ended.value(u"Stuck"_s);
+    RecordingSource source({stuck, Queue(u"Zeta"_s, u"ctf"_s)}, false);
+    ASSERT_TRUE(m_harness.Run(source));
+    EXPECT_EQ(m_watcher.events, (QStringList{u"start Stopped"_s, u"end Stopped"_s, u"start Zeta"_s, u"end Zeta"_s}));
+    EXPECT_TRUE(m_watcher.waits.contains(u"Stopped its log"_s));
+    const ModuleRecord timedOut = m_watcher.ended.value(u"Stopped"_s);
     EXPECT_EQ(timedOut.outcome, ModuleSource::TimedOut);
     EXPECT_GT(timedOut.durationMs, 5000);
     EXPECT_LT(timedOut.durationMs, 6500);
     EXPECT_EQ(timedOut.Reason(), u"stopped after its time limit of 5 s"_s);
     EXPECT_LT(stuck->pollTimes.size(), 10);
-    EXPECT_TRUE(m_events.contains(u"remove Stuck"_s));
-    EXPECT_FALSE(m_events.contains(u"copy Stuck"_s));
+    EXPECT_TRUE(m_events.contains(u"remove Stopped"_s));
+    EXPECT_FALSE(m_events.contains(u"copy Stopped"_s));
     EXPECT_EQ(m_watcher.ended.value(u"Zeta"_s).outcome, ModuleSource::Recorded);
 }
 
@@ -328,25 +348,6 @@ TEST_F(RunLoopTest, SecondaryModulesComeFromBothCataloguesBeforeTheModuleStartsA
     EXPECT_FALSE(m_harness.Run(u"unknown"_s));
     EXPECT_EQ(m_events, QStringList{u"run Named"_s});
 }
-
-// Hands out modules in the order given and records how each ended.
-class RecordingSource : public ModuleSource
-{
-public:
-    RecordingSource(const QList<QSharedPointer<_TestModule>> &modules, bool keep) : m_modules(modules), m_keep(keep) { }
-    QSharedPointer<_TestModule> Next() override { return m_modules.isEmpty() ? nullptr : m_modules.takeFirst(); }
-    void Finished(const QSharedPointer<_TestModule> &module, Outcome outcome) override
-    {
-        outcomes.append(module->moduleName + u' ' + QString::number(int(outcome)));
-    }
-    bool KeepFrameworks() const override { return m_keep; }
-
-    QStringList outcomes;
-
-private:
-    QList<QSharedPointer<_TestModule>> m_modules;
-    bool m_keep;
-};
 
 TEST_F(RunLoopTest, SourceRunKeepsFrameworksUntilTheEndWhenAsked)
 {

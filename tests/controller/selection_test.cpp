@@ -202,33 +202,30 @@ TEST_F(CatalogueSetupTest, DevicePackGivenBeforehandIsKeptAndGenerateManifestWri
     EXPECT_TRUE(kit.FindTestModule(u"audio"_s));
 }
 
-TEST_F(CatalogueSetupTest, GenerateManifestToARelativePathCreatesItsFolder)
+TEST_F(CatalogueSetupTest, GenerateManifestCreatesTheFolderOfARelativePathOrFallsBackToTheHomeFolderOrFails)
 {
-    CurrentDirectory cwd(m_run.Path(u"."_s));
-    m_harness.SetTestkit(KitPath());
-    EXPECT_TRUE(m_harness.GenerateManifest(u"out/sub/kit.xml"_s));
+    ChooseBoth(m_harness);
+    {
+        CurrentDirectory cwd(m_run.Path(u"."_s));
+        EXPECT_TRUE(m_harness.GenerateManifest(u"out/sub/kit.xml"_s));
+    }
     const QString written = m_run.Path(u"out/sub/kit.xml"_s);
     EXPECT_TRUE(m_log.Text().contains(u"Manifest "_s + KitPath() + u" written to "_s + written));
     QDomDocument document;
     ASSERT_TRUE(document.setContent(ReadFile(written)));
     EXPECT_EQ(document.documentElement().tagName(), u"testkit"_s);
-}
 
-TEST_F(CatalogueSetupTest, GenerateManifestFallsBackToTheHomeFolderOrFails)
-{
     const QString home = m_run.Path(u"home"_s);
     QDir().mkpath(home);
     EnvGuard homeGuard("HOME", home);
     // A regular file stands where the output folder should be.
     WriteFile(m_run.Path(u"blocked"_s), "x");
-    ChooseBoth(m_harness);
     EXPECT_TRUE(m_harness.GenerateManifest(m_run.Path(u"blocked/kits.xml"_s)));
 
     const QString fallback = QDir::cleanPath(home + u"/kits.xml"_s);
     EXPECT_TRUE(m_log.Text().contains(u"Manifest "_s + PlatformPath() + u" written to "_s + fallback));
     // Both catalogues went to the one file; the platform's came last.
     Manifest platform(PlatformPath(), true);
-    QDomDocument document;
     ASSERT_TRUE(document.setContent(ReadFile(fallback)));
     EXPECT_EQ(document.documentElement().attribute(u"path"_s), platform.kitPath);
 
