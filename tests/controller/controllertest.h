@@ -17,7 +17,8 @@ using namespace Qt::StringLiterals;
 
 namespace controllertest {
 
-// A module whose log parser answers with a prepared record, and whose run steps only count their calls.
+// A module whose log parser answers with a prepared record (or fails when it must not parse), and whose run steps
+// do nothing.
 class ScriptedModule : public _TestModule
 {
 public:
@@ -27,14 +28,7 @@ public:
     bool Run(IKestoDevice *, const QMap<QString, QString> &) override { return true; }
     bool GetLogFilePaths(IKestoDevice *, QStringList &) override { return false; }
     bool IsLogComplete(IKestoDevice *) override { return true; }
-    bool ParseLog(TestResults &results) override
-    {
-        ++parseCalls;
-        if (!parses)
-            return false;
-        results = parsed;
-        return true;
-    }
+    bool ParseLog(TestResults &results) override { return parses && (results = parsed, true); }
     bool ParseLog(const QString &, TestResults &) override { return false; }
     void PostProcess(QMap<QString, QString> &) override { }
     QString ModuleName() override { return moduleName; }
@@ -50,7 +44,6 @@ public:
     }
 
     bool parses = true;
-    int parseCalls = 0;
     TestResults parsed;
 
 private:
