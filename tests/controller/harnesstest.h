@@ -31,10 +31,7 @@ public:
     static IKestoDevice *Device(const Harness &harness) { return harness.m_device; }
     static QString Target(const Harness &harness) { return harness.m_target; }
     static const QStringList &TestCases(const Harness &harness) { return harness.m_testCases; }
-    static void Update(Harness &harness, QSharedPointer<_TestModule> module)
-    {
-        harness.UpdateProcessedModulesXML(module);
-    }
+    static void Update(Harness &harness, QSharedPointer<_TestModule> run) { harness.UpdateProcessedModulesXML(run); }
     // Set-up keeps the catalogues given here.
     static void SetCatalogues(Harness &harness, QSharedPointer<Manifest> kit, QSharedPointer<Manifest> platform)
     {
