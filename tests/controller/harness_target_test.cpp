@@ -13,12 +13,9 @@ protected:
 
     QString HandsetFolder(const QString &name) const { return m_handsets.HandsetFolder(name); }
     QString WorkPath(const QString &name) const { return m_handsets.WorkFolder() + u'/' + name; }
-    void AddHandset(const QString &name, const QString &description, const QString &version = QString(),
-                    bool offline = false)
+    void AddHandset(const QString &name, const QString &description, const QString &version = QString())
     {
         m_handsets.AddHandset(name, description, u"arm"_s, version);
-        if (offline)
-            WriteFile(HandsetFolder(name) + u"/offline"_s, QByteArray());
     }
     QString Connected() const
     {
@@ -63,7 +60,8 @@ TEST_F(HarnessTargetTest, NoMatchingHandsetNamesTheStoredTargetAndAMatchThatDoes
     EXPECT_FALSE(m_harness.CopyFileFromDevice(u"fs:/a.txt"_s, WorkPath(u"a.txt"_s)));
     EXPECT_EQ(m_log.Text(), u"Target Delta not found."_s.repeated(3));
 
-    AddHandset(u"Alpha-1234"_s, u"Kesto Phone"_s, QString(), true);
+    AddHandset(u"Alpha-1234"_s, u"Kesto Phone"_s);
+    WriteFile(HandsetFolder(u"Alpha-1234"_s) + u"/offline"_s, QByteArray());
     EXPECT_TRUE(m_harness.IsTargetAvailable());
     EXPECT_FALSE(m_harness.ConnectToTarget(u"alpha"_s));
     EXPECT_TRUE(m_log.Text().endsWith(u"Target Delta not found."_s));
