@@ -26,8 +26,6 @@ TEST(ResultPrecedence, KeepsTheStrongerVerdict)
             << row[0] << " then " << row[1];
 }
 
-// ---- The results file through the Harness ----
-
 class ResultsFileTest : public CatalogueHarnessTest
 {
 protected:
@@ -194,8 +192,6 @@ TEST_F(ResultsFileTest, GivenResultsPathIsUsedAndItsFolderCreatedOrItsFailureRep
     EXPECT_TRUE(m_log.Text().contains(u"could not"_s));
     EXPECT_TRUE(QFileInfo(taken + u"/inside"_s).isDir());
 }
-
-// ---- The document on its own ----
 
 // A results file "r.xml" of module "M" (hash "#1") without catalogues.
 class ProcessedResultsDocument : public ::testing::Test

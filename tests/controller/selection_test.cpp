@@ -17,8 +17,6 @@ QStringList Names(const Modules &modules)
     return names;
 }
 
-// ---- Feature lists over catalogues held in memory ----
-
 class FeatureListTest : public CatalogueHarnessTest
 {
 protected:
@@ -111,8 +109,6 @@ TEST_F(FeatureListTest, BadFeatureFilesSelectNothingAndSayWhy)
         EXPECT_TRUE(message.match(m_log.Text()).hasMatch()) << m_log.Text().toStdString();
     }
 }
-
-// ---- Catalogues of real kits ----
 
 class CatalogueSetupTest : public ::testing::Test
 {
