@@ -1,8 +1,7 @@
 #pragma once
 
-// Fixture pieces for the selection, run, results and reprocessing tests:
-// access to the Harness's private operations, a scripted test module, and
-// catalogues filled in memory.
+// Fixture pieces for the selection, run, results and reprocessing tests: access to the Harness's private operations, a
+// scripted test module, and catalogues filled in memory.
 
 #include "harnesstest.h"
 
@@ -16,34 +15,10 @@
 
 using namespace Qt::StringLiterals;
 
-// The Harness befriends this class too.
-class HarnessControllerAccess
-{
-public:
-    static QMap<QString, QString> &Environment(Harness &harness) { return harness.m_environment; }
-    static void SetCatalogues(Harness &harness, QSharedPointer<Manifest> kit, QSharedPointer<Manifest> platform)
-    {
-        harness.m_kitManifest = kit;
-        harness.m_platformManifest = platform;
-        // Set-up must not replace the catalogues given here.
-        harness.m_environmentReady = true;
-    }
-    static Manifest *Kit(Harness &harness) { return harness.m_kitManifest.data(); }
-    static Manifest *Platform(Harness &harness) { return harness.m_platformManifest.data(); }
-    static bool SetupManifest(Harness &harness) { return harness.SetupManifest(); }
-    static void Update(Harness &harness, QSharedPointer<_TestModule> module)
-    {
-        harness.UpdateProcessedModulesXML(module);
-    }
-    static bool KitNotSelected(const Harness &harness) { return harness.m_kitNotSelected; }
-    static void SetKitNotSelected(Harness &harness, bool value) { harness.m_kitNotSelected = value; }
-    static const QStringList &TestCases(const Harness &harness) { return harness.m_testCases; }
-};
-
 namespace controllertest {
 
-// A module whose log parser answers with a prepared record, and whose run
-// steps only count their calls.
+// A module whose log parser answers with a prepared record (or fails when it must not parse), and whose run steps
+// do nothing.
 class ScriptedModule : public _TestModule
 {
 public:
@@ -53,14 +28,7 @@ public:
     bool Run(IKestoDevice *, const QMap<QString, QString> &) override { return true; }
     bool GetLogFilePaths(IKestoDevice *, QStringList &) override { return false; }
     bool IsLogComplete(IKestoDevice *) override { return true; }
-    bool ParseLog(TestResults &results) override
-    {
-        ++parseCalls;
-        if (!parses)
-            return false;
-        results = parsed;
-        return true;
-    }
+    bool ParseLog(TestResults &results) override { return parses && (results = parsed, true); }
     bool ParseLog(const QString &, TestResults &) override { return false; }
     void PostProcess(QMap<QString, QString> &) override { }
     QString ModuleName() override { return moduleName; }
@@ -76,7 +44,6 @@ public:
     }
 
     bool parses = true;
-    int parseCalls = 0;
     TestResults parsed;
 
 private:
@@ -98,8 +65,7 @@ inline QSharedPointer<ScriptedModule> CatalogueModule(const QString &name, const
     return module;
 }
 
-// A catalogue held in memory only (its cache folder is created below the
-// test's data root).
+// A catalogue held in memory only (its cache folder is created below the test's data root).
 inline QSharedPointer<Manifest> MakeCatalogue(const QString &path, bool isPlatform,
                                               const QList<QSharedPointer<ScriptedModule>> &modules)
 {
@@ -112,7 +78,29 @@ inline QSharedPointer<Manifest> MakeCatalogue(const QString &path, bool isPlatfo
     return catalogue;
 }
 
-using testutil::ReadResults;
-using testutil::ResultsView;
-
 } // namespace controllertest
+
+using namespace controllertest;
+
+// A Harness logging to a captured log, with catalogues held in memory below a temporary folder.
+class CatalogueHarnessTest : public ::testing::Test
+{
+protected:
+    CatalogueHarnessTest() { m_harness.SetLogger(m_log.log()); }
+
+    // Gives the harness a kit (in the folder kitName) and a platform holding these modules.
+    void UseCatalogues(const QList<QSharedPointer<ScriptedModule>> &kit,
+                       const QList<QSharedPointer<ScriptedModule>> &platform, const QString &kitName = u"kit"_s)
+    {
+        m_kit = MakeCatalogue(m_dir.filePath(kitName), false, kit);
+        m_platform = MakeCatalogue(m_dir.filePath(u"platform"_s), true, platform);
+        HarnessTestAccess::SetCatalogues(m_harness, m_kit, m_platform);
+    }
+    QMap<QString, QString> &Env() { return HarnessTestAccess::Environment(m_harness); }
+
+    QTemporaryDir m_dir;
+    CapturedLog m_log;
+    Harness m_harness;
+    QSharedPointer<Manifest> m_kit;
+    QSharedPointer<Manifest> m_platform;
+};

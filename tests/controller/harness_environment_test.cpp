@@ -4,26 +4,12 @@
 #include "environment/testdirectories.h"
 
 #include <QDateTime>
+#include <QElapsedTimer>
 #include <QUuid>
-
-using namespace Qt::StringLiterals;
 
 namespace {
 
-using harnesstest::CapturedLog;
-using harnesstest::SetModified;
-using harnesstest::Toolset;
-using testutil::CurrentDirectory;
-using testutil::EnvGuard;
-using testutil::ReadFile;
-using testutil::WriteFile;
-
 using Env = QMap<QString, QString>;
-
-const Env &EnvOf(const Harness &harness)
-{
-    return HarnessTestAccess::Environment(harness);
-}
 
 // Each test gets its own data root, so caches never leak between tests.
 class HarnessEnvironmentTest : public ::testing::Test
@@ -37,9 +23,9 @@ protected:
         m_harness.SetLogger(m_log.log());
     }
     QString RootPath(const QString &name) const { return m_root.filePath(name); }
+    static Env &EnvOf(Harness &harness) { return HarnessTestAccess::Environment(harness); }
 
-    // A source file last modified an hour ago, so that a cache written now is
-    // newer.
+    // A source file last modified an hour ago, so that a cache written now is newer.
     QString OldFile(const QString &name, const QByteArray &content)
     {
         const QString path = RootPath(name);
@@ -55,14 +41,107 @@ protected:
     Harness m_harness;
 };
 
-TEST_F(HarnessEnvironmentTest, NewHarnessHoldsExactlyItsThreeEntries)
+using HarnessCompileTest = HarnessEnvironmentTest;
+
+// The name would run commands if it ever reached a shell.
+TEST_F(HarnessCompileTest, UpperCaseKsxIsConvertedThenCompiledWithItsNamePassedUnchangedAndTheCarRemoved)
 {
-    EXPECT_EQ(EnvOf(m_harness),
-              (Env{{u"DataCachePath"_s, TestDirectories::GetTestDataPath()},
-                   {u"KeyDevicePackSpecified"_s, u"false"_s},
-                   {u"TestDataSpecified"_s, u"false"_s}}));
-    EXPECT_TRUE(m_harness.GetTestkit().isEmpty());
-    EXPECT_TRUE(m_harness.GetPlatform().isEmpty());
+    m_toolset.InstallCompiler();
+    m_toolset.InstallAltCompiler();
+    CurrentDirectory cwd(m_root.path());
+    const QString name = u"my data \"q\" 'x' $HOME $(touch injected) `touch injected2`; x"_s;
+    const QString source = RootPath(name + u".KSX"_s);
+    const QString car = RootPath(name + u".car"_s);
+    const QString output = RootPath(u"out $PATH \"1\".kar"_s);
+    WriteFile(source, "<resources/>\n");
+
+    EXPECT_TRUE(m_harness.CompileResource(source, output));
+    const QList<QStringList> calls = m_toolset.Calls();
+    ASSERT_EQ(calls.size(), 2);
+    EXPECT_EQ(calls[0], (QStringList{u"-convert"_s, u"-infile"_s, source, u"-outfile"_s, car}));
+    EXPECT_EQ(calls[1], (QStringList{u"-compile"_s, u"-infile"_s, car, u"-outfile"_s, output}));
+    EXPECT_FALSE(QFileInfo::exists(car));
+    EXPECT_EQ(ReadFile(output), QByteArray("compiled:\n<resources/>\n"));
+    // Only the success lines reach the log, each on a line of its own.
+    EXPECT_EQ(m_log.Text(), u"Successfully converted file %1\nSuccessfully compiled %2\n"_s.arg(source, output));
+
+    const QString altOutput = RootPath(u"dpk $(touch injected3).kar"_s);
+    EXPECT_TRUE(m_harness.AltCompileResource(source, altOutput));
+    EXPECT_EQ(ReadFile(altOutput), QByteArray("<resources/>\n"));
+    EXPECT_EQ(m_toolset.Calls().value(2), (QStringList{u"-nh"_s, u"-o"_s, altOutput, source}));
+    EXPECT_FALSE(m_log.Text().contains(u"Compiliation"_s));
+    for (const char *file : {"injected", "injected2", "injected3"})
+        EXPECT_FALSE(QFileInfo::exists(RootPath(QString::fromLatin1(file)))) << file;
+}
+
+TEST_F(HarnessCompileTest, OnlyKsxIsConvertedAndAFailedStepKeepsTheSourceAndNoIntermediate)
+{
+    m_toolset.InstallCompiler();
+    // The source, the toolset flag that fails a step (or null), what the compiler reads ("car": the converted
+    // intermediate) and whether the compile succeeds.
+    const struct
+    {
+        const char *source, *failing, *compileInput;
+        bool compiled;
+    } rows[] = {
+        {"data.kar", nullptr, "data.kar", true},
+        {"data.ksx.txt", nullptr, "data.ksx.txt", true},
+        {"ksx", nullptr, "ksx", true},
+        {"strings.ksx", "convert_fails", "strings.ksx", true},
+        {"strings.ksx", "compile_fails", "car", false},
+    };
+    for (const auto &row : rows) {
+        SCOPED_TRACE(row.source + std::string(" ") + (row.failing ? row.failing : ""));
+        const QString source = RootPath(QString::fromLatin1(row.source));
+        const QString car = RootPath(u"strings.car"_s);
+        WriteFile(source, "src");
+        if (row.failing)
+            m_toolset.SetFlag(row.failing, true);
+        const qsizetype before = m_toolset.Calls().size();
+        EXPECT_EQ(m_harness.CompileResource(source, RootPath(u"out.kar"_s)), row.compiled);
+        if (row.failing)
+            m_toolset.SetFlag(row.failing, false);
+
+        const QList<QStringList> calls = m_toolset.Calls().mid(before);
+        ASSERT_EQ(calls.size(), source.endsWith(u".ksx"_s) ? 2 : 1);
+        EXPECT_EQ(calls.last().value(0), u"-compile"_s);
+        EXPECT_EQ(calls.last().value(2), qstrcmp(row.compileInput, "car") ? source : car);
+        EXPECT_TRUE(QFileInfo::exists(source));
+        EXPECT_FALSE(QFileInfo::exists(car));
+    }
+    EXPECT_FALSE(m_log.Text().contains(u"conversion error"_s));
+}
+
+TEST_F(HarnessCompileTest, MissingUnstartableOrFailingCompilersFailAtOnceWithTheCommandAndTheToolOutput)
+{
+    const QString source = RootPath(u"strings.ksx"_s);
+    const QString output = RootPath(u"out.kar"_s);
+    WriteFile(source, "src");
+    // A stale output from an earlier run must not pass for a compiled one.
+    WriteFile(output, "stale");
+    const QString failed = u"Device Pack Compiliation failed.\n\tCommand:\"%1\"-nh -o %2 %3\n\n"_s.arg(
+        m_toolset.AltCompilerPath(), output, source);
+
+    QElapsedTimer real;
+    real.start();
+    EXPECT_FALSE(m_harness.CompileResource(source, output));
+    EXPECT_FALSE(m_harness.AltCompileResource(source, output));
+    EXPECT_EQ(m_log.Text(), failed);
+
+    // Present but not executable.
+    WriteFile(m_toolset.CompilerPath(), "#!/bin/sh\necho Successfully compiled\n");
+    WriteFile(m_toolset.AltCompilerPath(), "#!/bin/sh\n");
+    EXPECT_FALSE(m_harness.CompileResource(source, output));
+    EXPECT_FALSE(m_harness.AltCompileResource(source, output));
+    EXPECT_LT(real.elapsed(), 10000);
+
+    // Running but leaving an empty output.
+    m_toolset.InstallAltCompiler();
+    m_toolset.SetFlag("alt_empty", true);
+    const qsizetype logged = m_log.Text().size();
+    EXPECT_FALSE(m_harness.AltCompileResource(source, output));
+    EXPECT_TRUE(QFileInfo::exists(output));
+    EXPECT_EQ(m_log.Text().mid(logged), failed + u"kestorc: syntax error\nstderr line\n"_s);
 }
 
 TEST_F(HarnessEnvironmentTest, TestDataIsCompiledOnceUntilTheSourceIsTouched)
@@ -77,10 +156,7 @@ TEST_F(HarnessEnvironmentTest, TestDataIsCompiledOnceUntilTheSourceIsTouched)
     EXPECT_EQ(EnvOf(m_harness).value(u"TestDataSpecified"_s), u"true"_s);
 
     m_harness.SetTestData(source);
-    Harness other;
-    other.SetTestData(source);
     EXPECT_EQ(m_toolset.Calls().size(), 1);
-    EXPECT_EQ(EnvOf(other).value(u"TestDataCachePath"_s), cache);
 
     WriteFile(source, "v2");
     SetModified(source, QFileInfo(cache).lastModified().addSecs(10));
@@ -111,18 +187,20 @@ TEST_F(HarnessEnvironmentTest, RelativeAndAbsolutePathsShareOneCache)
     EXPECT_EQ(m_toolset.Calls().size(), 2);
 }
 
-TEST_F(HarnessEnvironmentTest, InvalidSourcesAreReportedAndChangeNothing)
+TEST_F(HarnessEnvironmentTest, NewHarnessHoldsExactlyItsThreeEntriesAndInvalidSourcesChangeNothing)
 {
-    const Env before = EnvOf(m_harness);
+    EXPECT_TRUE(m_harness.GetTestkit().isEmpty());
+    EXPECT_TRUE(m_harness.GetPlatform().isEmpty());
     m_harness.SetTestData(RootPath(u"missing.kar"_s));
     m_harness.SetTestData(m_root.path());
     m_harness.SetDPK(QString());
-    EXPECT_EQ(EnvOf(m_harness), before);
+    EXPECT_EQ(EnvOf(m_harness),
+              (Env{{u"DataCachePath"_s, TestDirectories::GetTestDataPath()},
+                   {u"KeyDevicePackSpecified"_s, u"false"_s},
+                   {u"TestDataSpecified"_s, u"false"_s}}));
     EXPECT_EQ(m_log.Text(),
-              QStringLiteral("Test data %1 is not valid.\n"
-                             "Test data %2 is not valid.\n"
-                             "DPK  is not valid.\n")
-                  .arg(RootPath(u"missing.kar"_s), m_root.path()));
+              u"Test data %1 is not valid.\nTest data %2 is not valid.\nDPK  is not valid.\n"_s.arg(
+                  RootPath(u"missing.kar"_s), m_root.path()));
 }
 
 TEST_F(HarnessEnvironmentTest, FailedTestDataCompileDropsTheCacheEntryAndTriesAgainNextTime)
@@ -148,7 +226,7 @@ TEST_F(HarnessEnvironmentTest, FailedTestDataCompileDropsTheCacheEntryAndTriesAg
     EXPECT_EQ(ReadFile(cache), QByteArray("compiled:\nv1"));
 }
 
-TEST_F(HarnessEnvironmentTest, DevicePackIsCompiledAndFlattened)
+TEST_F(HarnessEnvironmentTest, DevicePackIsCompiledAndFlattenedOrOnFailureKeepsItsOtherEntries)
 {
     m_toolset.InstallAltCompiler();
     const QString source = OldFile(u"device.dso"_s, "<device><a/></device>\n");
@@ -169,32 +247,24 @@ TEST_F(HarnessEnvironmentTest, DevicePackIsCompiledAndFlattened)
     m_harness.SetDPK(source);
     EXPECT_EQ(m_toolset.Calls().size(), 1);
     EXPECT_EQ(ReadFile(dso), QByteArray("kept"));
-}
 
-TEST_F(HarnessEnvironmentTest, DevicePackThatFailsKeepsItsOtherEntries)
-{
-    m_toolset.InstallAltCompiler();
+    // A pack that fails keeps its other entries. Not XML, it cannot be flattened either, so the pack itself stands in.
     m_toolset.SetFlag("alt_empty", true);
-    // Not XML: it cannot be flattened either, so the pack itself stands in.
-    const QString source = OldFile(u"device.dso"_s, "not xml <<<");
-    const QString cache = TestDirectories::GetTestDataCacheFilePath(StringHashName(source));
-
-    m_harness.SetDPK(source);
-    const Env &env = EnvOf(m_harness);
+    const QString bad = OldFile(u"bad.dso"_s, "not xml <<<");
+    const QString cache = TestDirectories::GetTestDataCacheFilePath(StringHashName(bad));
+    m_harness.SetDPK(bad);
     EXPECT_FALSE(env.contains(u"DevicePackCachePath"_s));
-    EXPECT_EQ(env.value(u"DevicePack"_s), source);
-    EXPECT_EQ(env.value(u"DSOCacheFilePath"_s), source);
+    EXPECT_EQ(env.value(u"DevicePack"_s), bad);
+    EXPECT_EQ(env.value(u"DSOCacheFilePath"_s), bad);
     EXPECT_EQ(env.value(u"KeyDevicePackSpecified"_s), u"true"_s);
-    EXPECT_TRUE(
-        m_log.Text().endsWith(u"Resource Compile Error: %1 can not be compiled into %2.\n"_s.arg(source, cache)));
+    EXPECT_TRUE(m_log.Text().endsWith(u"Resource Compile Error: %1 can not be compiled into %2.\n"_s.arg(bad, cache)));
     // The empty file the compiler left is not taken for a fresh cache.
     EXPECT_FALSE(QFileInfo::exists(cache));
-    m_harness.SetDPK(source);
-    EXPECT_EQ(m_toolset.Calls().size(), 2);
+    m_harness.SetDPK(bad);
+    EXPECT_EQ(m_toolset.Calls().size(), 3);
 }
 
-// Platforms "Alpha Pro", "Beta Pro" (the default) and "Gamma"; kits "KitOne",
-// "KitTwo" (the default) and "Other".
+// Platforms "Alpha Pro", "Beta Pro" (the default) and "Gamma"; kits "KitOne", "KitTwo" (the default) and "Other".
 class HarnessSetupTest : public HarnessEnvironmentTest
 {
 protected:
@@ -209,82 +279,65 @@ protected:
         m_vars.Set("KESTIX_TESTSETS_ALL", RootPath(u"kits"_s));
         m_vars.Set("KESTIX_TESTSET", RootPath(u"kits/KitTwo"_s));
     }
-    QString Kit(const char *name) const { return RootPath(u"kits/"_s + QLatin1String(name)); }
-    QString PlatformDir(const char *name) const
-    {
-        return RootPath(u"platforms/"_s + QLatin1String(name) + u"/pvs/platform"_s);
-    }
     bool RunSetup() { return HarnessTestAccess::SetupEnvironment(m_harness); }
 
     EnvGuard m_vars;
 };
 
-TEST_F(HarnessSetupTest, WithNothingChosenTheDefaultKitAndPlatformAreUsed)
-{
-    ASSERT_TRUE(RunSetup());
-    EXPECT_EQ(m_harness.GetTestkit(), Kit("KitTwo"));
-    EXPECT_EQ(m_harness.GetPlatform(), PlatformDir("Beta Pro"));
-    EXPECT_FALSE(HarnessTestAccess::KitNotSelected(m_harness));
-    EXPECT_EQ(EnvOf(m_harness).value(u"PerlCache"_s), TestDirectories::GetOatPerlScripts());
-    EXPECT_EQ(m_log.Text(), u"KVK: %1Platform: %2"_s.arg(Kit("KitTwo"), PlatformDir("Beta Pro")));
-}
-
-TEST_F(HarnessSetupTest, OnlyAPlatformLoadsTheDefaultKitAsNotSelected)
-{
-    m_harness.SetPlatform(u"ALPHA"_s);
-    ASSERT_TRUE(RunSetup());
-    EXPECT_EQ(m_harness.GetTestkit(), Kit("KitTwo"));
-    EXPECT_EQ(m_harness.GetPlatform(), PlatformDir("Alpha Pro"));
-    EXPECT_TRUE(HarnessTestAccess::KitNotSelected(m_harness));
-
-    // Setting up again after an unrelated change neither selects the kit nor
-    // nests the platform folder a second time.
-    m_harness.SetFamily(u"family"_s, QString());
-    ASSERT_FALSE(HarnessTestAccess::EnvironmentReady(m_harness));
-    ASSERT_TRUE(RunSetup());
-    EXPECT_TRUE(HarnessTestAccess::KitNotSelected(m_harness));
-    EXPECT_EQ(m_harness.GetPlatform(), PlatformDir("Alpha Pro"));
-
-    // A kit chosen by the host is selected.
-    m_harness.SetTestkit(u"other"_s);
-    ASSERT_TRUE(RunSetup());
-    EXPECT_EQ(m_harness.GetTestkit(), Kit("Other"));
-    EXPECT_FALSE(HarnessTestAccess::KitNotSelected(m_harness));
-}
-
-TEST_F(HarnessSetupTest, KitAndPlatformNamesMatchTheFirstListedEntry)
-{
-    m_harness.SetTestkit(u"Kit"_s);
-    // "Gamma" is not a professional platform, so it cannot be chosen.
-    m_harness.SetPlatform(u"a"_s);
-    ASSERT_TRUE(RunSetup());
-    EXPECT_EQ(m_harness.GetTestkit(), Kit("KitOne"));
-    EXPECT_EQ(m_harness.GetPlatform(), PlatformDir("Alpha Pro"));
-}
-
-TEST_F(HarnessSetupTest, PathsThatMatchNoNameAreMadeAbsolute)
+TEST_F(HarnessSetupTest, KitAndPlatformAreTheDefaultsTheFirstListedEntryNamedOrAPath)
 {
     CurrentDirectory cwd(m_root.path());
-    m_harness.SetTestkit(u"elsewhere/kit"_s);
-    m_harness.SetPlatform(u"sdk/../sdk/p"_s);
-    ASSERT_TRUE(RunSetup());
-    EXPECT_EQ(m_harness.GetTestkit(), RootPath(u"elsewhere/kit"_s));
-    EXPECT_EQ(m_harness.GetPlatform(), RootPath(u"sdk/p/pvs/platform"_s));
+    // "Gamma" is not a professional platform, so "a" cannot choose it.
+    const struct
+    {
+        const char *kit, *platform, *expectedKit, *expectedPlatform;
+        bool kitNotSelected;
+    } rows[] = {
+        {"", "", "kits/KitTwo", "platforms/Beta Pro/pvs/platform", false},
+        {"", "ALPHA", "kits/KitTwo", "platforms/Alpha Pro/pvs/platform", true},
+        {"Kit", "a", "kits/KitOne", "platforms/Alpha Pro/pvs/platform", false},
+        {"elsewhere/kit", "sdk/../sdk/p", "elsewhere/kit", "sdk/p/pvs/platform", false},
+    };
+    for (const auto &row : rows) {
+        SCOPED_TRACE(row.kit + std::string(" ") + row.platform);
+        CapturedLog log;
+        Harness harness;
+        harness.SetLogger(log.log());
+        harness.SetTestkit(QString::fromLatin1(row.kit));
+        harness.SetPlatform(QString::fromLatin1(row.platform));
+        ASSERT_TRUE(HarnessTestAccess::SetupEnvironment(harness));
+        EXPECT_EQ(harness.GetTestkit(), RootPath(QString::fromLatin1(row.expectedKit)));
+        EXPECT_EQ(harness.GetPlatform(), RootPath(QString::fromLatin1(row.expectedPlatform)));
+        EXPECT_EQ(HarnessTestAccess::KitNotSelected(harness), row.kitNotSelected);
+        EXPECT_EQ(EnvOf(harness).value(u"PerlCache"_s), TestDirectories::GetOatPerlScripts());
+        EXPECT_EQ(log.Text(), u"KVK: %1Platform: %2"_s.arg(harness.GetTestkit(), harness.GetPlatform()));
+    }
 }
 
-TEST_F(HarnessSetupTest, TheRunIdentifierLastsUntilTheKitChanges)
+TEST_F(HarnessSetupTest, SettingUpAgainKeepsTheRunAndTheUnselectedKitUntilTheHostChoosesAKit)
 {
+    m_harness.SetPlatform(u"ALPHA"_s);
     ASSERT_TRUE(RunSetup());
     const QString runId = EnvOf(m_harness).value(u"TestRunID"_s);
     EXPECT_FALSE(QUuid::fromString(runId).isNull());
     EXPECT_TRUE(runId.startsWith(u'{') && runId.endsWith(u'}'));
-
     ASSERT_TRUE(RunSetup());
     EXPECT_EQ(EnvOf(m_harness).value(u"TestRunID"_s), runId);
 
-    m_harness.SetTestkit(u"KitOne"_s);
+    // A new family draws a new run identifier, but neither selects the kit nor nests the platform folder a second time.
+    m_harness.SetFamily(u"family"_s, QString());
+    ASSERT_FALSE(HarnessTestAccess::EnvironmentReady(m_harness));
     ASSERT_TRUE(RunSetup());
-    EXPECT_NE(EnvOf(m_harness).value(u"TestRunID"_s), runId);
+    EXPECT_TRUE(HarnessTestAccess::KitNotSelected(m_harness));
+    EXPECT_EQ(m_harness.GetPlatform(), RootPath(u"platforms/Alpha Pro/pvs/platform"_s));
+    const QString familyRunId = EnvOf(m_harness).value(u"TestRunID"_s);
+    EXPECT_NE(familyRunId, runId);
+
+    m_harness.SetTestkit(u"other"_s);
+    ASSERT_TRUE(RunSetup());
+    EXPECT_EQ(m_harness.GetTestkit(), RootPath(u"kits/Other"_s));
+    EXPECT_FALSE(HarnessTestAccess::KitNotSelected(m_harness));
+    EXPECT_NE(EnvOf(m_harness).value(u"TestRunID"_s), familyRunId);
 }
 
 TEST_F(HarnessSetupTest, WithoutAnyKitSetupFails)

@@ -4,17 +4,7 @@
 
 #include <QDir>
 
-using namespace Qt::StringLiterals;
-
 namespace {
-
-using controllertest::CatalogueModule;
-using controllertest::MakeCatalogue;
-using controllertest::ReadResults;
-using controllertest::ResultsView;
-using harnesstest::CapturedLog;
-using testutil::ReadFile;
-using testutil::WriteFile;
 
 QByteArray CtfLog(const char *suite, const QList<QPair<const char *, const char *>> &cases)
 {
@@ -34,19 +24,17 @@ QByteArray UtLog(const char *suite, const QList<QPair<const char *, const char *
     return log + "----\nElapsed Time: 3\n";
 }
 
-class ProcessTest : public ::testing::Test
+class ProcessTest : public CatalogueHarnessTest
 {
 protected:
     void SetUp() override
     {
-        ASSERT_TRUE(m_dir.isValid());
-        m_kit = MakeCatalogue(m_dir.filePath(u"kit"_s), false,
-                              {CatalogueModule(u"Audio"_s, u"#101"_s, {u"a"_s, u"b"_s, u"c"_s}),
-                               CatalogueModule(u"Menu"_s, u"#102"_s, {u"m1"_s, u"m2"_s}, QString(), u"uitf"_s)});
-        m_platform = MakeCatalogue(m_dir.filePath(u"platform"_s), true, {});
+        UseCatalogues({CatalogueModule(u"Audio"_s, u"#101"_s, {u"a"_s, u"b"_s, u"c"_s}),
+                       CatalogueModule(u"Menu"_s, u"#102"_s, {u"m1"_s, u"m2"_s}, QString(), u"uitf"_s)},
+                      {});
+        m_harness.SetLogOutputPath(LogFolder());
 
-        // The saved tree; the folders of raw OAT logs and of results hold
-        // logs that must not be read.
+        // The saved tree; the folders of raw OAT logs and of results hold logs that must not be read.
         Log(u"audio-ctf-2026-12-03.log"_s, CtfLog("Audio", {{"a", "Fail"}, {"b", "Fail"}}));
         Log(u"menu-2026-12-03.txt"_s, UtLog("Menu", {{"m1", "PASS"}, {"m2", "FAIL"}}));
         Log(u"readme.dat"_s, "Suite: Audio\n");
@@ -56,41 +44,21 @@ protected:
         Log(u"a-run/menu-2026-12-05.txt"_s, UtLog("Menu", {{"m2", "PASS"}}));
         Log(u"oatRawLogs/trap-ctf-1.log"_s, CtfLog("Audio", {{"trap", "Pass"}}));
         Log(u"ProcessedResults/trap-ctf-2.log"_s, CtfLog("Audio", {{"trap", "Pass"}}));
-        Prepare(m_harness, m_log);
     }
 
-    void Log(const QString &relative, const QByteArray &content)
-    {
-        WriteFile(m_dir.filePath(u"logs/"_s + relative), content);
-    }
+    void Log(const QString &relative, const QByteArray &content) { WriteFile(LogFolder() + u'/' + relative, content); }
     QString LogFolder() const { return m_dir.filePath(u"logs"_s); }
-
-    void Prepare(Harness &harness, CapturedLog &log)
-    {
-        harness.SetLogger(log.log());
-        harness.SetLogOutputPath(LogFolder());
-        HarnessControllerAccess::SetCatalogues(harness, m_kit, m_platform);
-    }
-
-    QTemporaryDir m_dir;
-    QSharedPointer<Manifest> m_kit;
-    QSharedPointer<Manifest> m_platform;
-    // Set up for the saved tree.
-    CapturedLog m_log;
-    Harness m_harness;
 };
 
-TEST_F(ProcessTest, WholeTreeFeedsOneResultsFileWithIndentedMessages)
+TEST_F(ProcessTest, WholeTreeFeedsOneResultsFileWithIndentedMessagesAndALinkBackUpIsNotFollowed)
 {
+    ASSERT_TRUE(QFile::link(LogFolder(), LogFolder() + u"/b-run/loop"_s));
     ASSERT_TRUE(m_harness.Process(0));
 
     const QString results = LogFolder() + u"/ProcessedResults/ProcessedResults.xml"_s;
-    auto &env = HarnessControllerAccess::Environment(m_harness);
-    EXPECT_EQ(env.value(u"ProcessedResultsPath"_s), results);
-    EXPECT_EQ(env.value(u"LogPath"_s), LogFolder());
-    const ResultsView view = ReadResults(results);
-    ASSERT_TRUE(view.ok);
-    EXPECT_EQ(view.verdicts,
+    EXPECT_EQ(Env().value(u"ProcessedResultsPath"_s), results);
+    EXPECT_EQ(Env().value(u"LogPath"_s), LogFolder());
+    EXPECT_EQ(ReadResults(results).verdicts,
               (QMap<QString, QString>{{u"Audio/a"_s, u"pass"_s},
                                       {u"Audio/b"_s, u"unsupported"_s},
                                       {u"Audio/c.1"_s, u"fail"_s},
@@ -123,39 +91,7 @@ TEST_F(ProcessTest, WholeTreeFeedsOneResultsFileWithIndentedMessages)
               (QStringList{u"ProcessedResults.xml"_s, u"trap-ctf-2.log"_s}));
 }
 
-TEST_F(ProcessTest, GivesTheSameFileAsRecordingTheLogsOneByOne)
-{
-    ASSERT_TRUE(m_harness.Process(0));
-    const QByteArray processed = ReadFile(LogFolder() + u"/ProcessedResults/ProcessedResults.xml"_s);
-
-    CapturedLog singleLog;
-    Harness single;
-    Prepare(single, singleLog);
-    const QString separate = m_dir.filePath(u"separate.xml"_s);
-    HarnessControllerAccess::Environment(single).insert(u"ProcessedResultsPath"_s, separate);
-    for (const char *relative : {"audio-ctf-2026-12-03.log", "menu-2026-12-03.txt", "a-run/menu-2026-12-05.txt",
-                                 "b-run/audio-ctf-2026-12-04.log", "b-run/deeper/ghost-ctf-1.log"}) {
-        const QString path = LogFolder() + u'/' + QString::fromLatin1(relative);
-        QSharedPointer<_TestModule> module = Manifest::CreateTestModuleFromLog(path);
-        ASSERT_TRUE(module);
-        module->AddDesktopLogFile(path);
-        HarnessControllerAccess::Update(single, module);
-        // Every step left a complete file behind.
-        EXPECT_TRUE(ReadResults(separate).ok);
-    }
-    EXPECT_EQ(ReadFile(separate), processed);
-}
-
-TEST_F(ProcessTest, DamagedResultsFileIsKeptAsideOnce)
-{
-    Log(u"ProcessedResults/ProcessedResults.xml"_s, "<testmodules kvkHash=\"#1\"><mod");
-    ASSERT_TRUE(m_harness.Process(0));
-    const QDir folder(LogFolder() + u"/ProcessedResults"_s);
-    EXPECT_EQ(folder.entryList({u"*.unreadable-*"_s}, QDir::Files).size(), 1);
-    EXPECT_EQ(ReadResults(folder.filePath(u"ProcessedResults.xml"_s)).verdicts.value(u"Audio/a"_s), u"pass"_s);
-}
-
-TEST_F(ProcessTest, SetupFailureRecordsNothing)
+TEST_F(ProcessTest, SetupFailureOrNoLogFolderRecordsNothing)
 {
     CapturedLog log;
     Harness harness;
@@ -165,23 +101,11 @@ TEST_F(ProcessTest, SetupFailureRecordsNothing)
     EXPECT_FALSE(harness.Process(0));
     EXPECT_TRUE(log.Text().endsWith(u"Harness::Process Setup failed."_s));
     EXPECT_FALSE(QFileInfo::exists(LogFolder() + u"/ProcessedResults/ProcessedResults.xml"_s));
-}
 
-TEST_F(ProcessTest, WithoutALogFolderNothingIsCreated)
-{
-    CapturedLog log;
-    Harness harness;
-    harness.SetLogger(log.log());
-    HarnessControllerAccess::SetCatalogues(harness, m_kit, m_platform);
-    EXPECT_FALSE(harness.Process(0));
-    EXPECT_FALSE(HarnessControllerAccess::Environment(harness).contains(u"ProcessedResultsPath"_s));
-}
-
-TEST_F(ProcessTest, LinkBackUpTheTreeIsNotFollowed)
-{
-    ASSERT_TRUE(QFile::link(LogFolder(), LogFolder() + u"/b-run/loop"_s));
-    EXPECT_TRUE(m_harness.Process(0));
-    EXPECT_FALSE(m_log.Text().contains(u"loop"_s));
+    Harness unplaced;
+    HarnessTestAccess::SetCatalogues(unplaced, m_kit, m_platform);
+    EXPECT_FALSE(unplaced.Process(0));
+    EXPECT_FALSE(HarnessTestAccess::Environment(unplaced).contains(u"ProcessedResultsPath"_s));
 }
 
 } // namespace

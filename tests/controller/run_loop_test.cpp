@@ -1,5 +1,5 @@
-// The run loop's order, waits and messages, driven against an emulated
-// handset with modules and frameworks that record what is asked of them.
+// The run loop's order, waits and messages, driven against an emulated handset with modules and frameworks that record
+// what is asked of them.
 
 #include "controllertest.h"
 
@@ -13,14 +13,14 @@
 #include <QRegularExpression>
 #include <QSet>
 
-using namespace Qt::StringLiterals;
-
 namespace {
 
-using controllertest::MakeCatalogue;
-using controllertest::ScriptedModule;
-using harnesstest::CapturedLog;
-using testutil::EnvGuard;
+// Notes a call in events and answers it with result.
+bool Note(QStringList *events, const QString &call, bool result = true)
+{
+    events->append(call);
+    return result;
+}
 
 class RecordingModule : public ScriptedModule
 {
@@ -34,10 +34,9 @@ public:
 
     bool Run(IKestoDevice *, const QMap<QString, QString> &) override
     {
-        m_events->append(u"run "_s + moduleName);
         seenTestCases = selectedTestCases;
         seenRunOption = runOption;
-        return runs;
+        return Note(m_events, u"run "_s + moduleName, runs);
     }
     bool IsLogComplete(IKestoDevice *device) override
     {
@@ -49,15 +48,15 @@ public:
     bool CopyLog(IKestoDevice *, QMap<QString, QString> &) override
     {
         copyTime = Clock::Now();
-        m_events->append(u"copy "_s + moduleName);
-        return copies;
+        return Note(m_events, u"copy "_s + moduleName, copies);
     }
-    bool RemoveTest(IKestoDevice *) override
+    bool RemoveTest(IKestoDevice *) override { return Note(m_events, u"remove "_s + moduleName); }
+    void PostProcess(QMap<QString, QString> &) override { Note(m_events, u"postprocess "_s + moduleName); }
+    bool GetLogFilePaths(IKestoDevice *, QStringList &paths) override
     {
-        m_events->append(u"remove "_s + moduleName);
+        paths << u"fs:/a.log"_s << u"fs:/b.log"_s;
         return true;
     }
-    void PostProcess(QMap<QString, QString> &) override { m_events->append(u"postprocess "_s + moduleName); }
 
     bool runs = true;
     bool copies = true;
@@ -77,17 +76,9 @@ class RecordingFramework : public _Framework
 public:
     RecordingFramework(const QString &frameworkName, QStringList *events) : m_events(events) { name = frameworkName; }
     bool IsLoaded(IKestoDevice *) override { return onHandset; }
-    bool Load(IKestoDevice *, QMap<QString, QString> &) override
-    {
-        m_events->append(u"load "_s + name);
-        return loads;
-    }
-    bool PostLoad(IKestoDevice *, QMap<QString, QString> &) override
-    {
-        m_events->append(u"postload "_s + name);
-        return true;
-    }
-    void Unload(IKestoDevice *, QMap<QString, QString> &) override { m_events->append(u"unload "_s + name); }
+    bool Load(IKestoDevice *, QMap<QString, QString> &) override { return Note(m_events, u"load "_s + name, loads); }
+    bool PostLoad(IKestoDevice *, QMap<QString, QString> &) override { return Note(m_events, u"postload "_s + name); }
+    void Unload(IKestoDevice *, QMap<QString, QString> &) override { Note(m_events, u"unload "_s + name); }
 
     bool onHandset = false;
     bool loads = true;
@@ -96,34 +87,67 @@ private:
     QStringList *m_events;
 };
 
-class RunLoopTest : public ::testing::Test
+// What the run tells its observer: the start and end of each module, what it waited for and how each ended.
+struct Watcher : RunObserver
+{
+    void ModuleStarted(const ModuleRecord &record) override { events.append(u"start "_s + record.name); }
+    void ModuleWaiting(const ModuleRecord &record, const QString &what, qint64 elapsedMs) override
+    {
+        EXPECT_GE(elapsedMs, lastElapsed);
+        lastElapsed = elapsedMs;
+        waits.insert(record.name + u' ' + what);
+    }
+    void ModuleEnded(const ModuleRecord &record) override
+    {
+        events.append(u"end "_s + record.name);
+        ended.insert(record.name, record);
+        lastElapsed = 0;
+    }
+    QStringList events;
+    QSet<QString> waits;
+    qint64 lastElapsed = 0;
+    QMap<QString, ModuleRecord> ended;
+};
+
+// Hands out modules in the order given and records how each ended.
+class RecordingSource : public ModuleSource
+{
+public:
+    RecordingSource(const QList<QSharedPointer<_TestModule>> &modules, bool keep) : m_modules(modules), m_keep(keep) { }
+    QSharedPointer<_TestModule> Next() override { return m_modules.isEmpty() ? nullptr : m_modules.takeFirst(); }
+    void Finished(const QSharedPointer<_TestModule> &module, Outcome outcome) override
+    {
+        outcomes.append(module->moduleName + u' ' + QString::number(int(outcome)));
+    }
+    bool KeepFrameworks() const override { return m_keep; }
+
+    QStringList outcomes;
+
+private:
+    QList<QSharedPointer<_TestModule>> m_modules;
+    bool m_keep;
+};
+
+class RunLoopTest : public CatalogueHarnessTest
 {
 protected:
     void SetUp() override
     {
-        ASSERT_TRUE(m_dir.isValid());
         m_handsets.AddHandset(u"phone"_s, u"Emulated phone"_s, u"arm"_s);
-        m_harness.SetLogger(m_log.log());
         m_harness.SetTarget(u"phone"_s);
         m_harness.SetLogOutputPath(m_dir.filePath(u"logs"_s));
         m_ctf.reset(new RecordingFramework(u"ctf"_s, &m_events));
         m_oat.reset(new RecordingFramework(u"oat"_s, &m_events));
-        m_kit = MakeCatalogue(m_dir.filePath(u"kit"_s), false, {});
+        UseCatalogues({}, {});
         m_kit->frameworks.insert(m_ctf->name, m_ctf);
         m_kit->frameworks.insert(m_oat->name, m_oat);
-        HarnessControllerAccess::SetCatalogues(m_harness, m_kit, {});
+        m_harness.SetRunObserver(&m_watcher);
     }
 
-    void TearDown() override { m_harness.DisconnectTarget(); }
-
-    // The handset goes offline while module's log is polled.
-    void LoseHandsetWhilePolling(RecordingModule &module)
+    void TearDown() override
     {
-        module.pollsNeeded = 5;
-        module.onPoll = [this](IKestoDevice *device) {
-            testutil::WriteFile(m_handsets.HandsetFolder(u"phone"_s) + u"/offline"_s, QByteArray());
-            device->FileExists(u"fs:/anything"_s);
-        };
+        m_harness.SetRunObserver(nullptr);
+        m_harness.DisconnectTarget();
     }
 
     // A module queued for the run and known to the kit catalogue.
@@ -136,26 +160,27 @@ protected:
         return module;
     }
 
-    QString ResultsPath() { return HarnessControllerAccess::Environment(m_harness).value(u"ProcessedResultsPath"_s); }
-
-    QTemporaryDir m_dir;
-    testutil::HandsetFixture m_handsets;
-    CapturedLog m_log;
-    Harness m_harness;
+    HandsetFixture m_handsets;
     QStringList m_events;
     QSharedPointer<RecordingFramework> m_ctf;
     QSharedPointer<RecordingFramework> m_oat;
-    QSharedPointer<Manifest> m_kit;
+    Watcher m_watcher;
 };
 
-TEST_F(RunLoopTest, EmptyQueueRunsNothing)
+TEST_F(RunLoopTest, EmptyQueueFailsButModulesWithoutAFrameworkCountAsTakenInHand)
 {
     EXPECT_FALSE(m_harness.Run());
     EXPECT_EQ(m_log.Text(), u"No modules to run."_s);
+    Queue(u"Menu"_s, u"uitf"_s);
+    Queue(u"Other"_s, u"uitf"_s);
+    EXPECT_TRUE(m_harness.Run());
+    EXPECT_TRUE(m_events.isEmpty());
+    EXPECT_EQ(m_log.Text().count(u"Framework uitf not found.\n"_s), 2);
 }
 
-TEST_F(RunLoopTest, ModulesRunByTypeThenNameWithEachFrameworkLoadedOnce)
+TEST_F(RunLoopTest, ModulesRunByTypeThenNameWithEachFrameworkLoadedOnceAndOneFoundLoadedLeftOnTheHandset)
 {
+    m_oat->onHandset = true;
     Queue(u"Zeta"_s, u"oat"_s);
     Queue(u"Beta"_s, u"ctf"_s);
     Queue(u"Alpha"_s, u"oat"_s);
@@ -163,29 +188,15 @@ TEST_F(RunLoopTest, ModulesRunByTypeThenNameWithEachFrameworkLoadedOnce)
     EXPECT_TRUE(m_harness.Run());
     EXPECT_EQ(m_events,
               (QStringList{"load ctf", "run Beta", "copy Beta", "remove Beta", "postprocess Beta", "unload ctf",
-                           "load oat", "run Alpha", "copy Alpha", "remove Alpha", "postprocess Alpha", "run Zeta",
-                           "copy Zeta", "remove Zeta", "postprocess Zeta", "unload oat"}));
+                           "postload oat", "run Alpha", "copy Alpha", "remove Alpha", "postprocess Alpha", "run Zeta",
+                           "copy Zeta", "remove Zeta", "postprocess Zeta"}));
     const QString log = m_log.Text();
-    EXPECT_TRUE(log.contains(QStringLiteral("Loading Framework ctf\nRunning KVK test Beta ID:Beta\n"
-                                            "   Test Beta Run\n   Removing test Beta\n")));
-    EXPECT_TRUE(log.contains(u"Unloading Framework ctf\nLoading Framework oat\n"_s));
-    EXPECT_TRUE(log.endsWith(u"Unloading Framework oat\n"_s));
-    const controllertest::ResultsView view = controllertest::ReadResults(ResultsPath());
+    EXPECT_TRUE(log.contains(u"Loading Framework ctf\nRunning KVK test Beta ID:Beta\n"
+                             u"   Test Beta Run\n   Removing test Beta\nUnloading Framework ctf\n"_s));
+    EXPECT_TRUE(log.contains(u"Harness::Run Framework oat already loaded"_s));
+    const ResultsView view = ReadResults(Env().value(u"ProcessedResultsPath"_s));
     EXPECT_EQ(view.verdicts.value(u"Zeta/Zeta_1"_s), u"pass"_s);
     EXPECT_EQ(view.verdicts.value(u"Beta/Beta_1"_s), u"pass"_s);
-}
-
-TEST_F(RunLoopTest, FrameworkFoundLoadedIsPostLoadedAndLeftOnTheHandset)
-{
-    m_oat->onHandset = true;
-    Queue(u"A"_s, u"oat"_s);
-    Queue(u"B"_s, u"ctf"_s);
-
-    EXPECT_TRUE(m_harness.Run());
-    EXPECT_EQ(m_events,
-              (QStringList{"load ctf", "run B", "copy B", "remove B", "postprocess B", "unload ctf", "postload oat",
-                           "run A", "copy A", "remove A", "postprocess A"}));
-    EXPECT_TRUE(m_log.Text().contains(u"Harness::Run Framework oat already loaded"_s));
 }
 
 TEST_F(RunLoopTest, UnknownFrameworkAndFailedStartSkipTheModuleAndTheRunGoesOn)
@@ -196,28 +207,20 @@ TEST_F(RunLoopTest, UnknownFrameworkAndFailedStartSkipTheModuleAndTheRunGoesOn)
     Queue(u"Fine"_s, u"ctf"_s);
     QSharedPointer<RecordingModule> silent = Queue(u"Silent"_s, u"ctf"_s);
     silent->copies = false;
-    // What the run tells its observer about each module it took.
-    struct Records : RunObserver
-    {
-        QMap<QString, ModuleRecord> byName;
-        void ModuleEnded(const ModuleRecord &record) override { byName.insert(record.name, record); }
-    } records;
-    m_harness.SetRunObserver(&records);
 
     EXPECT_TRUE(m_harness.Run());
-    m_harness.SetRunObserver(nullptr);
     const QMap<QString, QString> reasons{{u"Menu"_s, u"no framework for test type uitf"_s},
                                          {u"Broken"_s, u"install or start failed"_s},
                                          {u"Fine"_s, QString()},
                                          {u"Silent"_s, u"no log was found"_s}};
-    ASSERT_EQ(records.byName.keys(), reasons.keys());
+    ASSERT_EQ(m_watcher.ended.keys(), reasons.keys());
     for (auto it = reasons.cbegin(); it != reasons.cend(); ++it) {
-        const ModuleRecord &record = records.byName.value(it.key());
+        const ModuleRecord &record = m_watcher.ended.value(it.key());
         EXPECT_EQ(record.Reason(), it.value()) << it.key().toStdString();
         EXPECT_EQ(record.handset, u"phone"_s);
         EXPECT_EQ(record.start.timeSpec(), Qt::UTC);
     }
-    const ModuleRecord &fine = records.byName.value(u"Fine"_s);
+    const ModuleRecord &fine = m_watcher.ended.value(u"Fine"_s);
     ASSERT_EQ(fine.results.caseResults.size(), 1);
     EXPECT_EQ(fine.results.caseResults.at(0).testCase, u"Fine_1"_s);
     EXPECT_EQ(m_events,
@@ -230,45 +233,28 @@ TEST_F(RunLoopTest, UnknownFrameworkAndFailedStartSkipTheModuleAndTheRunGoesOn)
     EXPECT_FALSE(log.contains(u"Removing test Silent"_s));
 }
 
-TEST_F(RunLoopTest, OnlyUnknownFrameworksStillCountAsTakenInHand)
-{
-    Queue(u"Menu"_s, u"uitf"_s);
-    Queue(u"Other"_s, u"uitf"_s);
-    EXPECT_TRUE(m_harness.Run());
-    EXPECT_TRUE(m_events.isEmpty());
-    EXPECT_EQ(m_log.Text().count(u"Framework uitf not found.\n"_s), 2);
-}
-
-TEST_F(RunLoopTest, NoDeleteKeepsModulesAndCopyDelayPausesBeforeEachCopy)
+TEST_F(RunLoopTest, NoDeleteKeepsModulesCopyDelayPausesBeforeEachCopyAndTestCasesGoToTheFirstModuleOnly)
 {
     m_harness.SetNoDelete(true);
     m_harness.SetCopyDelay(u"1500"_s);
-    QSharedPointer<RecordingModule> a = Queue(u"A"_s, u"ctf"_s);
-    QSharedPointer<RecordingModule> b = Queue(u"B"_s, u"ctf"_s);
-
-    EXPECT_TRUE(m_harness.Run());
-    EXPECT_FALSE(m_events.join(u',').contains(u"remove"_s));
-    EXPECT_EQ(m_log.Text().count(u"   Sleeping 1500 Milliseconds\n"_s), 2);
-    for (const auto &module : {a, b})
-        EXPECT_GE(module->copyTime - module->pollTimes.last(), 1500);
-}
-
-TEST_F(RunLoopTest, TestCasesGoToTheFirstModuleOnlyAndTheRunOptionToAll)
-{
     m_harness.SetTestCases({u"t1"_s, u"t2"_s});
     m_harness.SetRunOption(u"-fast"_s);
     QSharedPointer<RecordingModule> second = Queue(u"B"_s, u"ctf"_s);
     QSharedPointer<RecordingModule> first = Queue(u"A"_s, u"ctf"_s);
 
     EXPECT_TRUE(m_harness.Run());
+    EXPECT_FALSE(m_events.join(u',').contains(u"remove"_s));
+    EXPECT_EQ(m_log.Text().count(u"   Sleeping 1500 Milliseconds\n"_s), 2);
+    for (const auto &module : {first, second}) {
+        EXPECT_GE(module->copyTime - module->pollTimes.last(), 1500);
+        EXPECT_EQ(module->seenRunOption, u"-fast"_s);
+    }
     EXPECT_EQ(first->seenTestCases, (QStringList{u"t1"_s, u"t2"_s}));
     EXPECT_TRUE(second->seenTestCases.isEmpty());
-    EXPECT_EQ(first->seenRunOption, u"-fast"_s);
-    EXPECT_EQ(second->seenRunOption, u"-fast"_s);
-    EXPECT_TRUE(HarnessControllerAccess::TestCases(m_harness).isEmpty());
+    EXPECT_TRUE(HarnessTestAccess::TestCases(m_harness).isEmpty());
 }
 
-TEST_F(RunLoopTest, LogIsPolledEverySecondOnHandsetsAndCopiedAfterTenMinutesAtMost)
+TEST_F(RunLoopTest, LogIsPolledEachSecondOrQuarterSecondOnSimulatorsAndCopiedAfterTenMinutesOrDroppedPastTheLimit)
 {
     QSharedPointer<RecordingModule> slow = Queue(u"Slow"_s, u"ctf"_s);
     slow->pollsNeeded = 3;
@@ -283,90 +269,40 @@ TEST_F(RunLoopTest, LogIsPolledEverySecondOnHandsetsAndCopiedAfterTenMinutesAtMo
     EXPECT_GE(never->pollTimes.size(), 590);
     EXPECT_LE(never->pollTimes.size(), 602);
     EXPECT_TRUE(m_events.contains(u"copy Stuck"_s));
-}
 
-TEST_F(RunLoopTest, AModulePastTheTimeLimitIsRemovedUncopiedAndTheObserverSeesItsWait)
-{
-    QSharedPointer<RecordingModule> stuck = Queue(QStringLiteral("Stuck"), QStringLiteral("ctf"));
-    stuck->pollsNeeded = 1000000;
-    QSharedPointer<RecordingModule> next = Queue(QStringLiteral("Zeta"), QStringLiteral("ctf"));
-    struct Watcher : RunObserver
-    {
-        void ModuleStarted(const ModuleRecord &record) override
-        {
-            events.append(QStringLiteral("start ") + record.name);
-        }
-        void ModuleWaiting(const ModuleRecord &record, const QString &what, qint64 elapsedMs) override
-        {
-            EXPECT_GE(elapsedMs, lastElapsed);
-            lastElapsed = elapsedMs;
-            waits.insert(record.name + QLatin1Char(' ') + what);
-        }
-        void ModuleEnded(const ModuleRecord &record) override
-        {
-            events.append(QStringLiteral("end ") + record.name);
-            ended.insert(record.name, record);
-            lastElapsed = 0;
-        }
-        QStringList events;
-        QSet<QString> waits;
-        qint64 lastElapsed = 0;
-        QMap<QString, ModuleRecord> ended;
-    } watcher;
-    m_harness.SetRunObserver(&watcher);
-    m_harness.SetModuleTimeLimit(5000);
+    // Simulators are polled every quarter second.
+    m_handsets.AddHandset(u"sim"_s, QString(), u"win32"_s);
+    m_harness.SetTarget(u"sim"_s);
+    QSharedPointer<RecordingModule> simulated = Queue(u"M"_s, u"ctf"_s);
+    simulated->pollsNeeded = 2;
     EXPECT_TRUE(m_harness.Run());
-    m_harness.SetRunObserver(nullptr);
+    ASSERT_EQ(simulated->pollTimes.size(), 2);
+    EXPECT_GE(simulated->pollTimes[1] - simulated->pollTimes[0], 250);
+    EXPECT_LT(simulated->pollTimes[1] - simulated->pollTimes[0], 500);
 
-    EXPECT_EQ(watcher.events,
-              (QStringList{QStringLiteral("start Stuck"), QStringLiteral("end Stuck"), QStringLiteral("start Zeta"),
-                           QStringLiteral("end Zeta")}));
-    EXPECT_TRUE(watcher.waits.contains(QStringLiteral("Stuck its log")));
-    const ModuleRecord timedOut = watcher.ended.value(QStringLiteral("Stuck"));
+    // Past a time limit, a module is removed uncopied and the observer sees its wait.
+    m_harness.SetTarget(u"phone"_s);
+    m_events.clear();
+    m_watcher.events.clear();
+    QSharedPointer<RecordingModule> stuck = Queue(u"Stopped"_s, u"ctf"_s);
+    stuck->pollsNeeded = 1000000;
+    m_harness.SetModuleTimeLimit(5000);
+    RecordingSource source({stuck, Queue(u"Zeta"_s, u"ctf"_s)}, false);
+    ASSERT_TRUE(m_harness.Run(source));
+    EXPECT_EQ(m_watcher.events, (QStringList{u"start Stopped"_s, u"end Stopped"_s, u"start Zeta"_s, u"end Zeta"_s}));
+    EXPECT_TRUE(m_watcher.waits.contains(u"Stopped its log"_s));
+    const ModuleRecord timedOut = m_watcher.ended.value(u"Stopped"_s);
     EXPECT_EQ(timedOut.outcome, ModuleSource::TimedOut);
     EXPECT_GT(timedOut.durationMs, 5000);
     EXPECT_LT(timedOut.durationMs, 6500);
-    EXPECT_EQ(timedOut.Reason(), QStringLiteral("stopped after its time limit of 5 s"));
+    EXPECT_EQ(timedOut.Reason(), u"stopped after its time limit of 5 s"_s);
     EXPECT_LT(stuck->pollTimes.size(), 10);
-    EXPECT_TRUE(m_events.contains(QStringLiteral("remove Stuck")));
-    EXPECT_FALSE(m_events.contains(QStringLiteral("copy Stuck")));
-    EXPECT_EQ(watcher.ended.value(QStringLiteral("Zeta")).outcome, ModuleSource::Recorded);
+    EXPECT_TRUE(m_events.contains(u"remove Stopped"_s));
+    EXPECT_FALSE(m_events.contains(u"copy Stopped"_s));
+    EXPECT_EQ(m_watcher.ended.value(u"Zeta"_s).outcome, ModuleSource::Recorded);
 }
 
-TEST_F(RunLoopTest, SimulatorHandsetsArePolledEveryQuarterSecond)
-{
-    m_handsets.AddHandset(u"sim"_s, QString(), u"win32"_s);
-    m_harness.SetTarget(u"sim"_s);
-    QSharedPointer<RecordingModule> module = Queue(u"M"_s, u"ctf"_s);
-    module->pollsNeeded = 2;
-
-    EXPECT_TRUE(m_harness.Run());
-    ASSERT_EQ(module->pollTimes.size(), 2);
-    EXPECT_GE(module->pollTimes[1] - module->pollTimes[0], 250);
-    EXPECT_LT(module->pollTimes[1] - module->pollTimes[0], 500);
-}
-
-TEST_F(RunLoopTest, LostHandsetEndsTheRunWithoutUnloading)
-{
-    QSharedPointer<RecordingModule> first = Queue(u"A"_s, u"ctf"_s);
-    LoseHandsetWhilePolling(*first);
-    Queue(u"B"_s, u"ctf"_s);
-
-    EXPECT_FALSE(m_harness.Run());
-    EXPECT_EQ(m_events, (QStringList{"load ctf", "run A"}));
-    EXPECT_TRUE(m_log.Text().endsWith(u"Device Connection has died."_s));
-}
-
-TEST_F(RunLoopTest, RunFailsWithoutAHandset)
-{
-    Queue(u"A"_s, u"ctf"_s);
-    m_harness.SetTarget(u"nothing-like-this"_s);
-    EXPECT_FALSE(m_harness.Run());
-    EXPECT_TRUE(m_events.isEmpty());
-    EXPECT_TRUE(m_log.Text().contains(u"Target nothing-like-this not found."_s));
-}
-
-TEST_F(RunLoopTest, FrameworkLookupIgnoresCaseButLoadByNameDoesNot)
+TEST_F(RunLoopTest, FrameworksAreFoundInAnyCaseButLoadedByTheirExactName)
 {
     QSharedPointer<RecordingFramework> upper(new RecordingFramework(u"CTFX"_s, &m_events));
     m_kit->frameworks.insert(upper->name, upper);
@@ -375,35 +311,25 @@ TEST_F(RunLoopTest, FrameworkLookupIgnoresCaseButLoadByNameDoesNot)
     EXPECT_FALSE(m_harness.Load(u"ctfx"_s));
     EXPECT_TRUE(m_events.isEmpty());
     EXPECT_TRUE(m_harness.Load(u"CTFX"_s));
-    EXPECT_EQ(m_events, QStringList{u"load CTFX"_s});
-
     QList<QSharedPointer<_Framework>> frameworks{upper};
     EXPECT_EQ(m_harness.ListFrameworks(frameworks), 3u);
     EXPECT_EQ(frameworks.first()->name, u"CTFX"_s);
-}
 
-TEST_F(RunLoopTest, FailedLoadNamesTheHandsetKind)
-{
+    m_kit->frameworks.remove(upper->name);
+    EXPECT_TRUE(m_harness.Unload());
+    EXPECT_EQ(m_events, (QStringList{"load CTFX", "unload ctf", "unload oat"}));
+    EXPECT_FALSE(m_harness.Unload(QSharedPointer<_Framework>()));
+    EXPECT_FALSE(m_harness.Load(QSharedPointer<_Framework>()));
     m_ctf->loads = false;
     EXPECT_FALSE(m_harness.Load(m_ctf));
     EXPECT_TRUE(m_log.Text().contains(u"Load Error: Kestix framework package for arm not found.\n"_s));
-    EXPECT_FALSE(m_harness.Load(QSharedPointer<_Framework>()));
 }
 
-TEST_F(RunLoopTest, UnloadAllTakesEveryKitFramework)
+TEST_F(RunLoopTest, SecondaryModulesComeFromBothCataloguesBeforeTheModuleStartsAndByNameTheKitModuleRuns)
 {
-    EXPECT_TRUE(m_harness.Unload());
-    EXPECT_EQ(m_events, (QStringList{"unload ctf", "unload oat"}));
-    EXPECT_FALSE(m_harness.Unload(QSharedPointer<_Framework>()));
-}
-
-TEST_F(RunLoopTest, SecondaryModulesComeFromBothCataloguesBeforeTheModuleStarts)
-{
-    QSharedPointer<Manifest> platform = MakeCatalogue(m_dir.filePath(u"platform"_s), true, {});
-    HarnessControllerAccess::SetCatalogues(m_harness, m_kit, platform);
     QSharedPointer<RecordingModule> module(new RecordingModule(u"Main"_s, u"ctf"_s, &m_events));
     module->secondaryModules = {u"Both"_s, u"Nowhere"_s};
-    for (Manifest *catalogue : {m_kit.data(), platform.data()}) {
+    for (Manifest *catalogue : {m_kit.data(), m_platform.data()}) {
         QSharedPointer<RecordingModule> both(new RecordingModule(u"Both"_s, u"secondary"_s, &m_events));
         catalogue->testModules.insert(u"both"_s, both);
     }
@@ -414,69 +340,14 @@ TEST_F(RunLoopTest, SecondaryModulesComeFromBothCataloguesBeforeTheModuleStarts)
         "Loading Secondary Modules\n   Loading Secondary Module from KVK: Both\n"
         "   Loading Secondary Module from PVS: Both\n   Warning: Secondary Module Nowhere not found.\n")));
     EXPECT_FALSE(m_harness.Run(QSharedPointer<_TestModule>()));
-}
 
-TEST_F(RunLoopTest, RunByNameTakesTheKitModule)
-{
+    // By name, the kit's module runs.
+    m_events.clear();
     Queue(u"Named"_s, u"ctf"_s);
     EXPECT_TRUE(m_harness.Run(u"NAMED"_s));
     EXPECT_FALSE(m_harness.Run(u"unknown"_s));
     EXPECT_EQ(m_events, QStringList{u"run Named"_s});
 }
-
-} // namespace
-
-namespace {
-
-class ListingModule : public controllertest::ScriptedModule
-{
-public:
-    ListingModule() : ScriptedModule(u"Lister"_s) { }
-    bool GetLogFilePaths(IKestoDevice *device, QStringList &paths) override
-    {
-        if (!device)
-            return false;
-        paths << u"fs:/a.log"_s << u"fs:/b.log"_s;
-        return true;
-    }
-};
-
-TEST_F(RunLoopTest, LogFilePathsComeFromTheModuleOnceConnected)
-{
-    QSharedPointer<_TestModule> module(new ListingModule);
-    QStringList paths{u"stale"_s};
-    EXPECT_EQ(m_harness.GetLogFilePaths(module, paths), 2u);
-    EXPECT_EQ(paths, (QStringList{u"fs:/a.log"_s, u"fs:/b.log"_s}));
-
-    m_harness.SetTarget(u"absent"_s);
-    EXPECT_EQ(m_harness.GetLogFilePaths(module, paths), 0u);
-    EXPECT_TRUE(paths.isEmpty());
-    EXPECT_FALSE(m_harness.Unload(m_ctf));
-    EXPECT_FALSE(m_harness.Load(m_ctf));
-    EXPECT_TRUE(m_log.Text().contains(u"Load Error: A device is not available.\n"_s));
-}
-
-// Hands out modules in the order given and records how each ended.
-class RecordingSource : public ModuleSource
-{
-public:
-    RecordingSource(const QList<QSharedPointer<_TestModule>> &modules, bool keep) : m_modules(modules), m_keep(keep) { }
-    QSharedPointer<_TestModule> Next() override
-    {
-        return m_modules.isEmpty() ? QSharedPointer<_TestModule>() : m_modules.takeFirst();
-    }
-    void Finished(const QSharedPointer<_TestModule> &module, Outcome outcome) override
-    {
-        outcomes.append(module->moduleName + u' ' + QString::number(int(outcome)));
-    }
-    bool KeepFrameworks() const override { return m_keep; }
-
-    QStringList outcomes;
-
-private:
-    QList<QSharedPointer<_TestModule>> m_modules;
-    bool m_keep;
-};
 
 TEST_F(RunLoopTest, SourceRunKeepsFrameworksUntilTheEndWhenAsked)
 {
@@ -499,12 +370,18 @@ TEST_F(RunLoopTest, SourceRunKeepsFrameworksUntilTheEndWhenAsked)
                            "unload ctf"}));
 }
 
-TEST_F(RunLoopTest, SourceIsToldWhichModuleTheLostHandsetInterrupted)
+TEST_F(RunLoopTest, LostHandsetEndsTheRunWithoutUnloadingAndTheSourceLearnsWhichModuleItInterrupted)
 {
     QSharedPointer<RecordingModule> first = Queue(u"A"_s, u"ctf"_s);
-    LoseHandsetWhilePolling(*first);
-    RecordingSource source({first, Queue(u"B"_s, u"ctf"_s)}, true);
+    first->pollsNeeded = 5;
+    first->onPoll = [this](IKestoDevice *device) {
+        WriteFile(m_handsets.HandsetFolder(u"phone"_s) + u"/offline"_s, QByteArray());
+        device->FileExists(u"fs:/anything"_s);
+    };
+    RecordingSource source({first, Queue(u"B"_s, u"ctf"_s)}, false);
     EXPECT_FALSE(m_harness.Run(source));
+    EXPECT_EQ(m_events, (QStringList{"load ctf", "run A"}));
+    EXPECT_TRUE(m_log.Text().endsWith(u"Device Connection has died."_s));
     EXPECT_EQ(source.outcomes, QStringList{u"A %1"_s.arg(ModuleSource::Interrupted)});
 }
 

@@ -5,17 +5,7 @@
 #include <QDir>
 #include <QRegularExpression>
 
-using namespace Qt::StringLiterals;
-
 namespace {
-
-using controllertest::CatalogueModule;
-using controllertest::MakeCatalogue;
-using controllertest::ScriptedModule;
-using harnesstest::CapturedLog;
-using testutil::EnvGuard;
-using testutil::ReadFile;
-using testutil::WriteFile;
 
 using Modules = QList<QSharedPointer<_TestModule>>;
 
@@ -27,22 +17,14 @@ QStringList Names(const Modules &modules)
     return names;
 }
 
-// ---- Feature lists over catalogues held in memory ----
-
-class FeatureListTest : public ::testing::Test
+class FeatureListTest : public CatalogueHarnessTest
 {
 protected:
     void SetUp() override
     {
-        ASSERT_TRUE(m_dir.isValid());
-        m_harness.SetLogger(m_log.log());
-        m_kit = MakeCatalogue(m_dir.filePath(u"kit"_s), false,
-                              {CatalogueModule(u"Foo"_s, u"#1"_s, {}), CatalogueModule(u"Bar"_s, u"#2"_s, {}),
-                               CatalogueModule(u"Lib"_s, u"#3"_s, {}, QString(), u"secondary"_s)});
-        m_platform
-            = MakeCatalogue(m_dir.filePath(u"platform"_s), true,
-                            {CatalogueModule(u"Shell"_s, u"#4"_s, {}), CatalogueModule(u"FooPlus"_s, u"#5"_s, {})});
-        HarnessControllerAccess::SetCatalogues(m_harness, m_kit, m_platform);
+        UseCatalogues({CatalogueModule(u"Foo"_s, u"#1"_s, {}), CatalogueModule(u"Bar"_s, u"#2"_s, {}),
+                       CatalogueModule(u"Lib"_s, u"#3"_s, {}, QString(), u"secondary"_s)},
+                      {CatalogueModule(u"Shell"_s, u"#4"_s, {}), CatalogueModule(u"FooPlus"_s, u"#5"_s, {})});
     }
 
     QString Features(const QByteArray &xml)
@@ -51,12 +33,6 @@ protected:
         WriteFile(path, xml);
         return path;
     }
-
-    QTemporaryDir m_dir;
-    CapturedLog m_log;
-    Harness m_harness;
-    QSharedPointer<Manifest> m_kit;
-    QSharedPointer<Manifest> m_platform;
 };
 
 TEST_F(FeatureListTest, FeaturesSelectTheirModulesAndUnknownNamesAreWarnedOneByOne)
@@ -96,9 +72,13 @@ TEST_F(FeatureListTest, FeaturesSelectTheirModulesAndUnknownNamesAreWarnedOneByO
     }
 }
 
-TEST_F(FeatureListTest, PlatformOnlySelectionDrawsOnThePlatformCatalogue)
+TEST_F(FeatureListTest, FilterSelectionAppendsKitThenPlatformAndAPlatformOnlySelectionDrawsOnThePlatformAlone)
 {
-    HarnessControllerAccess::SetKitNotSelected(m_harness, true);
+    Modules kept{QSharedPointer<_TestModule>(new ScriptedModule(u"kept"_s))};
+    EXPECT_EQ(m_harness.GetTestModules(kept, QStringList{u"foo*"_s}, QString(), QString()), 3u);
+    EXPECT_EQ(Names(kept), (QStringList{u"kept"_s, u"Foo"_s, u"FooPlus"_s}));
+
+    HarnessTestAccess::SetKitNotSelected(m_harness, true);
     const QString path = Features("<f><feature testModule=\"Foo\"/><feature testModule=\"FooPlus\"/></f>");
     Modules modules;
     EXPECT_EQ(m_harness.GetTestModules(modules, path), 1u);
@@ -110,49 +90,25 @@ TEST_F(FeatureListTest, PlatformOnlySelectionDrawsOnThePlatformCatalogue)
     EXPECT_EQ(Names(filtered), (QStringList{u"FooPlus"_s, u"Shell"_s}));
 }
 
-TEST_F(FeatureListTest, FilterSelectionAppendsKitThenPlatform)
+TEST_F(FeatureListTest, BadFeatureFilesSelectNothingAndSayWhy)
 {
-    Modules modules{QSharedPointer<_TestModule>(new ScriptedModule(u"kept"_s))};
-    EXPECT_EQ(m_harness.GetTestModules(modules, QStringList{u"foo*"_s}, QString(), QString()), 3u);
-    EXPECT_EQ(Names(modules), (QStringList{u"kept"_s, u"Foo"_s, u"FooPlus"_s}));
+    const char *rows[][2] = {
+        // content (null: no file at all), the message as a pattern where %1 is the file's path
+        {nullptr, "BFS File %1 not found\\."},
+        {"<features><feature testModule=\"Foo\">", "Error Parsing BFS File %1, Error:.+ Line:1 Column:\\d+"},
+        {"<features>\n<feature testModule=\"Foo\">\n</x>", "Error Parsing BFS File %1, Error:.+ Line:3 Column:\\d+"},
+        {"<features><module name=\"Foo\"/></features>", "No testcases in BFS File %1\\."},
+    };
+    for (const auto &row : rows) {
+        SCOPED_TRACE(row[1]);
+        const QString path = row[0] ? Features(row[0]) : m_dir.filePath(u"missing.xml"_s);
+        Modules modules{QSharedPointer<_TestModule>(new ScriptedModule(u"stale"_s))};
+        EXPECT_EQ(m_harness.GetTestModules(modules, path), 0u);
+        EXPECT_TRUE(modules.isEmpty());
+        const QRegularExpression message(QString::fromLatin1(row[1]).arg(QRegularExpression::escape(path)));
+        EXPECT_TRUE(message.match(m_log.Text()).hasMatch()) << m_log.Text().toStdString();
+    }
 }
-
-struct BadFeatureFile
-{
-    const char *name;
-    const char *content; // null: no file at all
-    const char *message; // a pattern; %1 is the file's path
-};
-
-class BadFeatureFileTest : public FeatureListTest, public ::testing::WithParamInterface<BadFeatureFile>
-{
-};
-
-TEST_P(BadFeatureFileTest, SelectsNothingAndSaysWhy)
-{
-    const BadFeatureFile &c = GetParam();
-    QString path = m_dir.filePath(u"missing.xml"_s);
-    if (c.content)
-        path = Features(c.content);
-    Modules modules{QSharedPointer<_TestModule>(new ScriptedModule(u"stale"_s))};
-    EXPECT_EQ(m_harness.GetTestModules(modules, path), 0u);
-    EXPECT_TRUE(modules.isEmpty());
-    const QRegularExpression message(QString::fromLatin1(c.message).arg(QRegularExpression::escape(path)));
-    EXPECT_TRUE(message.match(m_log.Text()).hasMatch()) << m_log.Text().toStdString();
-}
-
-INSTANTIATE_TEST_SUITE_P(Files, BadFeatureFileTest,
-                         ::testing::Values(BadFeatureFile{"Missing", nullptr, "BFS File %1 not found\\."},
-                                           BadFeatureFile{"Truncated", "<features><feature testModule=\"Foo\">",
-                                                          "Error Parsing BFS File %1, Error:.+ Line:1 Column:\\d+"},
-                                           BadFeatureFile{"Mismatched",
-                                                          "<features>\n<feature testModule=\"Foo\">\n</x>",
-                                                          "Error Parsing BFS File %1, Error:.+ Line:3 Column:\\d+"},
-                                           BadFeatureFile{"NoFeatures", "<features><module name=\"Foo\"/></features>",
-                                                          "No testcases in BFS File %1\\."}),
-                         [](const ::testing::TestParamInfo<BadFeatureFile> &info) { return info.param.name; });
-
-// ---- Catalogues of real kits ----
 
 class CatalogueSetupTest : public ::testing::Test
 {
@@ -166,20 +122,25 @@ protected:
         ASSERT_TRUE(m_run.KitOk() && m_platform.Ok());
     }
 
+    // A CTF module with one test case.
     static kitbuilder::Module Module(const QString &name)
     {
         kitbuilder::Module module;
-        module.kind = u"ctf"_s;
         module.name = name;
         module.testCases = {name + u"_a"_s};
         return module;
     }
 
     QString KitPath() const { return m_run.Path(u"kit"_s); }
+    void ChooseBoth(Harness &harness) const
+    {
+        harness.SetTestkit(KitPath());
+        harness.SetPlatform(PlatformSetting());
+    }
     QString PlatformSetting() const { return m_run.Path(u"platform"_s); }
     QString PlatformPath() const { return m_run.Path(u"platform/pvs/platform"_s); }
 
-    testutil::KitRun m_run;
+    KitRun m_run;
     kitbuilder::KitBuilder m_platform{PlatformPath()};
     CapturedLog m_log;
     Harness m_harness;
@@ -192,8 +153,7 @@ TEST_F(CatalogueSetupTest, StaleKitCacheIsRegeneratedAndTheDefaultDevicePackTake
         Manifest old(KitPath(), false);
         WriteFile(old.ManifestFilePath(), "<testkit version=\"4\"><testmodules/></testkit>");
     }
-    m_harness.SetTestkit(KitPath());
-    m_harness.SetPlatform(PlatformSetting());
+    ChooseBoth(m_harness);
     Modules modules;
     EXPECT_EQ(m_harness.GetTestModules(modules, QStringList(), QString(), QString()), 2u);
     EXPECT_EQ(Names(modules), (QStringList{u"Audio"_s, u"Shell"_s}));
@@ -212,79 +172,60 @@ TEST_F(CatalogueSetupTest, StaleKitCacheIsRegeneratedAndTheDefaultDevicePackTake
     CapturedLog second;
     Harness again;
     again.SetLogger(second.log());
-    again.SetTestkit(KitPath());
-    again.SetPlatform(PlatformSetting());
+    ChooseBoth(again);
     Modules more;
     EXPECT_EQ(again.GetTestModules(more, QStringList{u"audio"_s}, QString(), QString()), 1u);
     EXPECT_FALSE(second.Text().contains(u"Generating manifest"_s));
 }
 
-TEST_F(CatalogueSetupTest, DevicePackGivenBeforehandIsKept)
+TEST_F(CatalogueSetupTest, DevicePackGivenBeforehandIsKeptAndGenerateManifestWritesEachCatalogueToItsCache)
 {
     const QString pack = m_run.Path(u"mine.dso"_s);
     WriteFile(pack, "<dso/>");
     m_harness.SetDPK(pack);
-    m_harness.SetTestkit(KitPath());
-    m_harness.SetPlatform(PlatformSetting());
+    ChooseBoth(m_harness);
     Modules modules;
     m_harness.GetTestModules(modules, QStringList(), QString(), QString());
     EXPECT_FALSE(m_log.Text().contains(u"Using the default device pack."_s));
-    EXPECT_EQ(HarnessControllerAccess::Environment(m_harness).value(u"DevicePack"_s), QDir::cleanPath(pack));
-}
+    EXPECT_EQ(HarnessTestAccess::Environment(m_harness).value(u"DevicePack"_s), QDir::cleanPath(pack));
 
-TEST_F(CatalogueSetupTest, GenerateManifestWritesEachCatalogueToItsCache)
-{
-    m_harness.SetTestkit(KitPath());
-    m_harness.SetPlatform(PlatformSetting());
     EXPECT_TRUE(m_harness.GenerateManifest(QString()));
     Manifest kit(KitPath(), false);
     Manifest platform(PlatformPath(), true);
-    const QString log = m_log.Text();
-    EXPECT_TRUE(log.contains(u"Manifest written to "_s + kit.ManifestFilePath()));
-    EXPECT_TRUE(log.contains(u"Manifest written to "_s + platform.ManifestFilePath()));
+    EXPECT_TRUE(m_log.Text().contains(u"Manifest written to "_s + kit.ManifestFilePath()));
+    EXPECT_TRUE(m_log.Text().contains(u"Manifest written to "_s + platform.ManifestFilePath()));
     EXPECT_TRUE(kit.ReadManifest());
     EXPECT_TRUE(kit.FindTestModule(u"audio"_s));
-    EXPECT_TRUE(HarnessControllerAccess::Kit(m_harness));
-    EXPECT_TRUE(HarnessControllerAccess::Platform(m_harness));
 }
 
-TEST_F(CatalogueSetupTest, GenerateManifestToARelativePathCreatesItsFolder)
+TEST_F(CatalogueSetupTest, GenerateManifestCreatesTheFolderOfARelativePathOrFallsBackToTheHomeFolderOrFails)
 {
-    testutil::CurrentDirectory cwd(m_run.Path(u"."_s));
-    m_harness.SetTestkit(KitPath());
-    EXPECT_TRUE(m_harness.GenerateManifest(u"out/sub/kit.xml"_s));
+    ChooseBoth(m_harness);
+    {
+        CurrentDirectory cwd(m_run.Path(u"."_s));
+        EXPECT_TRUE(m_harness.GenerateManifest(u"out/sub/kit.xml"_s));
+    }
     const QString written = m_run.Path(u"out/sub/kit.xml"_s);
     EXPECT_TRUE(m_log.Text().contains(u"Manifest "_s + KitPath() + u" written to "_s + written));
     QDomDocument document;
     ASSERT_TRUE(document.setContent(ReadFile(written)));
     EXPECT_EQ(document.documentElement().tagName(), u"testkit"_s);
-}
 
-TEST_F(CatalogueSetupTest, GenerateManifestFallsBackToTheHomeFolder)
-{
     const QString home = m_run.Path(u"home"_s);
     QDir().mkpath(home);
     EnvGuard homeGuard("HOME", home);
     // A regular file stands where the output folder should be.
     WriteFile(m_run.Path(u"blocked"_s), "x");
-    m_harness.SetTestkit(KitPath());
-    m_harness.SetPlatform(PlatformSetting());
     EXPECT_TRUE(m_harness.GenerateManifest(m_run.Path(u"blocked/kits.xml"_s)));
 
     const QString fallback = QDir::cleanPath(home + u"/kits.xml"_s);
     EXPECT_TRUE(m_log.Text().contains(u"Manifest "_s + PlatformPath() + u" written to "_s + fallback));
     // Both catalogues went to the one file; the platform's came last.
     Manifest platform(PlatformPath(), true);
-    QDomDocument document;
     ASSERT_TRUE(document.setContent(ReadFile(fallback)));
     EXPECT_EQ(document.documentElement().attribute(u"path"_s), platform.kitPath);
-}
 
-TEST_F(CatalogueSetupTest, GenerateManifestWithoutAnyWritableFileFails)
-{
-    WriteFile(m_run.Path(u"blocked"_s), "x");
-    EnvGuard homeGuard("HOME", m_run.Path(u"blocked/home"_s));
-    m_harness.SetTestkit(KitPath());
+    homeGuard.Set("HOME", m_run.Path(u"blocked/home"_s));
     EXPECT_FALSE(m_harness.GenerateManifest(m_run.Path(u"blocked/kits.xml"_s)));
     EXPECT_TRUE(m_log.Text().contains(u"Manifest can't be opened for writing."_s));
 }

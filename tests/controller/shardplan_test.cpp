@@ -1,22 +1,17 @@
-// Splitting a selection between hosts: the plan, the shard a process runs
-// (options and job-engine variables) and the recorded module times.
+// Splitting a selection between hosts: the plan, the shard a process runs (options and job-engine variables), the
+// recorded module times and the shards' results merged into one report.
 
 #include "controller/moduletimings.h"
+#include "controller/resultsmerge.h"
 #include "controller/shardplan.h"
 #include "controller/shardsetting.h"
 
-#include "support/testutil.h"
+#include "harnesstest.h"
 
-#include <QDir>
-#include <QTemporaryDir>
 #include <QTimeZone>
-
-#include <gtest/gtest.h>
 
 #include <algorithm>
 #include <random>
-
-using namespace Qt::StringLiterals;
 
 namespace {
 
@@ -57,13 +52,9 @@ TEST(ShardPlanTest, EveryModuleLandsInExactlyOneShardForAnyCount)
         const QList<QString> assigned = Assignment(plan).keys();
         EXPECT_EQ(QSet<QString>(assigned.cbegin(), assigned.cend()), distinct) << count;
         qint64 expected = 0;
-        for (const ShardPlan::Entry &entry : plan.Modules()) {
-            EXPECT_GE(entry.shard, 0);
-            EXPECT_LT(entry.shard, count);
+        for (const ShardPlan::Entry &entry : plan.Modules())
             expected += entry.expectedMs;
-        }
         EXPECT_EQ(total, expected) << count;
-        EXPECT_TRUE(plan.Shard(count).isEmpty());
     }
 }
 
@@ -82,8 +73,8 @@ TEST(ShardPlanTest, PlanIsTheSameWhateverTheSelectionOrder)
 
 TEST(ShardPlanTest, LongestFirstBalancesAndUnknownModulesCountTheirTestCases)
 {
-    // Known: 6000 ms for 3 test cases and 1000 ms for 1: the median is 1500
-    // ms per test case (of 2000 and 1000), so 4 test cases count 6000 ms.
+    // Known: 6000 ms for 3 test cases and 1000 ms for 1: the median is 1500 ms per test case (of 2000 and 1000), so 4
+    // test cases count 6000 ms.
     const QList<Module> selection{{u"a"_s, u"KVK"_s, 3, 6000},
                                   {u"b"_s, u"KVK"_s, 1, 1000},
                                   {u"c"_s, u"KVK"_s, 4, -1},
@@ -112,91 +103,62 @@ TEST(ShardPlanTest, LongestFirstBalancesAndUnknownModulesCountTheirTestCases)
     EXPECT_EQ(ShardPlan::FormatDuration(3723400), u"1:02:03"_s);
 }
 
-struct SettingRow
+TEST(ShardSettingTest, ReadsOptionsAndEngineVariables)
 {
-    const char *what;
-    QString index;
-    QString count;
-    QMap<QString, QString> environment;
-    bool ok;
-    int expectedIndex;
-    int expectedCount;
-    const char *errorPart; // for a refused row
-};
-
-class ShardSettingTest : public ::testing::TestWithParam<SettingRow>
-{
-};
-
-TEST_P(ShardSettingTest, ReadsOptionsAndEngineVariables)
-{
-    const SettingRow &row = GetParam();
-    ShardSetting setting;
-    QString error;
-    EXPECT_EQ(ShardSetting::Resolve(row.index, row.count, row.environment, true, &setting, &error), row.ok)
-        << row.what << ": " << error.toStdString();
-    if (row.ok) {
-        EXPECT_EQ(setting.index, row.expectedIndex) << row.what;
-        EXPECT_EQ(setting.count, row.expectedCount) << row.what;
+    // The options (null: not given), the engine variables "NAME=value;...", and the error a refused row gives or the
+    // shard an accepted one takes.
+    const struct
+    {
+        const char *what, *index, *count, *variables, *error;
+        int expectedIndex = 0, expectedCount = 0;
+    } rows[] = {
+        {"nothing", nullptr, nullptr, "", nullptr, -1, 1},
+        {"options", "2", "5", "", nullptr, 2, 5},
+        {"bazel", nullptr, nullptr, "TEST_SHARD_INDEX=0;TEST_TOTAL_SHARDS=4", nullptr, 0, 4},
+        {"gitlab is 1-based", nullptr, nullptr, "CI_NODE_INDEX=3;CI_NODE_TOTAL=3", nullptr, 2, 3},
+        {"gitlab job without parallel", nullptr, nullptr, "CI_NODE_TOTAL=1", nullptr, -1, 1},
+        {"kubernetes", nullptr, "6", "JOB_COMPLETION_INDEX=5", nullptr, 5, 6},
+        {"options win", "1", "2", "TEST_SHARD_INDEX=7;TEST_TOTAL_SHARDS=9;CI_NODE_INDEX=x", nullptr, 1, 2},
+        {"engines agree", nullptr, nullptr, "TEST_SHARD_INDEX=1;TEST_TOTAL_SHARDS=2;CI_NODE_INDEX=2;CI_NODE_TOTAL=2",
+         nullptr, 1, 2},
+        {"engines disagree", nullptr, nullptr, "TEST_SHARD_INDEX=0;TEST_TOTAL_SHARDS=2;CI_NODE_INDEX=2;CI_NODE_TOTAL=2",
+         "disagree"},
+        {"kubernetes against bazel", nullptr, "3", "JOB_COMPLETION_INDEX=1;TEST_SHARD_INDEX=1;TEST_TOTAL_SHARDS=4",
+         "disagree"},
+        {"kubernetes without a count", nullptr, nullptr, "JOB_COMPLETION_INDEX=1", "--shard-count"},
+        {"index not below count", "3", "3", "", "not below"},
+        {"bazel index not below total", nullptr, nullptr, "TEST_SHARD_INDEX=4;TEST_TOTAL_SHARDS=4", "not below"},
+        {"gitlab index 0", nullptr, nullptr, "CI_NODE_INDEX=0;CI_NODE_TOTAL=2", "outside 1..2"},
+        {"no shards", "0", "0", "", "must be 1 to"},
+        {"too many shards", "0", "999999999", "", "must be 1 to"},
+        {"negative", "-1", "3", "", "not a shard number"},
+        {"not a number", "1", "three", "", "not a number of shards"},
+        {"blank in a variable", nullptr, nullptr, "TEST_SHARD_INDEX= 1;TEST_TOTAL_SHARDS=2", "not a shard number"},
+        {"bazel half set", nullptr, nullptr, "TEST_TOTAL_SHARDS=2", "TEST_TOTAL_SHARDS is set without"},
+        {"gitlab total without index", nullptr, nullptr, "CI_NODE_TOTAL=4", "without CI_NODE_INDEX"},
+        {"index without count", "1", nullptr, "", "needs --shard-count"},
+        {"count without index", nullptr, "4", "", "needs --shard-index"},
+    };
+    for (const auto &row : rows) {
+        SCOPED_TRACE(row.what);
+        QMap<QString, QString> variables;
+        for (const QString &pair : QString::fromLatin1(row.variables).split(u';', Qt::SkipEmptyParts))
+            variables.insert(pair.section(u'=', 0, 0), pair.section(u'=', 1));
+        const QString index = QString::fromLatin1(row.index), count = QString::fromLatin1(row.count);
+        ShardSetting setting;
+        QString error;
+        ASSERT_EQ(ShardSetting::Resolve(index, count, variables, true, &setting, &error), !row.error)
+            << error.toStdString();
+        if (row.error) {
+            EXPECT_TRUE(error.contains(QLatin1String(row.error))) << error.toStdString();
+            continue;
+        }
+        EXPECT_EQ(setting.index, row.expectedIndex);
+        EXPECT_EQ(setting.count, row.expectedCount);
         EXPECT_EQ(setting.sharded,
-                  row.expectedCount > 1 || !row.index.isEmpty() || !row.count.isEmpty()
-                      || row.environment.contains(u"TEST_SHARD_INDEX"_s))
-            << row.what;
-    } else {
-        EXPECT_TRUE(error.contains(QLatin1String(row.errorPart))) << row.what << ": " << error.toStdString();
+                  row.expectedCount > 1 || row.index || row.count || variables.contains(u"TEST_SHARD_INDEX"_s));
     }
 }
-
-using Env = QMap<QString, QString>;
-const QString kNone;
-
-INSTANTIATE_TEST_SUITE_P(
-    Conventions, ShardSettingTest,
-    ::testing::Values(
-        SettingRow{"nothing", kNone, kNone, {}, true, -1, 1, ""}, SettingRow{"options", "2", "5", {}, true, 2, 5, ""},
-        SettingRow{"bazel", kNone, kNone, Env{{"TEST_SHARD_INDEX", "0"}, {"TEST_TOTAL_SHARDS", "4"}}, true, 0, 4, ""},
-        SettingRow{"gitlab is 1-based", kNone, kNone, Env{{"CI_NODE_INDEX", "3"}, {"CI_NODE_TOTAL", "3"}}, true, 2, 3,
-                   ""},
-        SettingRow{"gitlab job without parallel", kNone, kNone, Env{{"CI_NODE_TOTAL", "1"}}, true, -1, 1, ""},
-        SettingRow{"kubernetes", kNone, "6", Env{{"JOB_COMPLETION_INDEX", "5"}}, true, 5, 6, ""},
-        SettingRow{"options win", "1", "2",
-                   Env{{"TEST_SHARD_INDEX", "7"}, {"TEST_TOTAL_SHARDS", "9"}, {"CI_NODE_INDEX", "x"}}, true, 1, 2, ""},
-        SettingRow{
-            "engines that agree", kNone, kNone,
-            Env{{"TEST_SHARD_INDEX", "1"}, {"TEST_TOTAL_SHARDS", "2"}, {"CI_NODE_INDEX", "2"}, {"CI_NODE_TOTAL", "2"}},
-            true, 1, 2, ""},
-        SettingRow{
-            "engines that disagree", kNone, kNone,
-            Env{{"TEST_SHARD_INDEX", "0"}, {"TEST_TOTAL_SHARDS", "2"}, {"CI_NODE_INDEX", "2"}, {"CI_NODE_TOTAL", "2"}},
-            false, 0, 0, "disagree"},
-        SettingRow{"kubernetes against bazel", kNone, "3",
-                   Env{{"JOB_COMPLETION_INDEX", "1"}, {"TEST_SHARD_INDEX", "1"}, {"TEST_TOTAL_SHARDS", "4"}}, false, 0,
-                   0, "disagree"},
-        SettingRow{"kubernetes without a count", kNone, kNone, Env{{"JOB_COMPLETION_INDEX", "1"}}, false, 0, 0,
-                   "--shard-count"},
-        SettingRow{"index not below count", "3", "3", {}, false, 0, 0, "not below"},
-        SettingRow{"bazel index not below total", kNone, kNone,
-                   Env{{"TEST_SHARD_INDEX", "4"}, {"TEST_TOTAL_SHARDS", "4"}}, false, 0, 0, "not below"},
-        SettingRow{"gitlab index 0", kNone, kNone, Env{{"CI_NODE_INDEX", "0"}, {"CI_NODE_TOTAL", "2"}}, false, 0, 0,
-                   "outside 1..2"},
-        SettingRow{"no shards", "0", "0", {}, false, 0, 0, "must be 1 to"},
-        SettingRow{"too many shards", "0", "999999999", {}, false, 0, 0, "must be 1 to"},
-        SettingRow{"negative", "-1", "3", {}, false, 0, 0, "not a shard number"},
-        SettingRow{"not a number", "1", "three", {}, false, 0, 0, "not a number of shards"},
-        SettingRow{"blank in a variable", kNone, kNone, Env{{"TEST_SHARD_INDEX", " 1"}, {"TEST_TOTAL_SHARDS", "2"}},
-                   false, 0, 0, "not a shard number"},
-        SettingRow{"bazel half set", kNone, kNone, Env{{"TEST_TOTAL_SHARDS", "2"}}, false, 0, 0,
-                   "TEST_TOTAL_SHARDS is set without"},
-        SettingRow{"gitlab total without index", kNone, kNone, Env{{"CI_NODE_TOTAL", "4"}}, false, 0, 0,
-                   "without CI_NODE_INDEX"},
-        SettingRow{"index without count", "1", kNone, {}, false, 0, 0, "needs --shard-count"},
-        SettingRow{"count without index", kNone, "4", {}, false, 0, 0, "needs --shard-index"}),
-    [](const ::testing::TestParamInfo<SettingRow> &info) {
-        std::string name = info.param.what;
-        std::replace_if(
-            name.begin(), name.end(), [](char c) { return !std::isalnum(static_cast<unsigned char>(c)); }, '_');
-        return name;
-    });
 
 TEST(ShardSettingTest, CountAloneServesThePlanOfEveryShardAndBazelLearnsOfSharding)
 {
@@ -221,13 +183,11 @@ ModuleTimings::Run At(qint64 ms, const QString &host, int minute)
     return {ms, u"h1"_s, host, QDateTime(QDate(2026, 12, 6), QTime(20, minute), QTimeZone::utc())};
 }
 
-TEST(ModuleTimingsTest, RecordsMergesAndKeepsTheRecentRuns)
+TEST(ModuleTimingsTest, RecordsMergesAndKeepsTheRecentRunsAndRefusesBadOrForeignFiles)
 {
     QTemporaryDir dir;
-    const QString a = dir.filePath(u"a/Timings.json"_s);
-    const QString b = dir.filePath(u"b/Timings.json"_s);
-    QDir().mkpath(dir.filePath(u"a"_s));
-    QDir().mkpath(dir.filePath(u"b"_s));
+    const QString a = dir.filePath(u"a.json"_s);
+    const QString b = dir.filePath(u"b.json"_s);
     QString error;
     for (int i = 0; i < 12; ++i) // 100, 200, ... 1200 ms on host a
         ASSERT_TRUE(ModuleTimings::Record(a, u"Audio"_s, u"KVK"_s, At(100 * (i + 1), u"a"_s, i), &error))
@@ -257,43 +217,105 @@ TEST(ModuleTimingsTest, RecordsMergesAndKeepsTheRecentRuns)
     ASSERT_TRUE(again.Read(merged));
     EXPECT_EQ(again.Runs(u"Audio"_s, u"KVK"_s), runs);
     EXPECT_EQ(ModuleTimings::PathFor(u"h1"_s).section(u'/', -3), u"Logs/ProcessedResults/Timings.json"_s);
-}
 
-TEST(ModuleTimingsTest, RefusesBadOrForeignFilesAndLosesNothing)
-{
-    QTemporaryDir dir;
+    // Bad or foreign files are refused and lose nothing.
     const QString path = dir.filePath(u"Timings.json"_s);
-    const QString good = dir.filePath(u"good.json"_s);
-    ASSERT_TRUE(ModuleTimings::Record(good, u"Audio"_s, u"KVK"_s, At(10, u"a"_s, 0)));
+    const QByteArray head = "{\"format\": \"harness-timings\", \"version\": 1, \"modules\": ";
+    const QByteArray module = head + "[{\"name\": \"A\", \"source\": \"KVK\"";
+    const QByteArray run = module + ", \"runs\": [{\"handset\": \"h\", \"host\": \"x\", ";
     const QList<QPair<QByteArray, const char *>> rows{
         {"{\"modules\": [", "not JSON"},
         {"[1, 2]", "not a timings file"},
         {"{\"format\": \"other\", \"version\": 1, \"modules\": []}", "not a timings file"},
         {"{\"format\": \"harness-timings\", \"version\": 2, \"modules\": []}", "version 2"},
-        {"{\"format\": \"harness-timings\", \"version\": 1, \"modules\": {}}", "\"modules\" is not a list"},
-        {"{\"format\": \"harness-timings\", \"version\": 1, \"modules\": [{\"name\": \"A\", \"source\": \"KVK\"}]}",
-         "module 0 needs"},
-        {"{\"format\": \"harness-timings\", \"version\": 1, \"modules\": [{\"name\": \"A\", \"source\": \"KVK\", "
-         "\"runs\": [{\"ms\": -5, \"handset\": \"h\", \"host\": \"x\", \"at\": \"2026-12-06T20:00:00Z\"}]}]}",
-         "whole milliseconds"},
-        {"{\"format\": \"harness-timings\", \"version\": 1, \"modules\": [{\"name\": \"A\", \"source\": \"KVK\", "
-         "\"runs\": [{\"ms\": 5, \"handset\": \"h\", \"host\": \"x\", \"at\": \"yesterday\"}]}]}",
-         "ISO date"},
+        {head + "{}}", "\"modules\" is not a list"},
+        {module + "}]}", "module 0 needs"},
+        {run + "\"ms\": -5, \"at\": \"2026-12-06T20:00:00Z\"}]}]}", "whole milliseconds"},
+        {run + "\"ms\": 5, \"at\": \"yesterday\"}]}]}", "ISO date"},
     };
     for (const auto &[bytes, message] : rows) {
-        testutil::WriteFile(path, bytes);
-        ModuleTimings timings;
-        ASSERT_TRUE(timings.Read(good));
-        EXPECT_FALSE(timings.Merge(path)) << message;
-        EXPECT_TRUE(timings.ErrorString().contains(QLatin1String(message))) << timings.ErrorString().toStdString();
-        EXPECT_EQ(timings.ExpectedMs(u"Audio"_s, u"KVK"_s), 10) << message;
-        QString error;
+        WriteFile(path, bytes);
+        EXPECT_FALSE(again.Merge(path)) << message;
+        EXPECT_TRUE(again.ErrorString().contains(QLatin1String(message))) << again.ErrorString().toStdString();
+        EXPECT_EQ(again.Runs(u"Audio"_s, u"KVK"_s), runs) << message;
         EXPECT_FALSE(ModuleTimings::Record(path, u"B"_s, u"KVK"_s, At(1, u"a"_s, 1), &error)) << message;
-        EXPECT_EQ(testutil::ReadFile(path), bytes) << message;
+        EXPECT_EQ(ReadFile(path), bytes) << message;
     }
-    ModuleTimings timings;
-    EXPECT_FALSE(timings.Read(dir.filePath(u"missing.json"_s)));
-    EXPECT_TRUE(timings.ErrorString().contains(u"cannot open"_s));
+    ModuleTimings none;
+    EXPECT_FALSE(none.Read(dir.filePath(u"missing.json"_s)));
+    EXPECT_TRUE(none.ErrorString().contains(u"cannot open"_s));
+}
+
+// A processed-results file of one module "M" (source KVK) whose test cases carry the given verdicts, and a module
+// "Idle" that did not run.
+QByteArray ResultsFile(const QStringList &verdicts, const QByteArray &kitHash = "#1")
+{
+    QByteArray text = "<testmodules kvkHash=\"" + kitHash
+        + "\" platformHash=\"\">\n"
+          " <module family=\"f\" id_hash=\"#9\" name=\"M\" source=\"KVK\" subfamily=\"s\">\n";
+    for (qsizetype i = 0; i < verdicts.size(); ++i)
+        text += "  <testcase name=\"t" + QByteArray::number(i) + "\" result=\"" + verdicts.at(i).toLatin1() + "\"/>\n";
+    return text
+        + " </module>\n <module name=\"Idle\" source=\"KVK\" id_hash=\"#8\">\n"
+          "  <testcase name=\"t0\" result=\"unexecuted\"/>\n </module>\n</testmodules>\n";
+}
+
+TEST(ResultsMergeTest, AModuleRunTwiceKeepsTheVerdictThatWins)
+{
+    QTemporaryDir dir;
+    const QString first = dir.filePath(u"data/Norvane/Targets/My%20Phone/Logs/ProcessedResults/ProcessedResults.xml"_s);
+    const QString second = dir.filePath(u"b.xml"_s);
+    // The verdict kept of each pair is the stronger one.
+    WriteFile(first, ResultsFile({u"pass"_s, u"fail"_s, u"unexecuted"_s}));
+    WriteFile(second, ResultsFile({u"fail"_s, u"pass"_s, u"unexecuted"_s}));
+    ASSERT_TRUE(ModuleTimings::Record(QFileInfo(second).absolutePath() + u"/Timings.json"_s, u"m"_s, u"KVK"_s,
+                                      {5, u"h2"_s, u"lab-2"_s, QDateTime::currentDateTimeUtc()}));
+
+    ResultsMerge merge;
+    ASSERT_TRUE(merge.Add(first, QString(), u"lab-1"_s)) << merge.ErrorString().toStdString();
+    ASSERT_TRUE(merge.Add(second)) << merge.ErrorString().toStdString();
+    merge.Expect({{u"Other"_s, u"PVS"_s, u"g"_s, QString(), {u"x"_s}}, {u"M"_s, u"KVK"_s, QString(), QString(), {}}});
+    const QList<ResultsMerge::Row> rows = merge.Rows();
+    ASSERT_EQ(rows.size(), 2); // "Idle" ran nowhere and was not expected
+    EXPECT_EQ(rows.at(0).name, u"Other"_s);
+    EXPECT_FALSE(rows.at(0).ran);
+    EXPECT_EQ(rows.at(0).testCases, (QList<QPair<QString, QString>>{{u"x"_s, u"unexecuted"_s}}));
+    const ResultsMerge::Row &m = rows.at(1);
+    EXPECT_TRUE(m.ran);
+    EXPECT_EQ(m.family, u"f"_s);
+    EXPECT_EQ(m.handset, u"My Phone, h2"_s);
+    EXPECT_EQ(m.host, u"lab-1, lab-2"_s);
+    EXPECT_EQ(m.testCases,
+              (QList<QPair<QString, QString>>{{u"t0"_s, u"pass"_s}, {u"t1"_s, u"pass"_s}, {u"t2"_s, u"unexecuted"_s}}));
+    EXPECT_EQ(merge.NotRun(), QStringList{u"Other"_s});
+    EXPECT_EQ(merge.Timings().ExpectedMs(u"M"_s, u"KVK"_s), 5);
+}
+
+TEST(ResultsMergeTest, RefusesFilesItCannotMergeAndKeepsWhatItHas)
+{
+    QTemporaryDir dir;
+    const QString good = dir.filePath(u"good.xml"_s);
+    WriteFile(good, ResultsFile({u"pass"_s}));
+    const QList<QPair<QByteArray, const char *>> rows{
+        {"<testmodules><module name=", "is not a processed-results file"},
+        {"<manifest/>", "its root is <manifest>"},
+        {ResultsFile({u"fail"_s}, "#2"), "another test kit"},
+    };
+    for (const auto &[bytes, message] : rows) {
+        const QString bad = dir.filePath(u"bad.xml"_s);
+        WriteFile(bad, bytes);
+        ResultsMerge merge;
+        ASSERT_TRUE(merge.Add(good));
+        EXPECT_FALSE(merge.Add(bad)) << message;
+        EXPECT_TRUE(merge.ErrorString().contains(QLatin1String(message))) << merge.ErrorString().toStdString();
+        ASSERT_EQ(merge.Rows().size(), 1);
+        EXPECT_EQ(merge.Rows().at(0).testCases.at(0).second, u"pass"_s) << message;
+    }
+    ResultsMerge merge;
+    EXPECT_FALSE(merge.Add(dir.filePath(u"missing.xml"_s)));
+    WriteFile(dir.filePath(u"Timings.json"_s), "{}");
+    EXPECT_FALSE(merge.Add(good)); // a damaged timings file beside it
+    EXPECT_TRUE(merge.ErrorString().contains(u"not a timings file"_s));
 }
 
 } // namespace
