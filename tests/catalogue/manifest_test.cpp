@@ -512,12 +512,10 @@ TEST_F(ManifestCacheTest, WrittenCatalogueIsWellFormedAndReadsBackTheSame)
     EXPECT_EQ(root.firstChildElement().tagName(), u"testmodules"_s);
     EXPECT_EQ(root.lastChildElement().tagName(), u"frameworks"_s);
     EXPECT_EQ(root.firstChildElement().childNodes().size(), 6);
-    QByteArray output;
-    if (testutil::HaveProgram(u"xmllint"_s))
-        EXPECT_EQ(testutil::RunProgram(u"xmllint"_s, {u"--noout"_s, scanned.cacheFile}, &output), 0)
-            << output.toStdString();
+    testutil::ExpectXmllintAccepts(scanned.cacheFile);
     // The tool scans in a process of its own, with its own hash seed: the
     // catalogue it writes must hold the same bytes.
+    QByteArray output;
     ASSERT_EQ(testutil::RunProgram(u"" HARNESS_BINARY_DIR "/harness"_s,
                                    {u"manifest"_s, u"--kit"_s, kit->Root(), u"-o"_s, TempPath(u"tool"_s)}, &output),
               0)

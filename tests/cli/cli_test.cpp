@@ -45,17 +45,6 @@ QMap<QString, QString> Rows(const QByteArray &out)
     return rows;
 }
 
-void ExpectXmllintAccepts(const QString &path, const QString &schema)
-{
-    if (!testutil::HaveProgram(u"xmllint"_s))
-        return;
-    QStringList arguments{u"--noout"_s, path};
-    if (!schema.isEmpty())
-        arguments << u"--schema"_s << testutil::DataPath(schema);
-    QByteArray lint;
-    EXPECT_EQ(testutil::RunProgram(u"xmllint"_s, arguments, &lint), 0) << path.toStdString() << lint.constData();
-}
-
 QDomDocument ReadXml(const QString &path)
 {
     QDomDocument doc;

@@ -45,10 +45,6 @@ template <typename... Parts> ToolResult Tool(const Parts &...parts)
 // of a summary table.
 QMap<QString, QString> Rows(const QByteArray &out);
 
-// Fails the test when xmllint, if installed, finds the file malformed or, with
-// a schema (a path under tests/data), invalid.
-void ExpectXmllintAccepts(const QString &path, const QString &schema = QString());
-
 // The file as a document; fails the test when it does not parse.
 QDomDocument ReadXml(const QString &path);
 

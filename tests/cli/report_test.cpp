@@ -45,7 +45,7 @@ TEST_F(ReportTool, SummarisesExecutedModulesAndFailsWhenATestCaseFailed)
 TEST_F(ReportTool, JUnitAndJsonFilesCarryTheVerdicts)
 {
     ASSERT_EQ(Tool("report --all --junit junit.xml --json summary.json ProcessedResults.xml").status, 1);
-    ExpectXmllintAccepts(u"junit.xml"_s);
+    testutil::ExpectXmllintAccepts(u"junit.xml"_s);
     const QDomElement suites = ReadXml(u"junit.xml"_s).documentElement();
     EXPECT_EQ(suites.tagName(), u"testsuites"_s);
     EXPECT_EQ(suites.attribute(u"tests"_s), u"5"_s);

@@ -125,7 +125,7 @@ protected:
     // The JUnit file, checked against the schema CI servers read.
     static QDomElement JUnit(const QString &path)
     {
-        ExpectXmllintAccepts(path, u"junit/junit.xsd"_s);
+        testutil::ExpectXmllintAccepts(path, u"junit/junit.xsd"_s);
         return ReadXml(path).documentElement();
     }
 

@@ -99,8 +99,9 @@ TEST(XmlNode, ReadsEveryDocumentAsTheDomDoes)
         EXPECT_EQ(ThroughTree(XmlNode::Parse(bytes)), expected) << bytes.constData();
         EXPECT_EQ(ThroughTree(XmlNode::ParseFully(bytes)), expected) << bytes.constData();
         // Plain documents never need the slower reader.
-        if (i + kFullOnly < std::size(kWellFormed))
+        if (i + kFullOnly < std::size(kWellFormed)) {
             EXPECT_EQ(ThroughTree(XmlNodeTestAccess::ParseQuickly(bytes)), expected) << bytes.constData();
+        }
     }
 }
 

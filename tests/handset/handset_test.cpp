@@ -145,7 +145,7 @@ TEST_P(EmulatedHandsetFailure, FailsWithItsErrorNumber)
 {
     testutil::WriteFile(Host("fs:/file"), "x");
     testutil::WriteFile(Work("new"), "new");
-    ASSERT_TRUE(testutil::WritePackage(Work("empty.kestix"), {}));
+    ASSERT_TRUE(KitWriter::WritePackage(Work("empty.kestix"), {}));
     // Symbolic links out of the handset are never followed.
     QDir().mkpath(Host("fs:/usermods"));
     ASSERT_TRUE(QFile::link(outside, Host("fs:/usermods/escape")));

@@ -82,6 +82,24 @@ bool HaveProgram(const QString &program)
     return !QStandardPaths::findExecutable(program).isEmpty();
 }
 
+void ExpectProgramAccepts(const QString &program, const QStringList &arguments)
+{
+    if (!HaveProgram(program))
+        return;
+    QByteArray output;
+    EXPECT_EQ(RunProgram(program, arguments, &output), 0)
+        << program.toStdString() << ' ' << arguments.join(u' ').toStdString() << '\n'
+        << output.constData();
+}
+
+void ExpectXmllintAccepts(const QString &path, const QString &schema)
+{
+    QStringList arguments{u"--noout"_s, path};
+    if (!schema.isEmpty())
+        arguments << u"--schema"_s << DataPath(schema);
+    ExpectProgramAccepts(u"xmllint"_s, arguments);
+}
+
 QString DataPath(const QString &relative)
 {
     return QStringLiteral(HARNESS_TEST_DATA_DIR) + u'/' + relative;

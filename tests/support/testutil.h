@@ -56,6 +56,14 @@ int RunProgram(const QString &program, const QStringList &arguments, QByteArray 
 // True when a program of that name is on PATH.
 bool HaveProgram(const QString &program);
 
+// When the program is installed, runs it and expects exit status 0; its
+// output is shown on failure.
+void ExpectProgramAccepts(const QString &program, const QStringList &arguments);
+
+// xmllint finds the file well formed (and valid against a schema of
+// tests/data when one is named).
+void ExpectXmllintAccepts(const QString &path, const QString &schema = QString());
+
 // The folder of data files committed under tests/data.
 QString DataPath(const QString &relative);
 
