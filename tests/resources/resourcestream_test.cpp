@@ -10,8 +10,7 @@
 
 #include <gtest/gtest.h>
 
-#include <algorithm>
-#include <initializer_list>
+#include <array>
 
 using namespace Qt::StringLiterals;
 
@@ -20,66 +19,45 @@ namespace {
 using testutil::ReadFile;
 
 using resourcebytes::Hex;
-using resourcebytes::U16;
-using resourcebytes::U32;
+using resourcebytes::LittleEndian;
+using resourcebytes::U16s;
+using resourcebytes::U32s;
 
-// A resource file put together by hand: header counts as given, map entries
-// as {type, first ID, additional IDs, offset index}, the offsets as given.
-QByteArray Compose(std::initializer_list<std::initializer_list<quint16>> map, std::initializer_list<quint32> offsets,
-                   const QByteArray &data, quint32 resourceCount)
+// {type, first ID, additional IDs, offset index}
+using MapEntry = std::array<quint16, 4>;
+
+// A resource file put together by hand: the header's resource count as given,
+// the map entries and the offsets as given.
+QByteArray Compose(const QVector<MapEntry> &map, const QVector<quint32> &offsets, const QByteArray &data,
+                   quint32 resourceCount)
 {
-    QByteArray out;
-    out.append(char(17)).append(char(0));
-    U16(out, 1);
-    U16(out, 1);
-    U16(out, quint16(map.size()));
-    U32(out, 32);
-    U32(out, quint32(8 * map.size()));
-    U32(out, quint32(32 + 8 * map.size()));
-    U32(out, resourceCount);
-    U32(out, quint32(32 + 8 * map.size() + 4 * offsets.size()));
-    U32(out, quint32(data.size()));
-    for (const auto &entry : map) {
-        for (quint16 field : entry)
-            U16(out, field);
-    }
-    for (quint32 offset : offsets)
-        U32(out, offset);
-    return out + data;
+    const auto m = quint32(map.size());
+    QByteArray out = QByteArray("\x11\0", 2) + U16s({1, 1, m})
+        + U32s({32, 8 * m, 32 + 8 * m, resourceCount, 32 + 8 * m + 4 * quint32(offsets.size()), quint32(data.size())});
+    for (const MapEntry &entry : map)
+        out += LittleEndian(entry, 2);
+    return out + LittleEndian(offsets, 4) + data;
 }
 
 // A file that uses every feature: a shared block, an empty block, a range.
 QByteArray RichFile()
 {
     // Map 4 entries (32 bytes) and 6 offsets (24 bytes): data at 88.
-    return Compose({{1, 6, 0, 0}, {5, 10, 2, 1}, {5, 20, 0, 0}, {7, 1, 0, 4}}, {88, 91, 91, 95, 96, 96},
-                   "abc"
-                   "wxyz"
-                   "!",
-                   5);
+    return Compose({{1, 6, 0, 0}, {5, 10, 2, 1}, {5, 20, 0, 0}, {7, 1, 0, 4}}, {88, 91, 91, 95, 96, 96}, "abcwxyz!", 5);
 }
 
 // 20 map entries of 20 IDs each over 20 blocks, the last of `tail` bytes:
 // 400 IDs in 276 + tail bytes, every range inside the blocks.
 QByteArray ManyRanges(int tail)
 {
-    constexpr int kEntries = 20;
+    constexpr quint16 kEntries = 20;
     const quint32 data = 32 + 8 * kEntries + 4 * (kEntries + 1);
-    QByteArray out;
-    out.append(char(17)).append(char(0));
-    U16(out, 1);
-    U16(out, 1);
-    U16(out, kEntries);
-    for (quint32 field : {32u, 8u * kEntries, 32u + 8 * kEntries, quint32(kEntries), data, quint32(tail)})
-        U32(out, field);
-    for (quint16 type = 1; type <= kEntries; ++type) {
-        for (quint16 field : {type, quint16(0), quint16(kEntries - 1), quint16(0)})
-            U16(out, field);
-    }
-    for (int i = 0; i < kEntries; ++i)
-        U32(out, data);
-    U32(out, data + quint32(tail));
-    return out + QByteArray(tail, 'z');
+    QVector<MapEntry> map;
+    for (quint16 type = 1; type <= kEntries; ++type)
+        map.append({type, 0, kEntries - 1, 0});
+    QVector<quint32> offsets(kEntries, data);
+    offsets.append(data + quint32(tail));
+    return Compose(map, offsets, QByteArray(tail, 'z'), kEntries);
 }
 
 QByteArray Save(ResourceStream &stream)
@@ -89,7 +67,7 @@ QByteArray Save(ResourceStream &stream)
     return bytes;
 }
 
-TEST(ResourceStream, OnePairOfFiveBytesSavesAs53Bytes)
+TEST(ResourceStream, OnePairOfFiveBytesSavesAs53BytesAndDumpsAsWritten)
 {
     QTemporaryDir dir;
     ResourceStream stream;
@@ -102,90 +80,60 @@ TEST(ResourceStream, OnePairOfFiveBytesSavesAs53Bytes)
     ASSERT_EQ(expected.size(), 53);
     EXPECT_EQ(ReadFile(dir.filePath("one.kar")), expected);
     EXPECT_EQ(Save(stream), expected);
+    EXPECT_EQ(stream.Dump(),
+              u"=== Header ===\n"
+              "   FileType:             17(0x      11)\n"
+              "   Version:              1(0x       1)\n"
+              "   Oldest Code Version:  1(0x       1)\n"
+              "   Number of Map Entries:1(0x       1)\n"
+              "   Offset to Map:        32(0x      20)\n"
+              "   Length of Map:        8(0x       8)\n"
+              "   Offset to Entries:    40(0x      28)\n"
+              "   Number of Resources:  1(0x       1)\n"
+              "   Offset to Resources:  48(0x      30)\n"
+              "   Length of Resources:  5(0x       5)\n"
+              "=== FileMap ===\n"
+              "   Entries:1\n"
+              "   === FileMapEntry ===\n"
+              "      Type:              1(0x       1)\n"
+              "      Beginning Res ID:  1(0x       1)\n"
+              "      Additional Res ID: 0(0x       0)\n"
+              "      Offset Index:      0(0x       0)\n"
+              "\n"
+              "   === Offset Table ===\n"
+              "      Count: 2\n"
+              "      Offset: 48 (0x      30)\n"
+              "      Offset: 53 (0x      35)\n"
+              "=== Resources ===\n"
+              "   Number of: 1\n"
+              "    Resource: 5\n"_s);
 }
 
-TEST(ResourceStream, DumpShowsTheStructuresAsWritten)
-{
-    ResourceStream stream;
-    stream.AddResource(1, 1, "hello");
-    Save(stream);
-    const QString expected = u"=== Header ===\n"
-                             "   FileType:             17(0x      11)\n"
-                             "   Version:              1(0x       1)\n"
-                             "   Oldest Code Version:  1(0x       1)\n"
-                             "   Number of Map Entries:1(0x       1)\n"
-                             "   Offset to Map:        32(0x      20)\n"
-                             "   Length of Map:        8(0x       8)\n"
-                             "   Offset to Entries:    40(0x      28)\n"
-                             "   Number of Resources:  1(0x       1)\n"
-                             "   Offset to Resources:  48(0x      30)\n"
-                             "   Length of Resources:  5(0x       5)\n"
-                             "=== FileMap ===\n"
-                             "   Entries:1\n"
-                             "   === FileMapEntry ===\n"
-                             "      Type:              1(0x       1)\n"
-                             "      Beginning Res ID:  1(0x       1)\n"
-                             "      Additional Res ID: 0(0x       0)\n"
-                             "      Offset Index:      0(0x       0)\n"
-                             "\n"
-                             "   === Offset Table ===\n"
-                             "      Count: 2\n"
-                             "      Offset: 48 (0x      30)\n"
-                             "      Offset: 53 (0x      35)\n"
-                             "=== Resources ===\n"
-                             "   Number of: 1\n"
-                             "    Resource: 5\n"_s;
-    EXPECT_EQ(stream.Dump(), expected);
-}
-
-TEST(ResourceStream, IdenticalBlocksAreStoredOnceAndTheOffsetTableRepeatsItsEnd)
-{
-    ResourceStream stream;
-    stream.AddResource(2, 1, "same");
-    stream.AddResource(2, 9, "same");
-    const QByteArray expected = Hex("11 00 0100 0100 0200 20000000 10000000 30000000 02000000 3C000000 04000000"
-                                    "0200 0100 0000 0000"
-                                    "0200 0900 0000 0000"
-                                    "3C000000 40000000 40000000")
-        + "same";
-    EXPECT_EQ(Save(stream), expected);
-}
-
-TEST(ResourceStream, FirstEqualBlockWinsAmongMany)
+// Equal blocks are stored once (the first one's index wins, an empty block
+// keeps an index of its own) and the offset table repeats its end.
+TEST(ResourceStream, EqualBlocksAreStoredOnce)
 {
     ResourceStream stream;
     stream.AddResource(1, 1, "a");
-    stream.AddResource(1, 2, "b");
-    stream.AddResource(1, 3, "a");
+    stream.AddResource(1, 2, "");
+    stream.AddResource(1, 3, "b");
+    stream.AddResource(1, 4, "a");
     stream.AddResource(2, 1, "b");
     stream.AddResource(2, 2, QByteArray());
-    stream.AddResource(2, 3, "");
     const QByteArray bytes = Save(stream);
-    // Map entries start at 32: offset indexes 0, 1, 0, 1, 2, 2.
-    const quint16 expectedIndexes[] = {0, 1, 0, 1, 2, 2};
+    // 6 map entries from 32, 7 offsets from 80, the blocks "a", "" and "b" from 108.
+    EXPECT_EQ(bytes.left(32), QByteArray("\x11\0", 2) + U16s({1, 1, 6}) + U32s({32, 48, 80, 6, 108, 2}));
+    const quint16 expectedIndexes[] = {0, 1, 2, 0, 2, 1};
     for (int i = 0; i < 6; ++i)
         EXPECT_EQ(qFromLittleEndian<quint16>(bytes.constData() + 32 + 8 * i + 6), expectedIndexes[i]) << i;
-    EXPECT_TRUE(bytes.endsWith("ab"));
-}
-
-TEST(ResourceStream, EmptyBlockBetweenTwoOthersKeepsItsOwnIndex)
-{
-    ResourceStream stream;
-    stream.AddResource(1, 1, "abc");
-    stream.AddResource(1, 2, "");
-    stream.AddResource(1, 3, "de");
-    const QByteArray bytes = Save(stream);
-    // 3 map entries, 4 offsets: data at 32 + 24 + 16 = 72.
-    EXPECT_EQ(bytes.mid(56, 16), Hex("48000000 4B000000 4B000000 4D000000"));
-    EXPECT_EQ(qFromLittleEndian<quint16>(bytes.constData() + 32 + 8 + 6), 1);
-    EXPECT_EQ(qFromLittleEndian<quint16>(bytes.constData() + 32 + 16 + 6), 2);
+    EXPECT_EQ(bytes.mid(80), U32s({108, 109, 109, 110, 110, 110, 110}) + "ab");
 
     ResourceStream loaded;
     ASSERT_TRUE(loaded.LoadFrom(bytes));
-    EXPECT_EQ(loaded.GetResource(1, 1), QByteArray("abc"));
+    EXPECT_EQ(loaded.GetResource(1, 4), QByteArray("a"));
     EXPECT_TRUE(loaded.GetResource(1, 2).isEmpty());
     EXPECT_FALSE(loaded.GetResource(1, 2).isNull());
-    EXPECT_EQ(loaded.GetResource(1, 3), QByteArray("de"));
+    EXPECT_EQ(loaded.GetResource(2, 1), QByteArray("b"));
     EXPECT_EQ(Save(loaded), bytes);
 }
 
