@@ -66,10 +66,7 @@ std::string Hex(unsigned int value)
 
 std::string HexBytes(const std::string &bytes)
 {
-    std::string text;
-    for (char b : bytes)
-        text += Hex(quint8(b)).substr(2);
-    return text;
+    return QByteArray::fromStdString(bytes).toHex().toUpper().toStdString();
 }
 
 // The places where the library deliberately differs from glibc, each with its
@@ -101,14 +98,6 @@ struct TableCase
     Known encodeDifferences;
 };
 
-bool GbLead(unsigned char b)
-{
-    return b >= 0xA1 && b <= 0xF7;
-}
-bool SjisLead(unsigned char b)
-{
-    return (b >= 0x81 && b <= 0x9F) || (b >= 0xE0 && b <= 0xFC);
-}
 bool KsLead(unsigned char b)
 {
     return b >= 0x80;
@@ -128,9 +117,12 @@ TableCase MakeCase(const char *name)
 {
     const std::string which = name;
     if (which == "GB2312")
-        return {name, ENCODING_GB2312, "GB2312", GbLead, 7445, {}, {}};
+        return {name, ENCODING_GB2312, "GB2312", [](unsigned char b) { return b >= 0xA1 && b <= 0xF7; }, 7445, {}, {}};
     if (which == "SJIS") {
-        TableCase c{name, ENCODING_SJIS, "SHIFT_JIS", SjisLead, 6879, {}, {}};
+        const auto isSjisLead = [](unsigned char b) {
+            return (b >= 0x81 && b <= 0x9F) || (b >= 0xE0 && b <= 0xFC);
+        };
+        TableCase c{name, ENCODING_SJIS, "SHIFT_JIS", isSjisLead, 6879, {}, {}};
         c.decodeDifferences = {{0x5C, kSjisAscii}, {0x7E, kSjisAscii}};
         for (unsigned int lead = 0xF0; lead <= 0xFC; ++lead)
             for (unsigned int trail = 0x40; trail <= 0xFC; ++trail)
