@@ -175,20 +175,14 @@ TEST_P(ForeignArchive, ReadsEveryMemberAsGnuTarExtractsIt)
         return;
     const QString archive = Path("archive.tar");
     QByteArray output;
-    if (writer.options.first().startsWith(u"python:"_s)) {
-        const QString script = u"import sys, tarfile\n"
-                               "with tarfile.open(sys.argv[1], 'w', format=getattr(tarfile, sys.argv[2])) as t:\n"
-                               "    t.add(sys.argv[3], arcname='.')\n"_s;
-        ASSERT_EQ(RunProgram(u"python3"_s, {u"-c"_s, script, archive, writer.options.first().mid(7), source}, &output),
-                  0)
-            << output.constData();
-    } else {
-        ASSERT_EQ(RunProgram(u"tar"_s,
-                             writer.options + QStringList{u"--sort=name"_s, u"-cf"_s, archive, u"-C"_s, source, u"."_s},
-                             &output),
-                  0)
-            << output.constData();
-    }
+    const QString script = u"import sys, tarfile\n"
+                           "with tarfile.open(sys.argv[1], 'w', format=getattr(tarfile, sys.argv[2])) as t:\n"
+                           "    t.add(sys.argv[3], arcname='.')\n"_s;
+    const bool python = writer.options.first().startsWith(u"python:"_s);
+    const QStringList arguments = python
+        ? QStringList{u"-c"_s, script, archive, writer.options.first().mid(7), source}
+        : writer.options + QStringList{u"--sort=name"_s, u"-cf"_s, archive, u"-C"_s, source, u"."_s};
+    ASSERT_EQ(RunProgram(python ? u"python3"_s : u"tar"_s, arguments, &output), 0) << output.constData();
     const QString out = Path("out");
     ASSERT_TRUE(QDir().mkpath(out));
     ASSERT_EQ(RunProgram(u"tar"_s, {u"-xf"_s, archive, u"-C"_s, out}, &output), 0) << output.constData();
@@ -199,12 +193,10 @@ TEST_P(ForeignArchive, ReadsEveryMemberAsGnuTarExtractsIt)
     QSet<QString> listed;
     for (unsigned int i = 0; i < tar.EntryCount(); ++i) {
         TarFileEntry entry = tar.Entry(i);
-        if (entry.name.isEmpty())
-            continue;
         const QString relative = QDir::cleanPath(entry.name);
-        SCOPED_TRACE(relative.toStdString());
-        if (relative == u"."_s)
+        if (entry.name.isEmpty() || relative == u"."_s)
             continue;
+        SCOPED_TRACE(relative.toStdString());
         listed.insert(relative);
         const QFileInfo extracted(out + u'/' + relative);
         if (entry.IsSymLink()) {
