@@ -199,11 +199,8 @@ TEST(KestoResources, ReportsTheHeaderAndCopiesOwnTheirStream)
     quint32 offsetToMap = 0, lengthOfMap = 0, offsetToEntries = 0, count = 0, offsetToResources = 0, length = 0;
     ASSERT_TRUE(resources.ResourceHeader(fileType, version, oldest, mapEntries, offsetToMap, lengthOfMap,
                                          offsetToEntries, count, offsetToResources, length));
-    EXPECT_EQ(fileType, 17);
-    EXPECT_EQ(mapEntries, 1);
-    EXPECT_EQ(offsetToEntries, 40u);
-    EXPECT_EQ(offsetToResources, 48u);
-    EXPECT_EQ(length, 5u);
+    EXPECT_EQ(std::tie(fileType, mapEntries, offsetToEntries, offsetToResources, length),
+              std::make_tuple(quint8(17), quint16(1), 40u, 48u, 5u));
     EXPECT_TRUE(resources.Dump().startsWith(u"=== Header ===\n"_s));
 
     KestoResources copy(resources);

@@ -47,23 +47,6 @@ KestoResources ModuleInfo()
     return mif;
 }
 
-TEST(Mif, ClassListEndsAtItsZeroValue)
-{
-    KestoResources mif;
-    mif.AddBinary(0x5000, 1, Hex("10000001 00000000 11000001"));
-    QVector<unsigned int> classes{42};
-    ASSERT_TRUE(mif.GetMifClasses(classes));
-    EXPECT_EQ(classes, (QVector<unsigned int>{0x01000010}));
-
-    // The end of the block ends it too; a partial value is no class ID.
-    mif.AddBinary(0x5000, 3, Hex("10000001 1100"));
-    ASSERT_TRUE(mif.GetMifExternalClasses(classes));
-    EXPECT_EQ(classes, (QVector<unsigned int>{0x01000010}));
-    mif.AddBinary(0x5000, 3, QByteArray());
-    EXPECT_FALSE(mif.GetMifExternalClasses(classes));
-    EXPECT_TRUE(classes.isEmpty());
-}
-
 TEST(Mif, ReadsEveryRecordOfAModule)
 {
     KestoResources mif = ModuleInfo();
@@ -88,8 +71,7 @@ TEST(Mif, ReadsEveryRecordOfAModule)
               std::make_tuple(0x01000011u, 0xDEADBEEFu, quint16(200), quint16(2), 0x01020304u, quint16(5), quint16(6)));
 
     ASSERT_EQ(entry.notifications.size(), 2); // as announced, not as the block holds
-    EXPECT_EQ(entry.notifications[1].value1, 4u);
-    EXPECT_EQ(entry.notifications[1].value3, 6u);
+    EXPECT_EQ(std::tie(entry.notifications[1].value1, entry.notifications[1].value3), std::make_tuple(4u, 6u));
 
     ASSERT_EQ(entry.mimeTypes.size(), 2);
     EXPECT_EQ(entry.mimeTypes[0].mimeType, u"text/plain"_s);
@@ -97,13 +79,22 @@ TEST(Mif, ReadsEveryRecordOfAModule)
     EXPECT_EQ(entry.mimeTypes[1].mimeType, u"image/png"_s);
 }
 
+// A class list ends at its zero value or with its block (a partial value is
+// no class ID); records are read only as far as their block holds them.
 TEST(Mif, RecordsAreReadOnlyInsideTheirBlock)
 {
     KestoResources mif;
     mif.AddBinary(0x5000, 0, MifHeaderBlock(1000, 1000));
+    mif.AddBinary(0x5000, 1, Hex("10000001 00000000 11000001"));
+    mif.AddBinary(0x5000, 3, Hex("10000001 1100"));
     mif.AddBinary(0x5000, 4, Hex("010000000200000003000000 0400"));
     mif.AddBinary(0x5000, 5, MimeRecord(1, 2, "text/plain") + U32s({3, 4}) + "cut"); // no NUL before the end
 
+    QVector<unsigned int> classes{42};
+    ASSERT_TRUE(mif.GetMifClasses(classes));
+    EXPECT_EQ(classes, (QVector<unsigned int>{0x01000010}));
+    ASSERT_TRUE(mif.GetMifExternalClasses(classes));
+    EXPECT_EQ(classes, (QVector<unsigned int>{0x01000010}));
     QVector<Notifier> notifications;
     ASSERT_TRUE(mif.GetMifNotifications(notifications));
     EXPECT_EQ(notifications.size(), 1);
@@ -111,6 +102,10 @@ TEST(Mif, RecordsAreReadOnlyInsideTheirBlock)
     ASSERT_TRUE(mif.GetMifMimeTypes(types));
     ASSERT_EQ(types.size(), 1);
     EXPECT_EQ(types[0].mimeType, u"text/plain"_s);
+
+    mif.AddBinary(0x5000, 3, QByteArray());
+    EXPECT_FALSE(mif.GetMifExternalClasses(classes));
+    EXPECT_TRUE(classes.isEmpty());
 }
 
 TEST(Mif, HeaderShorterThan40BytesIsNoHeaderAndAnEntryWithoutOneIsLeftAlone)

@@ -25,9 +25,8 @@ TEST(MifBuilder, WritesWhatTheModuleInformationQueriesReadBack)
     QVector<Applet> applets;
     ASSERT_TRUE(resources.GetMifApplets(applets));
     ASSERT_EQ(applets.size(), 1);
-    EXPECT_EQ(applets.at(0).appletid, 0x0A0B0C0Du);
-    EXPECT_EQ(applets.at(0).apptype, 3);
-    EXPECT_EQ(applets.at(0).baseid, 1200);
+    const Applet &a = applets.at(0);
+    EXPECT_EQ(std::tie(a.appletid, a.apptype, a.baseid), std::make_tuple(0x0A0B0C0Du, quint16(3), quint16(1200)));
 
     SysResource program;
     ASSERT_TRUE(resources.GetSysResource(1, program));
