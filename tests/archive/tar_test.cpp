@@ -121,58 +121,48 @@ struct Writer
     bool sparse;
 };
 
-class ForeignArchive : public ::testing::TestWithParam<Writer>
+class ForeignArchive : public TarTest, public ::testing::WithParamInterface<Writer>
 {
 protected:
     void SetUp() override
     {
-        ASSERT_TRUE(dir.isValid());
-        for (const char *program : {"tar", "python3"}) {
-            if (!testutil::HaveProgram(QString::fromLatin1(program)))
-                GTEST_SKIP() << program << " is not installed";
+        TarTest::SetUp();
+        for (const QString &program : {u"tar"_s, u"python3"_s}) {
+            if (!testutil::HaveProgram(program))
+                GTEST_SKIP() << program.toStdString() << " is not installed";
         }
     }
-    QString Path(const QString &name) const { return dir.filePath(name); }
-
-    // A tree with every kind of member the format holds.
-    void MakeTree(const QString &root)
-    {
-        WriteFile(root + u"/pkg/a.mif"_s, Bytes(1500, 'a'));
-        WriteFile(root + u"/pkg/empty"_s, QByteArray());
-        ASSERT_TRUE(QDir(root).mkpath(u"pkg/emptydir"_s));
-        ASSERT_TRUE(QFile::link(u"a.mif"_s, root + u"/pkg/link"_s));
-        ASSERT_EQ(::link(QFile::encodeName(root + u"/pkg/a.mif"_s).constData(),
-                         QFile::encodeName(root + u"/pkg/hard"_s).constData()),
-                  0);
-        const int maxName = GetParam().maxName;
-        const QString over100 = u"pkg/"_s + QString(60, u'd') + u'/' + QString(50, u'f');
-        const QString over255 = u"pkg/"_s + QString(150, u'e') + u'/' + QString(130, u'g');
-        for (const QString &name : {over100, over255}) {
-            if (maxName == 0 || name.size() + 2 <= maxName)
-                WriteFile(root + u'/' + name, Bytes(700, 'L'));
-        }
-        if (GetParam().sparse) {
-            // Data at 64 KiB and at 160 KiB of a 256 KiB file; the rest holes.
-            QFile file(root + u"/pkg/sparse"_s);
-            ASSERT_TRUE(file.open(QIODevice::WriteOnly));
-            for (const qint64 at : {64 * 1024, 160 * 1024}) {
-                ASSERT_TRUE(file.seek(at));
-                ASSERT_EQ(file.write(Bytes(8192, char(at / 1024))), 8192);
-            }
-            ASSERT_TRUE(file.resize(256 * 1024));
-        }
-    }
-
-    QTemporaryDir dir;
 };
 
 TEST_P(ForeignArchive, ReadsEveryMemberAsGnuTarExtractsIt)
 {
     const Writer &writer = GetParam();
+    // A tree with every kind of member the format holds.
     const QString source = Path("src");
-    MakeTree(source);
-    if (HasFatalFailure())
-        return;
+    WriteFile(source + u"/pkg/a.mif"_s, Bytes(1500, 'a'));
+    WriteFile(source + u"/pkg/empty"_s, QByteArray());
+    ASSERT_TRUE(QDir(source).mkpath(u"pkg/emptydir"_s));
+    ASSERT_TRUE(QFile::link(u"a.mif"_s, source + u"/pkg/link"_s));
+    ASSERT_EQ(::link(QFile::encodeName(source + u"/pkg/a.mif"_s).constData(),
+                     QFile::encodeName(source + u"/pkg/hard"_s).constData()),
+              0);
+    const QString over100 = u"pkg/"_s + QString(60, u'd') + u'/' + QString(50, u'f');
+    const QString over255 = u"pkg/"_s + QString(150, u'e') + u'/' + QString(130, u'g');
+    for (const QString &name : {over100, over255}) {
+        if (writer.maxName == 0 || name.size() + 2 <= writer.maxName)
+            WriteFile(source + u'/' + name, Bytes(700, 'L'));
+    }
+    if (writer.sparse) {
+        // Data at 64 KiB and at 160 KiB of a 256 KiB file; the rest holes.
+        QFile file(source + u"/pkg/sparse"_s);
+        ASSERT_TRUE(file.open(QIODevice::WriteOnly));
+        for (const qint64 at : {64 * 1024, 160 * 1024}) {
+            ASSERT_TRUE(file.seek(at));
+            ASSERT_EQ(file.write(Bytes(8192, char(at / 1024))), 8192);
+        }
+        ASSERT_TRUE(file.resize(256 * 1024));
+    }
+
     const QString archive = Path("archive.tar");
     QByteArray output;
     const QString script = u"import sys, tarfile\n"
