@@ -24,20 +24,14 @@ inline EncoderPtr Make(KestoEncodingFormat format)
     return EncoderPtr(encoder);
 }
 
-inline QByteArray Bytes(std::initializer_list<int> values)
+inline QByteArray Bytes(std::initializer_list<quint8> values)
 {
-    QByteArray bytes;
-    for (int v : values)
-        bytes.append(char(v));
-    return bytes;
+    return QByteArray(reinterpret_cast<const char *>(values.begin()), qsizetype(values.size()));
 }
 
 inline QString Units(std::initializer_list<char16_t> values)
 {
-    QString text;
-    for (char16_t v : values)
-        text.append(QChar(v));
-    return text;
+    return QString(reinterpret_cast<const QChar *>(values.begin()), qsizetype(values.size()));
 }
 
 } // namespace encodingtest

@@ -81,19 +81,9 @@ INSTANTIATE_TEST_SUITE_P(Marks, DetectFormat,
                                            // An empty block leaves the format as it was.
                                            Detection{QByteArray(), KestoEncodingFormat(12345), false, false}));
 
-TEST(CreateEncoder, NoConverterForUnicodeNoneOrUnknown)
-{
-    for (int value : {0, 7, 999, -5}) {
-        QEncoding *encoder = nullptr;
-        CreateEncoder(ENCODING_UTF8, &encoder);
-        EXPECT_FALSE(CreateEncoder(static_cast<KestoEncodingFormat>(value), &encoder)) << value;
-        EXPECT_EQ(encoder, nullptr) << value;
-    }
-    FreeEncoder(nullptr);
-}
-
 // Each converter created for a format is the one detection picks for its
-// mark (KSC5601, which shares CP949's mark, decodes as CP949).
+// mark (KSC5601, which shares CP949's mark, decodes as CP949). There is no
+// converter for Unicode, None or an unknown format.
 TEST(CreateEncoder, MarkOfEachFormatSelectsAConverterThatReadsIt)
 {
     const QString text = u"Ab1"_s;
@@ -113,6 +103,13 @@ TEST(CreateEncoder, MarkOfEachFormatSelectsAConverterThatReadsIt)
         EXPECT_EQ(reader->MinCharSize(), 1u);
         FreeEncoder(reader);
     }
+    for (int value : {0, 7, 999, -5}) {
+        QEncoding *encoder = nullptr;
+        CreateEncoder(ENCODING_UTF8, &encoder);
+        EXPECT_FALSE(CreateEncoder(static_cast<KestoEncodingFormat>(value), &encoder)) << value;
+        EXPECT_EQ(encoder, nullptr) << value;
+    }
+    FreeEncoder(nullptr);
 }
 
 // Bytes and text that a converter turns into each other. Encoding replaces
