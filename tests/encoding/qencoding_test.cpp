@@ -12,8 +12,6 @@ using namespace encodingtest;
 
 TEST(EncodingFormats, NamesMarksAndSizes)
 {
-    EXPECT_EQ(QEncoding::Name2Format("utf-8"), ENCODING_UTF8);
-    EXPECT_EQ(QEncoding::Name2Format("s-jis"), ENCODING_SJIS);
     EXPECT_EQ(QEncoding::Name2Format(""), ENCODING_NONE);
     EXPECT_EQ(QEncoding::Name2Format("none"), ENCODING_NONE);
     EXPECT_EQ(QEncoding::Name2Format("UTF8"), ENCODING_NONE);
