@@ -244,12 +244,6 @@ QByteArray RandomBytes(int size, quint32 seed)
     return bytes;
 }
 
-QByteArray Replaced(QByteArray bytes, int at, char c)
-{
-    bytes[at] = c;
-    return bytes;
-}
-
 // A hand-made archive, the members listed (end blocks left out), the first
 // one's bytes, and the reason given for damage (empty when it is sound).
 struct Crafted
@@ -286,7 +280,7 @@ const Crafted kCrafted[] = {
         "invalid size field at offset 1024"),
     Row("DigitsEightAndNine", Member("a", "x") + Header("b", "00000000089") + kEnd, {"a"}, "x",
         "invalid size field at offset 1024"),
-    Row("BadChecksum", Member("a", "x") + Replaced(Member("b", "yy"), 0, 'c') + kEnd, {"a"}, "x",
+    Row("BadChecksum", Member("a", "x") + Member("b", "yy").replace(0, 1, "c") + kEnd, {"a"}, "x",
         "checksum error at offset 1024"),
     // A name byte of 0xE9 adds 233 unsigned but -23 signed.
     Row("SignedChecksumIsAccepted", Header("\xe9t\xc3\xa9", Octal(1), '0', {}, true) + Padded("s") + kEnd,
@@ -359,7 +353,6 @@ TEST_F(TarTest, HardLinkAndNonUtf8NameKeepTheirDetails)
     ASSERT_TRUE(tar.Open(QIODevice::ReadOnly, Path("links.tar")));
     ASSERT_FALSE(tar.IsDamaged()) << tar.ErrorString().toStdString();
     EXPECT_EQ(tar.Entry(0).rawName, QByteArray("a\xff"));
-    EXPECT_EQ(tar.Entry(0).name, u"a\\377"_s);
     TarFileEntry hard = tar.Entry(3);
     EXPECT_TRUE(hard.IsHardLink());
     EXPECT_TRUE(hard.IsFile());

@@ -10,18 +10,14 @@
 
 namespace encodingtest {
 
-struct EncoderDeleter
-{
-    void operator()(QEncoding *encoder) const { FreeEncoder(encoder); }
-};
-using EncoderPtr = std::unique_ptr<QEncoding, EncoderDeleter>;
+using EncoderPtr = std::unique_ptr<QEncoding, decltype(&FreeEncoder)>;
 
 // The converter for `format`, or null where there is none.
 inline EncoderPtr Make(KestoEncodingFormat format)
 {
     QEncoding *encoder = nullptr;
     CreateEncoder(format, &encoder);
-    return EncoderPtr(encoder);
+    return EncoderPtr(encoder, &FreeEncoder);
 }
 
 inline QByteArray Bytes(std::initializer_list<quint8> values)

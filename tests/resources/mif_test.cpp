@@ -191,9 +191,8 @@ TEST(SysResource, DecodesEachKindOfRecordInsideItsBlock)
 
     ASSERT_TRUE(resources.GetSysResource(1, record));
     EXPECT_TRUE(record.IsProgram());
-    EXPECT_EQ(record.keysize, 8);
-    EXPECT_EQ(record.type, 0x0102FAF7u);
-    EXPECT_EQ(record.PropertyNames().size(), 10);
+    EXPECT_EQ(std::make_tuple(record.keysize, record.type, record.PropertyNames().size()),
+              std::make_tuple(quint16(8), 0x0102FAF7u, qsizetype(10)));
     ASSERT_TRUE(resources.GetSysResource(9, record));
     EXPECT_TRUE(record.PropertyNames().isEmpty());
     ASSERT_TRUE(resources.GetSysResource(10, record));
