@@ -12,9 +12,8 @@ using namespace encodingtest;
 
 TEST(EncodingFormats, NamesMarksAndSizes)
 {
-    EXPECT_EQ(QEncoding::Name2Format(""), ENCODING_NONE);
-    EXPECT_EQ(QEncoding::Name2Format("none"), ENCODING_NONE);
-    EXPECT_EQ(QEncoding::Name2Format("UTF8"), ENCODING_NONE);
+    for (const char *name : {"", "none", "UTF8"})
+        EXPECT_EQ(QEncoding::Name2Format(name), ENCODING_NONE) << name;
     EXPECT_EQ(QEncoding::Format2Name(static_cast<KestoEncodingFormat>(7)), QString());
     EXPECT_EQ(QEncoding::Format2Name(ENCODING_NONE), "None");
 

@@ -16,10 +16,9 @@ inline QByteArray Hex(const char *hex)
 template <typename Values> QByteArray LittleEndian(const Values &values, int size)
 {
     QByteArray out;
-    for (const quint32 value : values) {
+    for (const quint32 value : values)
         for (int i = 0; i < size; ++i)
             out.append(char((value >> (8 * i)) & 0xFF));
-    }
     return out;
 }
 

@@ -3,7 +3,6 @@
 #include "bytes.h"
 #include "support/testutil.h"
 
-#include <QFile>
 #include <QRandomGenerator>
 #include <QTemporaryDir>
 #include <QtEndian>
