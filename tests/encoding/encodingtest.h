@@ -10,34 +10,24 @@
 
 namespace encodingtest {
 
-struct EncoderDeleter
-{
-    void operator()(QEncoding *encoder) const { FreeEncoder(encoder); }
-};
-using EncoderPtr = std::unique_ptr<QEncoding, EncoderDeleter>;
+using EncoderPtr = std::unique_ptr<QEncoding, decltype(&FreeEncoder)>;
 
 // The converter for `format`, or null where there is none.
 inline EncoderPtr Make(KestoEncodingFormat format)
 {
     QEncoding *encoder = nullptr;
     CreateEncoder(format, &encoder);
-    return EncoderPtr(encoder);
+    return EncoderPtr(encoder, &FreeEncoder);
 }
 
-inline QByteArray Bytes(std::initializer_list<int> values)
+inline QByteArray Bytes(std::initializer_list<quint8> values)
 {
-    QByteArray bytes;
-    for (int v : values)
-        bytes.append(char(v));
-    return bytes;
+    return QByteArray(reinterpret_cast<const char *>(values.begin()), qsizetype(values.size()));
 }
 
 inline QString Units(std::initializer_list<char16_t> values)
 {
-    QString text;
-    for (char16_t v : values)
-        text.append(QChar(v));
-    return text;
+    return QString(reinterpret_cast<const QChar *>(values.begin()), qsizetype(values.size()));
 }
 
 } // namespace encodingtest

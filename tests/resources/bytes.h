@@ -2,6 +2,8 @@
 
 #include <QByteArray>
 
+#include <initializer_list>
+
 // Little-endian values and hex text for building resource blocks by hand.
 namespace resourcebytes {
 
@@ -10,15 +12,24 @@ inline QByteArray Hex(const char *hex)
     return QByteArray::fromHex(hex);
 }
 
-inline void U16(QByteArray &out, quint16 value)
+// The values one after another, each `size` bytes long, little-endian.
+template <typename Values> QByteArray LittleEndian(const Values &values, int size)
 {
-    out.append(char(value & 0xFF)).append(char(value >> 8));
+    QByteArray out;
+    for (const quint32 value : values)
+        for (int i = 0; i < size; ++i)
+            out.append(char((value >> (8 * i)) & 0xFF));
+    return out;
 }
 
-inline void U32(QByteArray &out, quint32 value)
+inline QByteArray U16s(std::initializer_list<quint32> values)
 {
-    for (int i = 0; i < 4; ++i)
-        out.append(char((value >> (8 * i)) & 0xFF));
+    return LittleEndian(values, 2);
+}
+
+inline QByteArray U32s(std::initializer_list<quint32> values)
+{
+    return LittleEndian(values, 4);
 }
 
 } // namespace resourcebytes

@@ -3,15 +3,13 @@
 #include "bytes.h"
 #include "support/testutil.h"
 
-#include <QFile>
 #include <QRandomGenerator>
 #include <QTemporaryDir>
 #include <QtEndian>
 
 #include <gtest/gtest.h>
 
-#include <algorithm>
-#include <initializer_list>
+#include <array>
 
 using namespace Qt::StringLiterals;
 
@@ -20,66 +18,45 @@ namespace {
 using testutil::ReadFile;
 
 using resourcebytes::Hex;
-using resourcebytes::U16;
-using resourcebytes::U32;
+using resourcebytes::LittleEndian;
+using resourcebytes::U16s;
+using resourcebytes::U32s;
 
-// A resource file put together by hand: header counts as given, map entries
-// as {type, first ID, additional IDs, offset index}, the offsets as given.
-QByteArray Compose(std::initializer_list<std::initializer_list<quint16>> map, std::initializer_list<quint32> offsets,
-                   const QByteArray &data, quint32 resourceCount)
+// {type, first ID, additional IDs, offset index}
+using MapEntry = std::array<quint16, 4>;
+
+// A resource file put together by hand: the header's resource count as given,
+// the map entries and the offsets as given.
+QByteArray Compose(const QVector<MapEntry> &map, const QVector<quint32> &offsets, const QByteArray &data,
+                   quint32 resourceCount)
 {
-    QByteArray out;
-    out.append(char(17)).append(char(0));
-    U16(out, 1);
-    U16(out, 1);
-    U16(out, quint16(map.size()));
-    U32(out, 32);
-    U32(out, quint32(8 * map.size()));
-    U32(out, quint32(32 + 8 * map.size()));
-    U32(out, resourceCount);
-    U32(out, quint32(32 + 8 * map.size() + 4 * offsets.size()));
-    U32(out, quint32(data.size()));
-    for (const auto &entry : map) {
-        for (quint16 field : entry)
-            U16(out, field);
-    }
-    for (quint32 offset : offsets)
-        U32(out, offset);
-    return out + data;
+    const auto m = quint32(map.size());
+    QByteArray out = QByteArray("\x11\0", 2) + U16s({1, 1, m})
+        + U32s({32, 8 * m, 32 + 8 * m, resourceCount, 32 + 8 * m + 4 * quint32(offsets.size()), quint32(data.size())});
+    for (const MapEntry &entry : map)
+        out += LittleEndian(entry, 2);
+    return out + LittleEndian(offsets, 4) + data;
 }
 
 // A file that uses every feature: a shared block, an empty block, a range.
 QByteArray RichFile()
 {
     // Map 4 entries (32 bytes) and 6 offsets (24 bytes): data at 88.
-    return Compose({{1, 6, 0, 0}, {5, 10, 2, 1}, {5, 20, 0, 0}, {7, 1, 0, 4}}, {88, 91, 91, 95, 96, 96},
-                   "abc"
-                   "wxyz"
-                   "!",
-                   5);
+    return Compose({{1, 6, 0, 0}, {5, 10, 2, 1}, {5, 20, 0, 0}, {7, 1, 0, 4}}, {88, 91, 91, 95, 96, 96}, "abcwxyz!", 5);
 }
 
 // 20 map entries of 20 IDs each over 20 blocks, the last of `tail` bytes:
 // 400 IDs in 276 + tail bytes, every range inside the blocks.
 QByteArray ManyRanges(int tail)
 {
-    constexpr int kEntries = 20;
+    constexpr quint16 kEntries = 20;
     const quint32 data = 32 + 8 * kEntries + 4 * (kEntries + 1);
-    QByteArray out;
-    out.append(char(17)).append(char(0));
-    U16(out, 1);
-    U16(out, 1);
-    U16(out, kEntries);
-    for (quint32 field : {32u, 8u * kEntries, 32u + 8 * kEntries, quint32(kEntries), data, quint32(tail)})
-        U32(out, field);
-    for (quint16 type = 1; type <= kEntries; ++type) {
-        for (quint16 field : {type, quint16(0), quint16(kEntries - 1), quint16(0)})
-            U16(out, field);
-    }
-    for (int i = 0; i < kEntries; ++i)
-        U32(out, data);
-    U32(out, data + quint32(tail));
-    return out + QByteArray(tail, 'z');
+    QVector<MapEntry> map;
+    for (quint16 type = 1; type <= kEntries; ++type)
+        map.append({type, 0, kEntries - 1, 0});
+    QVector<quint32> offsets(kEntries, data);
+    offsets.append(data + quint32(tail));
+    return Compose(map, offsets, QByteArray(tail, 'z'), kEntries);
 }
 
 QByteArray Save(ResourceStream &stream)
@@ -89,7 +66,7 @@ QByteArray Save(ResourceStream &stream)
     return bytes;
 }
 
-TEST(ResourceStream, OnePairOfFiveBytesSavesAs53Bytes)
+TEST(ResourceStream, OnePairOfFiveBytesSavesAs53BytesAndDumpsAsWritten)
 {
     QTemporaryDir dir;
     ResourceStream stream;
@@ -102,90 +79,60 @@ TEST(ResourceStream, OnePairOfFiveBytesSavesAs53Bytes)
     ASSERT_EQ(expected.size(), 53);
     EXPECT_EQ(ReadFile(dir.filePath("one.kar")), expected);
     EXPECT_EQ(Save(stream), expected);
+    EXPECT_EQ(stream.Dump(),
+              u"=== Header ===\n"
+              "   FileType:             17(0x      11)\n"
+              "   Version:              1(0x       1)\n"
+              "   Oldest Code Version:  1(0x       1)\n"
+              "   Number of Map Entries:1(0x       1)\n"
+              "   Offset to Map:        32(0x      20)\n"
+              "   Length of Map:        8(0x       8)\n"
+              "   Offset to Entries:    40(0x      28)\n"
+              "   Number of Resources:  1(0x       1)\n"
+              "   Offset to Resources:  48(0x      30)\n"
+              "   Length of Resources:  5(0x       5)\n"
+              "=== FileMap ===\n"
+              "   Entries:1\n"
+              "   === FileMapEntry ===\n"
+              "      Type:              1(0x       1)\n"
+              "      Beginning Res ID:  1(0x       1)\n"
+              "      Additional Res ID: 0(0x       0)\n"
+              "      Offset Index:      0(0x       0)\n"
+              "\n"
+              "   === Offset Table ===\n"
+              "      Count: 2\n"
+              "      Offset: 48 (0x      30)\n"
+              "      Offset: 53 (0x      35)\n"
+              "=== Resources ===\n"
+              "   Number of: 1\n"
+              "    Resource: 5\n"_s);
 }
 
-TEST(ResourceStream, DumpShowsTheStructuresAsWritten)
-{
-    ResourceStream stream;
-    stream.AddResource(1, 1, "hello");
-    Save(stream);
-    const QString expected = u"=== Header ===\n"
-                             "   FileType:             17(0x      11)\n"
-                             "   Version:              1(0x       1)\n"
-                             "   Oldest Code Version:  1(0x       1)\n"
-                             "   Number of Map Entries:1(0x       1)\n"
-                             "   Offset to Map:        32(0x      20)\n"
-                             "   Length of Map:        8(0x       8)\n"
-                             "   Offset to Entries:    40(0x      28)\n"
-                             "   Number of Resources:  1(0x       1)\n"
-                             "   Offset to Resources:  48(0x      30)\n"
-                             "   Length of Resources:  5(0x       5)\n"
-                             "=== FileMap ===\n"
-                             "   Entries:1\n"
-                             "   === FileMapEntry ===\n"
-                             "      Type:              1(0x       1)\n"
-                             "      Beginning Res ID:  1(0x       1)\n"
-                             "      Additional Res ID: 0(0x       0)\n"
-                             "      Offset Index:      0(0x       0)\n"
-                             "\n"
-                             "   === Offset Table ===\n"
-                             "      Count: 2\n"
-                             "      Offset: 48 (0x      30)\n"
-                             "      Offset: 53 (0x      35)\n"
-                             "=== Resources ===\n"
-                             "   Number of: 1\n"
-                             "    Resource: 5\n"_s;
-    EXPECT_EQ(stream.Dump(), expected);
-}
-
-TEST(ResourceStream, IdenticalBlocksAreStoredOnceAndTheOffsetTableRepeatsItsEnd)
-{
-    ResourceStream stream;
-    stream.AddResource(2, 1, "same");
-    stream.AddResource(2, 9, "same");
-    const QByteArray expected = Hex("11 00 0100 0100 0200 20000000 10000000 30000000 02000000 3C000000 04000000"
-                                    "0200 0100 0000 0000"
-                                    "0200 0900 0000 0000"
-                                    "3C000000 40000000 40000000")
-        + "same";
-    EXPECT_EQ(Save(stream), expected);
-}
-
-TEST(ResourceStream, FirstEqualBlockWinsAmongMany)
+// Equal blocks are stored once (the first one's index wins, an empty block
+// keeps an index of its own) and the offset table repeats its end.
+TEST(ResourceStream, EqualBlocksAreStoredOnce)
 {
     ResourceStream stream;
     stream.AddResource(1, 1, "a");
-    stream.AddResource(1, 2, "b");
-    stream.AddResource(1, 3, "a");
+    stream.AddResource(1, 2, "");
+    stream.AddResource(1, 3, "b");
+    stream.AddResource(1, 4, "a");
     stream.AddResource(2, 1, "b");
     stream.AddResource(2, 2, QByteArray());
-    stream.AddResource(2, 3, "");
     const QByteArray bytes = Save(stream);
-    // Map entries start at 32: offset indexes 0, 1, 0, 1, 2, 2.
-    const quint16 expectedIndexes[] = {0, 1, 0, 1, 2, 2};
+    // 6 map entries from 32, 7 offsets from 80, the blocks "a", "" and "b" from 108.
+    EXPECT_EQ(bytes.left(32), QByteArray("\x11\0", 2) + U16s({1, 1, 6}) + U32s({32, 48, 80, 6, 108, 2}));
+    const quint16 expectedIndexes[] = {0, 1, 2, 0, 2, 1};
     for (int i = 0; i < 6; ++i)
         EXPECT_EQ(qFromLittleEndian<quint16>(bytes.constData() + 32 + 8 * i + 6), expectedIndexes[i]) << i;
-    EXPECT_TRUE(bytes.endsWith("ab"));
-}
-
-TEST(ResourceStream, EmptyBlockBetweenTwoOthersKeepsItsOwnIndex)
-{
-    ResourceStream stream;
-    stream.AddResource(1, 1, "abc");
-    stream.AddResource(1, 2, "");
-    stream.AddResource(1, 3, "de");
-    const QByteArray bytes = Save(stream);
-    // 3 map entries, 4 offsets: data at 32 + 24 + 16 = 72.
-    EXPECT_EQ(bytes.mid(56, 16), Hex("48000000 4B000000 4B000000 4D000000"));
-    EXPECT_EQ(qFromLittleEndian<quint16>(bytes.constData() + 32 + 8 + 6), 1);
-    EXPECT_EQ(qFromLittleEndian<quint16>(bytes.constData() + 32 + 16 + 6), 2);
+    EXPECT_EQ(bytes.mid(80), U32s({108, 109, 109, 110, 110, 110, 110}) + "ab");
 
     ResourceStream loaded;
     ASSERT_TRUE(loaded.LoadFrom(bytes));
-    EXPECT_EQ(loaded.GetResource(1, 1), QByteArray("abc"));
+    EXPECT_EQ(loaded.GetResource(1, 4), QByteArray("a"));
     EXPECT_TRUE(loaded.GetResource(1, 2).isEmpty());
     EXPECT_FALSE(loaded.GetResource(1, 2).isNull());
-    EXPECT_EQ(loaded.GetResource(1, 3), QByteArray("de"));
+    EXPECT_EQ(loaded.GetResource(2, 1), QByteArray("b"));
     EXPECT_EQ(Save(loaded), bytes);
 }
 
@@ -246,9 +193,7 @@ TEST(ResourceStream, SaveWithoutPathWritesBackToTheLoadedFileAndFailuresLeaveFil
     EXPECT_EQ(stream.Name(), path);
     stream.AddResource(1, 2, "two");
     ASSERT_TRUE(stream.Save(QString()));
-    ResourceStream check;
-    ASSERT_TRUE(check.Load(path));
-    EXPECT_EQ(check.GetResource(1, 2), QByteArray("two"));
+    EXPECT_EQ(ReadFile(path), Save(stream));
 
     // Failures leave the file alone.
     const QString keep = dir.filePath(u"keep.kar"_s);
@@ -283,69 +228,43 @@ TEST(ResourceStream, At65535PairsSavesAndOneMoreIsRefused)
     EXPECT_EQ(more, QByteArray("keep"));
 }
 
-// Corrupt inputs: each must load or fail without crashing, a failure must
-// leave the stream as it was, and nothing may describe more than the input.
-struct CorruptCase
+// Corrupt input, every prefix of a valid file among it, is refused and
+// leaves the stream as it was.
+TEST(ResourceStream, CorruptInputIsRefusedAndChangesNothing)
 {
-    const char *name;
-    QByteArray bytes;
-};
-
-class ResourceStreamCorrupt : public ::testing::TestWithParam<CorruptCase>
-{
-};
-
-TEST_P(ResourceStreamCorrupt, IsRejectedAndChangesNothing)
-{
-    ResourceStream stream;
-    stream.AddResource(3, 3, "kept");
-    EXPECT_FALSE(stream.LoadFrom(GetParam().bytes));
-    EXPECT_EQ(stream.GetResource(3, 3), QByteArray("kept"));
-    EXPECT_EQ(stream.GetResourceHeader()->resourceCount, 0u);
+    QList<QPair<QString, QByteArray>> inputs = {
+        {u"HugeResourceCount"_s, Compose({}, {}, QByteArray(), 0xFFFFFFFFu)},
+        {u"MapCountPastInput"_s, Compose({{1, 1, 0, 0}}, {48, 49}, "x", 1).left(40)},
+        {u"OffsetsRunBackwards"_s, Compose({{1, 1, 0, 0}, {1, 2, 0, 1}}, {60, 62, 61}, "xy", 2)},
+        {u"OffsetPastInput"_s, Compose({{1, 1, 0, 0}}, {48, 4000}, "x", 1)},
+        {u"OffsetIndexPastBlocks"_s, Compose({{1, 1, 0, 1}}, {48, 49}, "x", 1)},
+        {u"RangePastBlocks"_s, Compose({{5, 10, 3, 0}}, {52, 53, 55, 58}, "ABBCCC", 3)},
+        {u"RangesCoverMoreIdsThanInputBytes"_s, ManyRanges(123)},
+    };
+    const QByteArray file = RichFile();
+    for (int length = 0; length < file.size(); ++length)
+        inputs.append({u"the first %1 bytes"_s.arg(length), file.left(length)});
+    for (const auto &[what, bytes] : std::as_const(inputs)) {
+        ResourceStream stream;
+        stream.AddResource(3, 3, "kept");
+        EXPECT_FALSE(stream.LoadFrom(bytes)) << what.toStdString();
+        EXPECT_EQ(stream.GetResource(3, 3), QByteArray("kept")) << what.toStdString();
+        EXPECT_EQ(stream.GetResourceHeader()->resourceCount, 0u) << what.toStdString();
+    }
+    EXPECT_TRUE(ResourceStream().LoadFrom(file));
 }
 
-INSTANTIATE_TEST_SUITE_P(
-    ResourceStream, ResourceStreamCorrupt,
-    ::testing::Values(CorruptCase{"Empty", QByteArray()}, CorruptCase{"ShortHeader", QByteArray(31, '\0')},
-                      CorruptCase{"HugeResourceCount", Compose({}, {}, QByteArray(), 0xFFFFFFFFu)},
-                      CorruptCase{"MapCountPastInput", Compose({{1, 1, 0, 0}}, {48, 49}, "x", 1).left(40)},
-                      CorruptCase{"OffsetsRunBackwards", Compose({{1, 1, 0, 0}, {1, 2, 0, 1}}, {60, 62, 61}, "xy", 2)},
-                      CorruptCase{"OffsetPastInput", Compose({{1, 1, 0, 0}}, {48, 4000}, "x", 1)},
-                      CorruptCase{"OffsetIndexPastBlocks", Compose({{1, 1, 0, 1}}, {48, 49}, "x", 1)},
-                      CorruptCase{"RangePastBlocks", Compose({{5, 10, 3, 0}}, {52, 53, 55, 58}, "ABBCCC", 3)},
-                      CorruptCase{"RangesCoverMoreIdsThanInputBytes", ManyRanges(123)}),
-    [](const ::testing::TestParamInfo<CorruptCase> &info) { return std::string(info.param.name); });
-
-TEST(ResourceStream, LoadsAsManyIdsAsInputBytesAndNoMore)
+// As many IDs as the input has bytes load; a cleared stream reads as new.
+TEST(ResourceStream, LoadsAsManyIdsAsInputBytesAndClearsToNew)
 {
     ResourceStream stream;
     ASSERT_TRUE(stream.LoadFrom(ManyRanges(124)));
     QVector<ResourceEntry> entries;
     EXPECT_EQ(stream.GetResources(entries), 400u);
     EXPECT_EQ(stream.GetResource(20, 19), QByteArray(124, 'z'));
-}
-
-TEST(ResourceStream, ClearedStreamReadsAsNew)
-{
-    ResourceStream stream;
-    ASSERT_TRUE(stream.LoadFrom(RichFile()));
     stream.Clear();
-    QVector<ResourceEntry> entries;
     EXPECT_EQ(stream.GetResources(entries), 0u);
     EXPECT_EQ(stream.Dump(), ResourceStream().Dump());
-}
-
-TEST(ResourceStream, EveryPrefixOfAValidFileFailsCleanly)
-{
-    const QByteArray file = RichFile();
-    for (int length = 0; length < file.size(); ++length) {
-        ResourceStream stream;
-        stream.AddResource(3, 3, "kept");
-        EXPECT_FALSE(stream.LoadFrom(file.left(length))) << length;
-        EXPECT_EQ(stream.GetResource(3, 3), QByteArray("kept")) << length;
-    }
-    ResourceStream stream;
-    EXPECT_TRUE(stream.LoadFrom(file));
 }
 
 TEST(ResourceStream, RandomByteFlipsLoadOrFailCleanly)
