@@ -5,6 +5,7 @@
 #include "controller/resultsmerge.h"
 #include "controller/shardplan.h"
 #include "controller/shardsetting.h"
+#include "modules/ctftestmodule.h"
 
 #include "harnesstest.h"
 
@@ -274,10 +275,20 @@ TEST(ResultsMergeTest, AModuleRunTwiceKeepsTheVerdictThatWins)
     ResultsMerge merge;
     ASSERT_TRUE(merge.Add(first, QString(), u"lab-1"_s)) << merge.ErrorString().toStdString();
     ASSERT_TRUE(merge.Add(second)) << merge.ErrorString().toStdString();
-    merge.Expect({{u"Other"_s, u"PVS"_s, u"g"_s, QString(), {u"x"_s}}, {u"M"_s, u"KVK"_s, QString(), QString(), {}}});
+    // The selection as the tool gives it: a module no shard ran keeps its test cases.
+    QList<QSharedPointer<_TestModule>> selection{QSharedPointer<_TestModule>(new CtfTestModule),
+                                                 QSharedPointer<_TestModule>(new CtfTestModule), nullptr};
+    selection[0]->moduleName = u"Other"_s;
+    selection[0]->SetSource(u"PVS"_s);
+    selection[0]->family = u"g"_s;
+    selection[0]->testCases = {TestCase(u"x"_s, u"t"_s)};
+    selection[1]->moduleName = u"M"_s;
+    selection[1]->SetSource(u"KVK"_s);
+    merge.Expect(ResultsMerge::ExpectedOf(selection));
     const QList<ResultsMerge::Row> rows = merge.Rows();
     ASSERT_EQ(rows.size(), 2); // "Idle" ran nowhere and was not expected
-    EXPECT_EQ(rows.at(0).name, u"Other"_s);
+    EXPECT_EQ((QStringList{rows.at(0).name, rows.at(0).source, rows.at(0).family}),
+              (QStringList{u"Other"_s, u"PVS"_s, u"g"_s}));
     EXPECT_FALSE(rows.at(0).ran);
     EXPECT_EQ(rows.at(0).testCases, (QList<QPair<QString, QString>>{{u"x"_s, u"unexecuted"_s}}));
     const ResultsMerge::Row &m = rows.at(1);
