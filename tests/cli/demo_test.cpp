@@ -50,7 +50,7 @@ TEST_F(DemoInit, PrintsTheVariablesThatPointAtIt)
     EXPECT_EQ(testutil::ReadFile(root + u"/env.sh"_s), env);
     // A second init into the same folder is refused rather than mixed in;
     // an empty folder is taken.
-    EXPECT_EQ(Tool("demo init", root).status, 2);
+    ExpectRefused(Tool("demo init", root), "exists and is not empty");
     ASSERT_TRUE(QDir().mkpath(u"empty"_s));
     EXPECT_EQ(Tool("demo init empty").status, 0);
 }

@@ -74,7 +74,7 @@ TEST_F(InspectTool, TarListAndCatReadAnArchiveMadeByGnuTar)
         GTEST_SKIP() << "tar not installed";
     WriteFile(u"pkg/mod/a.txt"_s, "alpha\n");
     WriteFile(u"pkg/mod/empty"_s, "");
-    WriteFile(u"pkg/mod/red\x1b[31m\n"_s, "x");
+    WriteFile(u"pkg/mod/red\x1b[31m\t\n"_s, "x");
     ASSERT_TRUE(QFile::link(u"a.txt"_s, u"pkg/mod/link"_s));
     WriteFile(u"pkg/late"_s, "late");
     ASSERT_EQ(testutil::RunProgram(u"tar"_s, Args("--sort=name -cf p.tar -C pkg mod")), 0);
@@ -87,10 +87,10 @@ TEST_F(InspectTool, TarListAndCatReadAnArchiveMadeByGnuTar)
                          "-\t6\tmod/a.txt\n"
                          "-\t0\tmod/empty\n"
                          "l\t0\tmod/link -> a.txt\n"
-                         "-\t1\tmod/red\\033[31m\\n\n"));
+                         "-\t1\tmod/red\\033[31m\\t\\n\n"));
     EXPECT_EQ(OutputOf(Tool("tar cat p.tar mod/a.txt")), QByteArray("alpha\n"));
     // A name is found as the listing shows it too.
-    EXPECT_EQ(Tool("tar cat p.tar", u"mod/red\\033[31m\\n"_s).out, QByteArray("x"));
+    EXPECT_EQ(Tool("tar cat p.tar", u"mod/red\\033[31m\\t\\n"_s).out, QByteArray("x"));
     WriteFile(u"cut.tar"_s, archive.left(1300));
     const std::pair<const char *, const char *> refusals[] = {
         {"p.tar mod/none", "no member mod/none"},

@@ -193,6 +193,7 @@ TEST_F(DemoRun, ReportsEveryModuleOfThisRunWithItsHandsetTimesLogsAndProgress)
     const QJsonDocument summary = QJsonDocument::fromJson(ReadFile(json));
     EXPECT_FALSE(summary[u"start"].toString().isEmpty());
     EXPECT_EQ(summary[u"handsets"][0].toString(), u"demo-phone"_s);
+    EXPECT_EQ(summary[u"modules"][0][u"handset"].toString(), u"demo-phone"_s);
     EXPECT_TRUE(QFile::exists(summary[u"modules"][0][u"logs"][0].toString()));
     EXPECT_GE(summary[u"modules"][0][u"durationMs"].toInteger(-1), 0);
 
@@ -334,14 +335,15 @@ TEST_F(DemoRun, SetUpFailuresAndBadFiltersAreRefusedBeforeAnythingRuns)
         {Args("run --junit", missing), {}, {}, "cannot write --junit"},
         {Args("run --json", missing), {}, {}, "cannot write --json"},
         {Args("run --copy-delay soon"), {}, {}, "--copy-delay"},
-        {Args("modules --kit nowhere"), {}, {}, "no test kit 'nowhere'"},
+        {Args("modules --kit nowhere"), {}, {}, "harness modules: no test kit 'nowhere'"},
         {Args("run IClock Nope"), {}, {}, "no module matches 'Nope'"},
         {Args("run --family media I*"), {}, {}, "no module matches 'I*' in family 'media'"},
         {Args("run --subfamily timer"), {}, {}, "--subfamily needs --family"},
         {Args("run --test-cases Nope,ReadClock IClock"), {}, {}, "has no test case 'Nope'"},
         {Args("run --target no-such-phone"), {}, {}, "no handset matching 'no-such-phone'"},
         {Args("run"), u"KESTIX_HANDSETS"_s, empty, "no handset attached"},
-        {Args("process"), {}, {}, "--log-dir"},
+        {Args("process"), {}, {}, "--log-dir must name a folder of saved logs"},
+        {Args("process --log-dir", dir.filePath(u"a-file"_s)), {}, {}, "--log-dir must name a folder of saved logs"},
         {Args("process --log-dir", empty), {}, {}, "no logs"},
         {Args("manifest -o", dir.filePath(u"a-file"_s)), {}, {}, "a-file"},
     };

@@ -23,15 +23,34 @@ TEST(ToolUsage, BadUsageExitsWithTwoAndExplainsOnStandardError)
 
 TEST(ToolUsage, EveryCommandHasHelpAndTheToolAVersion)
 {
-    QStringList names;
+    // Every command of the list, in its order, with its synopsis.
+    const QByteArray synopses[] = {"kits [options]",
+                                   "platforms [options]",
+                                   "targets [options]",
+                                   "modules [options] [PATTERN...]",
+                                   "manifest [options]",
+                                   "run [options] [PATTERN...]",
+                                   "process [options]",
+                                   "report [options] RESULTS.xml...",
+                                   "res [options] ACTION FILE",
+                                   "mif [options] FILE",
+                                   "tar [options] ACTION FILE",
+                                   "encode [options] FORMAT TEXT",
+                                   "decode [options] HEX",
+                                   "hash [options] TEXT",
+                                   "demo [options] init DIR"};
+    QList<QByteArray> names;
     for (const QByteArray &line : OutputOf(Tool("--help")).split('\n')) {
-        if (line.startsWith("  ") && !line.trimmed().isEmpty())
-            names << QString::fromUtf8(line.trimmed().split(' ').first());
+        if (line.startsWith("  ")) {
+            names << line.mid(2, 11).trimmed();
+            EXPECT_NE(line.at(13), ' ') << "the summaries start in one column: " << line.constData();
+        }
     }
-    ASSERT_FALSE(names.isEmpty());
-    for (const QString &name : names) {
-        const QByteArray usage = OutputOf(Tool(name, "--help"));
-        EXPECT_TRUE(usage.startsWith("Usage: harness " + name.toUtf8())) << usage.constData();
+    ASSERT_EQ(names.size(), std::size(synopses));
+    for (qsizetype i = 0; i < names.size(); ++i) {
+        EXPECT_TRUE(synopses[i].startsWith(names.at(i) + ' ')) << names.at(i).constData();
+        const QByteArray usage = OutputOf(Tool(QString::fromUtf8(names.at(i)), "--help"));
+        EXPECT_TRUE(usage.startsWith("Usage: harness " + synopses[i] + '\n')) << usage.constData();
     }
     EXPECT_TRUE(Tool("help run").out.startsWith("Usage: harness run"));
     EXPECT_TRUE(OutputOf(Tool("--version")).startsWith("harness "));

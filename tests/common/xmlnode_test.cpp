@@ -49,6 +49,7 @@ const char *const kWellFormed[] = {
     "<r> <![CDATA[ ]]> </r>",
     "<r>a<![CDATA[b]]>c<!--d-->e<?f g ?>h</r>",
     "<r><?pi   data  more ?><?empty?></r>",
+    "<r a = '1' b\n=\n\"2\"/>",
     "<r><!-- a - b --></r>",
     "<r><a x='1' y='2' z='3'><b/><c></c ><d\n\tq = 'v' /></a></r>",
     "<r.x-y_z a.b-c='1'/>",
