@@ -291,8 +291,7 @@ const Crafted kCrafted[] = {
         "unexpected end of archive at offset 1124"),
     Row("RandomBytes", RandomBytes(5000, 17), {}, {}, kNotATar),
     Row("TextFile", QByteArray("Package archives are tar files.\n").repeated(40), {}, {}, kNotATar),
-    Row("ShortTextFile", "not an archive\n", {}, {}, kNotATar),
-    Row("EmptyFile", {}),
+    Row("ShortTextFile", "not an archive\n", {}, {}, kNotATar), Row("EmptyFile", {}),
     Row("NothingAfterTheEndBlocksIsListed", Member("a", "x") + kEnd + Member("late", "y") + kEnd, {"a"}, "x"),
     Row("DanglingLongNameNeverNamesTheEndBlocks", Member("././@LongLink", QByteArray("evil\0", 5), 'L') + kEnd),
     Row("VendorRecordsAreNotMembers",
@@ -317,8 +316,7 @@ const Crafted kCrafted[] = {
     Row("PaxRecordLongerThanItsHeader", Member("x", "99 path=a\n", 'x') + Member("a", "x") + kEnd, {}, {},
         "malformed extended header at offset 0"),
     Row("OversizedPaxHeader", Header("x", Octal(8 << 20), 'x') + kEnd, {}, {}, "extended header too large at offset 0"),
-    Row("NameThatIsNotUtf8", Member("caf\xe9.mif", "x") + kEnd, {"caf\\351.mif"}, "x"),
-};
+    Row("NameThatIsNotUtf8", Member("caf\xe9.mif", "x") + kEnd, {"caf\\351.mif"}, "x")};
 
 class CraftedArchive : public TarTest, public ::testing::WithParamInterface<Crafted>
 {

@@ -246,12 +246,10 @@ TEST_F(ManifestScanTest, ModulesTakeTheirRecordsFromDescriptionPathAndPackages)
 TEST_F(ManifestScanTest, LastClassifyingEntryDecidesBetweenSourceAndPrebuilt)
 {
     // The entry, whether it is a folder, whether the module counts as source.
-    const std::tuple<const char *, bool, bool> rows[] = {
-        {"src", true, true}, // "src" after "m.MOD"
-        {"a.c", false, false}, // before it
-        {"Include", true, false}, // "include" < "m.mod"
-        {"z_inc", true, true},
-    };
+    const std::tuple<const char *, bool, bool> rows[] = {{"src", true, true}, // "src" after "m.MOD"
+                                                         {"a.c", false, false}, // before it
+                                                         {"Include", true, false}, // "include" < "m.mod"
+                                                         {"z_inc", true, true}};
     for (int i = 0; i < 4; ++i) {
         const auto &[entry, isDirectory, source] = rows[i];
         const QString folder = u"tests/m/mixed%1"_s.arg(i);
@@ -358,12 +356,10 @@ TEST_F(ManifestScanTest, ASymbolicLinkLoopIsWalkedOnce)
 
 TEST(ManifestLogKind, ModuleKindFollowsTheLogName)
 {
-    const std::pair<const char *, const char *> rows[] = {
-        {"Run-CTF-1.LOG", "ctf"}, {"/logs/Timer-ctf-2026.log", "ctf"},
-        {"run.log", "ctfapplet"}, {"result.TXT", "uitf"},
-        {"/a/b.xml", "uitf"},     {"module.oat", "oat"},
-        {"x.bin", nullptr},       {"noextension", nullptr},
-    };
+    const std::pair<const char *, const char *> rows[] = {{"Run-CTF-1.LOG", "ctf"}, {"/logs/Timer-ctf-2026.log", "ctf"},
+                                                          {"run.log", "ctfapplet"}, {"result.TXT", "uitf"},
+                                                          {"/a/b.xml", "uitf"},     {"module.oat", "oat"},
+                                                          {"x.bin", nullptr},       {"noextension", nullptr}};
     for (const auto &[path, type] : rows) {
         const auto module = Manifest::CreateTestModuleFromLog(QString::fromLatin1(path));
         EXPECT_EQ(module ? module->TestType() : QString(), QString::fromLatin1(type)) << path;
@@ -390,17 +386,15 @@ TEST_F(ManifestCacheTest, OnlyAFormatOfFiveOrLaterIsCurrent)
     Manifest manifest(kit->Root(), false);
     EXPECT_FALSE(manifest.IsVersionOkay()) << "no cache";
     EXPECT_FALSE(manifest.ReadManifest());
-    const std::pair<const char *, bool> rows[] = {
-        {"<testkit version='5'/>", true},
-        {"<TestKit version='7' path='/elsewhere'/>", true},
-        {"<testkit version='4'/>", false},
-        {"<testkit/>", false},
-        {"<testkit version='-7'/>", false},
-        {"<testkit version='99999999999'/>", false},
-        {"<manifest version='5'/>", false},
-        {"<testkit version='5'>", false},
-        {"", false},
-    };
+    const std::pair<const char *, bool> rows[] = {{"<testkit version='5'/>", true},
+                                                  {"<TestKit version='7' path='/elsewhere'/>", true},
+                                                  {"<testkit version='4'/>", false},
+                                                  {"<testkit/>", false},
+                                                  {"<testkit version='-7'/>", false},
+                                                  {"<testkit version='99999999999'/>", false},
+                                                  {"<manifest version='5'/>", false},
+                                                  {"<testkit version='5'>", false},
+                                                  {"", false}};
     for (const auto &[text, current] : rows) {
         WriteCache(manifest, text);
         EXPECT_EQ(manifest.IsVersionOkay(), current) << text;

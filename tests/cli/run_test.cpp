@@ -324,27 +324,26 @@ TEST_F(DemoRun, SetUpFailuresAndBadFiltersAreRefusedBeforeAnythingRuns)
     WriteFile(dir.filePath(u"a-file"_s), "x");
     QDir().mkpath(empty);
     // Arguments, a variable set for the run and its value, the message.
-    const std::tuple<QStringList, QString, QString, const char *> rows[] = {
-        {Args("run --test-data", missing), {}, {}, "--test-data: "},
-        {Args("run --dpk", missing), {}, {}, "--dpk: "},
-        {Args("run"), u"KESTIX_TOOLSET"_s, missing, "tool set"},
-        {Args("run --run-option bogus"), {}, {}, "unknown --run-option 'bogus'"},
-        {Args("run --features", missing), {}, {}, "feature list"},
-        {Args("run"), u"KESTIX_DATA_ROOT"_s, dir.filePath(u"a-file"_s), "is not a folder"},
-        {Args("run --junit", missing), {}, {}, "cannot write --junit"},
-        {Args("run --json", missing), {}, {}, "cannot write --json"},
-        {Args("run --copy-delay soon"), {}, {}, "--copy-delay"},
-        {Args("modules --kit nowhere"), {}, {}, "no test kit 'nowhere'"},
-        {Args("run IClock Nope"), {}, {}, "no module matches 'Nope'"},
-        {Args("run --family media I*"), {}, {}, "no module matches 'I*' in family 'media'"},
-        {Args("run --subfamily timer"), {}, {}, "--subfamily needs --family"},
-        {Args("run --test-cases Nope,ReadClock IClock"), {}, {}, "has no test case 'Nope'"},
-        {Args("run --target no-such-phone"), {}, {}, "no handset matching 'no-such-phone'"},
-        {Args("run"), u"KESTIX_HANDSETS"_s, empty, "no handset attached"},
-        {Args("process"), {}, {}, "--log-dir"},
-        {Args("process --log-dir", empty), {}, {}, "no logs"},
-        {Args("manifest -o", dir.filePath(u"a-file"_s)), {}, {}, "a-file"},
-    };
+    const std::tuple<QStringList, QString, QString, const char *> rows[]
+        = {{Args("run --test-data", missing), {}, {}, "--test-data: "},
+           {Args("run --dpk", missing), {}, {}, "--dpk: "},
+           {Args("run"), u"KESTIX_TOOLSET"_s, missing, "tool set"},
+           {Args("run --run-option bogus"), {}, {}, "unknown --run-option 'bogus'"},
+           {Args("run --features", missing), {}, {}, "feature list"},
+           {Args("run"), u"KESTIX_DATA_ROOT"_s, dir.filePath(u"a-file"_s), "is not a folder"},
+           {Args("run --junit", missing), {}, {}, "cannot write --junit"},
+           {Args("run --json", missing), {}, {}, "cannot write --json"},
+           {Args("run --copy-delay soon"), {}, {}, "--copy-delay"},
+           {Args("modules --kit nowhere"), {}, {}, "no test kit 'nowhere'"},
+           {Args("run IClock Nope"), {}, {}, "no module matches 'Nope'"},
+           {Args("run --family media I*"), {}, {}, "no module matches 'I*' in family 'media'"},
+           {Args("run --subfamily timer"), {}, {}, "--subfamily needs --family"},
+           {Args("run --test-cases Nope,ReadClock IClock"), {}, {}, "has no test case 'Nope'"},
+           {Args("run --target no-such-phone"), {}, {}, "no handset matching 'no-such-phone'"},
+           {Args("run"), u"KESTIX_HANDSETS"_s, empty, "no handset attached"},
+           {Args("process"), {}, {}, "--log-dir"},
+           {Args("process --log-dir", empty), {}, {}, "no logs"},
+           {Args("manifest -o", dir.filePath(u"a-file"_s)), {}, {}, "a-file"}};
     for (const auto &[arguments, variable, value, error] : rows) {
         SCOPED_TRACE((arguments.join(u' ') + u' ' + variable).toStdString());
         const QProcessEnvironment saved = env;

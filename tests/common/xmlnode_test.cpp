@@ -32,63 +32,47 @@ QString ThroughTree(const std::unique_ptr<XmlNode> &root)
 }
 
 // Documents both readers take, each meant to trip one rule of reading.
-const char *const kWellFormed[] = {
-    "<r/>",
-    "<?xml version=\"1.0\"?>\n<r a='1'/>",
-    "<?xml version='1.0' encoding='utf-8' standalone='yes'?><r/>",
-    "\xEF\xBB\xBF<r>bom</r>",
-    "<!-- before --><?pi before?>\n<r/>\n<!-- after -->",
-    "<r>\n  <a/>\n  <b>text</b>\n</r>",
-    "<r>  <a/>  text with blanks  <b/>  </r>",
-    "<r>&lt; &gt; &amp; &apos; &quot; &#65;&#x42;&#x1F600;&#x4A;&#x4a;</r>",
-    "<r>&#32;</r>",
-    "<r>\xC2\xA0</r>",
-    "<r>a\r\nb\rc&#13;</r>",
-    "<r a='1&#10;2\n3\t4\r\n5&#13;6' b=\"'\" c='\"' d='&lt;&amp;' e='>'/>",
-    "<r><![CDATA[ <not markup> & ]]]]><![CDATA[> ]]></r>",
-    "<r> <![CDATA[ ]]> </r>",
-    "<r>a<![CDATA[b]]>c<!--d-->e<?f g ?>h</r>",
-    "<r><?pi   data  more ?><?empty?></r>",
-    "<r><!-- a - b --></r>",
-    "<r><a x='1' y='2' z='3'><b/><c></c ><d\n\tq = 'v' /></a></r>",
-    "<r.x-y_z a.b-c='1'/>",
-    "<r>\xE6\x97\xA5\xE6\x9C\xAC \xD0\xBA\xD0\xB8\xD1\x80 \xF0\x9F\x98\x80</r>",
-    "<r a='\xC3\xA9t\xC3\xA9 \xEF\xBF\xBD'>]]</r>",
-    "<r>]&gt;</r>",
-    // Taken by the full reader only (kFullOnly rows).
-    "<!DOCTYPE r [<!ENTITY e 'expanded'>]><r>&e;</r>",
-    "<?xml version='1.0' encoding='ISO-8859-1'?><r>\xE9t\xE9</r>",
-    "<a:r xmlns:a='urn:x' a:b='1'><a:c/></a:r>",
-};
+const char *const kWellFormed[]
+    = {"<r/>", "<?xml version=\"1.0\"?>\n<r a='1'/>", "<?xml version='1.0' encoding='utf-8' standalone='yes'?><r/>",
+       "\xEF\xBB\xBF<r>bom</r>", "<!-- before --><?pi before?>\n<r/>\n<!-- after -->",
+       "<r>\n  <a/>\n  <b>text</b>\n</r>", "<r>  <a/>  text with blanks  <b/>  </r>",
+       "<r>&lt; &gt; &amp; &apos; &quot; &#65;&#x42;&#x1F600;&#x4A;&#x4a;</r>", "<r>&#32;</r>", "<r>\xC2\xA0</r>",
+       "<r>a\r\nb\rc&#13;</r>", "<r a='1&#10;2\n3\t4\r\n5&#13;6' b=\"'\" c='\"' d='&lt;&amp;' e='>'/>",
+       "<r><![CDATA[ <not markup> & ]]]]><![CDATA[> ]]></r>", "<r> <![CDATA[ ]]> </r>",
+       "<r>a<![CDATA[b]]>c<!--d-->e<?f g ?>h</r>", "<r><?pi   data  more ?><?empty?></r>", "<r><!-- a - b --></r>",
+       "<r><a x='1' y='2' z='3'><b/><c></c ><d\n\tq = 'v' /></a></r>", "<r.x-y_z a.b-c='1'/>",
+       "<r>\xE6\x97\xA5\xE6\x9C\xAC \xD0\xBA\xD0\xB8\xD1\x80 \xF0\x9F\x98\x80</r>",
+       "<r a='\xC3\xA9t\xC3\xA9 \xEF\xBF\xBD'>]]</r>", "<r>]&gt;</r>",
+       // Taken by the full reader only (kFullOnly rows).
+       "<!DOCTYPE r [<!ENTITY e 'expanded'>]><r>&e;</r>", "<?xml version='1.0' encoding='ISO-8859-1'?><r>\xE9t\xE9</r>",
+       "<a:r xmlns:a='urn:x' a:b='1'><a:c/></a:r>"};
 
 constexpr size_t kFullOnly = 3;
 
 // Documents neither reader takes.
-const char *const kMalformed[] = {
-    "",
-    "   ",
-    "<r>",
-    "<r></s>",
-    "<r a='1' a='2'/>",
-    "<r a='1'b='2'/>",
-    "<r a='<'/>",
-    "<r>]]></r>",
-    "<r>&unknown;</r>",
-    "<r>&#0;</r>",
-    "<r>&#xD800;</r>",
-    "<r>&#65</r>",
-    "<r>\x01</r>",
-    "<r>\xEF\xBF\xBE</r>",
-    "<r a='\xEF\xBF\xBE'/>",
-    "<r><!-- a -- b --></r>",
-    "<r><?xml version='1.0'?></r>",
-    "<?xml version='1.1'?><r/>",
-    "<r/><s/>",
-    "<r/>text",
-    "<-r/>",
-    "<r>\xC3</r>",
-    "text",
-};
+const char *const kMalformed[] = {"",
+                                  "   ",
+                                  "<r>",
+                                  "<r></s>",
+                                  "<r a='1' a='2'/>",
+                                  "<r a='1'b='2'/>",
+                                  "<r a='<'/>",
+                                  "<r>]]></r>",
+                                  "<r>&unknown;</r>",
+                                  "<r>&#0;</r>",
+                                  "<r>&#xD800;</r>",
+                                  "<r>&#65</r>",
+                                  "<r>\x01</r>",
+                                  "<r>\xEF\xBF\xBE</r>",
+                                  "<r a='\xEF\xBF\xBE'/>",
+                                  "<r><!-- a -- b --></r>",
+                                  "<r><?xml version='1.0'?></r>",
+                                  "<?xml version='1.1'?><r/>",
+                                  "<r/><s/>",
+                                  "<r/>text",
+                                  "<-r/>",
+                                  "<r>\xC3</r>",
+                                  "text"};
 
 TEST(XmlNode, ReadsEveryDocumentAsTheDomDoes)
 {

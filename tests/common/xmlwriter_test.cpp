@@ -28,23 +28,22 @@ QDomDocument Parse(const QString &text)
 // the nodes the document holds (a declaration, no document type).
 TEST(XmlWriter, WritesParsedDocumentsInOneOrderAndIndentation)
 {
-    const std::pair<QString, QString> rows[] = {
-        // as read, as written
-        {u"<manifest><module zeta='ZETA' name='NAME' alpha='ALPHA' type='TYPE' id='ID' b='B'>"
-         "<testcase>Run &amp; &lt;check></testcase></module></manifest>"_s,
-         u"<manifest>\n"
-         " <module alpha=\"ALPHA\" b=\"B\" id=\"ID\" name=\"NAME\" type=\"TYPE\" zeta=\"ZETA\">\n"
-         "  <testcase>Run &amp; &lt;check&gt;</testcase>\n"
-         " </module>\n"
-         "</manifest>\n"_s},
-        {u"<a q=\"1\" w=\"2\" e=\"3\" r=\"4\" t=\"5\" y=\"6\" u=\"7\" i=\"8\"><b x=\"1\" y=\"2\"/></a>"_s,
-         u"<a e=\"3\" i=\"8\" q=\"1\" r=\"4\" t=\"5\" u=\"7\" w=\"2\" y=\"6\">\n <b x=\"1\" y=\"2\"/>\n</a>\n"_s},
-        {u"<r/>"_s, u"<r/>\n"_s},
-        {u"<?xml version=\"1.0\" encoding=\"UTF-8\"?><r><!--c--><?pi x?></r>"_s,
-         u"<?xml version='1.0' encoding='UTF-8'?>\n<r>\n <!--c-->\n <?pi x?>\n</r>\n"_s},
-        {u"<?xml version=\"1.0\"?><a/>"_s, u"<?xml version='1.0'?>\n<a/>\n"_s},
-        {u"<!DOCTYPE a SYSTEM \"a.dtd\"><a/>"_s, u"<a/>\n"_s},
-    };
+    const std::pair<QString, QString> rows[]
+        = {// as read, as written
+           {u"<manifest><module zeta='ZETA' name='NAME' alpha='ALPHA' type='TYPE' id='ID' b='B'>"
+            "<testcase>Run &amp; &lt;check></testcase></module></manifest>"_s,
+            u"<manifest>\n"
+            " <module alpha=\"ALPHA\" b=\"B\" id=\"ID\" name=\"NAME\" type=\"TYPE\" zeta=\"ZETA\">\n"
+            "  <testcase>Run &amp; &lt;check&gt;</testcase>\n"
+            " </module>\n"
+            "</manifest>\n"_s},
+           {u"<a q=\"1\" w=\"2\" e=\"3\" r=\"4\" t=\"5\" y=\"6\" u=\"7\" i=\"8\"><b x=\"1\" y=\"2\"/></a>"_s,
+            u"<a e=\"3\" i=\"8\" q=\"1\" r=\"4\" t=\"5\" u=\"7\" w=\"2\" y=\"6\">\n <b x=\"1\" y=\"2\"/>\n</a>\n"_s},
+           {u"<r/>"_s, u"<r/>\n"_s},
+           {u"<?xml version=\"1.0\" encoding=\"UTF-8\"?><r><!--c--><?pi x?></r>"_s,
+            u"<?xml version='1.0' encoding='UTF-8'?>\n<r>\n <!--c-->\n <?pi x?>\n</r>\n"_s},
+           {u"<?xml version=\"1.0\"?><a/>"_s, u"<?xml version='1.0'?>\n<a/>\n"_s},
+           {u"<!DOCTYPE a SYSTEM \"a.dtd\"><a/>"_s, u"<a/>\n"_s}};
     for (const auto &[read, written] : rows) {
         const QDomDocument doc = Parse(read);
         EXPECT_EQ(XmlWriter::ToString(doc), written);

@@ -83,13 +83,11 @@ TEST_F(HarnessCompileTest, OnlyKsxIsConvertedAndAFailedStepKeepsTheSourceAndNoIn
     {
         const char *source, *failing, *compileInput;
         bool compiled;
-    } rows[] = {
-        {"data.kar", nullptr, "data.kar", true},
-        {"data.ksx.txt", nullptr, "data.ksx.txt", true},
-        {"ksx", nullptr, "ksx", true},
-        {"strings.ksx", "convert_fails", "strings.ksx", true},
-        {"strings.ksx", "compile_fails", "car", false},
-    };
+    } rows[] = {{"data.kar", nullptr, "data.kar", true},
+                {"data.ksx.txt", nullptr, "data.ksx.txt", true},
+                {"ksx", nullptr, "ksx", true},
+                {"strings.ksx", "convert_fails", "strings.ksx", true},
+                {"strings.ksx", "compile_fails", "car", false}};
     for (const auto &row : rows) {
         SCOPED_TRACE(row.source + std::string(" ") + (row.failing ? row.failing : ""));
         const QString source = RootPath(QString::fromLatin1(row.source));
@@ -292,12 +290,10 @@ TEST_F(HarnessSetupTest, KitAndPlatformAreTheDefaultsTheFirstListedEntryNamedOrA
     {
         const char *kit, *platform, *expectedKit, *expectedPlatform;
         bool kitNotSelected;
-    } rows[] = {
-        {"", "", "kits/KitTwo", "platforms/Beta Pro/pvs/platform", false},
-        {"", "ALPHA", "kits/KitTwo", "platforms/Alpha Pro/pvs/platform", true},
-        {"Kit", "a", "kits/KitOne", "platforms/Alpha Pro/pvs/platform", false},
-        {"elsewhere/kit", "sdk/../sdk/p", "elsewhere/kit", "sdk/p/pvs/platform", false},
-    };
+    } rows[] = {{"", "", "kits/KitTwo", "platforms/Beta Pro/pvs/platform", false},
+                {"", "ALPHA", "kits/KitTwo", "platforms/Alpha Pro/pvs/platform", true},
+                {"Kit", "a", "kits/KitOne", "platforms/Alpha Pro/pvs/platform", false},
+                {"elsewhere/kit", "sdk/../sdk/p", "elsewhere/kit", "sdk/p/pvs/platform", false}};
     for (const auto &row : rows) {
         SCOPED_TRACE(row.kit + std::string(" ") + row.platform);
         CapturedLog log;

@@ -46,19 +46,17 @@ TEST_F(FeatureListTest, FeaturesSelectTheirModulesAndUnknownNamesAreWarnedOneByO
         QByteArray xml;
         QStringList selected;
         QStringList warned;
-    } rows[] = {
-        {"<features><feature testModule=\"Bar\"/><feature name=\"no module\"/></features>", {u"Bar"_s}, {}},
-        // Any letter case, any depth.
-        {"<root><group><sub><feature testModule=\"foo\"/></sub></group><Feature testModule=\"SHELL\"/></root>",
-         {u"Foo"_s, u"Shell"_s},
-         {}},
-        // A secondary module is never selected, and a pattern is not a module name.
-        {"<f><feature testModule=\"Ghost\"/><feature testModule=\"Bar\"/>"
-         "<feature testModule=\"Lib\"/><feature testModule=\"Fo*\"/></f>",
-         {u"Bar"_s, u"Foo"_s, u"FooPlus"_s},
-         {u"Ghost"_s, u"Lib"_s, u"Fo*"_s}},
-        {deep, {u"Bar"_s, u"Foo"_s, u"Shell"_s}, {}},
-    };
+    } rows[] = {{"<features><feature testModule=\"Bar\"/><feature name=\"no module\"/></features>", {u"Bar"_s}, {}},
+                // Any letter case, any depth.
+                {"<root><group><sub><feature testModule=\"foo\"/></sub></group><Feature testModule=\"SHELL\"/></root>",
+                 {u"Foo"_s, u"Shell"_s},
+                 {}},
+                // A secondary module is never selected, and a pattern is not a module name.
+                {"<f><feature testModule=\"Ghost\"/><feature testModule=\"Bar\"/>"
+                 "<feature testModule=\"Lib\"/><feature testModule=\"Fo*\"/></f>",
+                 {u"Bar"_s, u"Foo"_s, u"FooPlus"_s},
+                 {u"Ghost"_s, u"Lib"_s, u"Fo*"_s}},
+                {deep, {u"Bar"_s, u"Foo"_s, u"Shell"_s}, {}}};
     for (const auto &row : rows) {
         SCOPED_TRACE(row.xml.left(200).toStdString());
         const qsizetype logged = m_log.Text().size();
@@ -92,13 +90,12 @@ TEST_F(FeatureListTest, FilterSelectionAppendsKitThenPlatformAndAPlatformOnlySel
 
 TEST_F(FeatureListTest, BadFeatureFilesSelectNothingAndSayWhy)
 {
-    const char *rows[][2] = {
-        // content (null: no file at all), the message as a pattern where %1 is the file's path
-        {nullptr, "BFS File %1 not found\\."},
-        {"<features><feature testModule=\"Foo\">", "Error Parsing BFS File %1, Error:.+ Line:1 Column:\\d+"},
-        {"<features>\n<feature testModule=\"Foo\">\n</x>", "Error Parsing BFS File %1, Error:.+ Line:3 Column:\\d+"},
-        {"<features><module name=\"Foo\"/></features>", "No testcases in BFS File %1\\."},
-    };
+    const char *rows[][2]
+        = {// content (null: no file at all), the message as a pattern where %1 is the file's path
+           {nullptr, "BFS File %1 not found\\."},
+           {"<features><feature testModule=\"Foo\">", "Error Parsing BFS File %1, Error:.+ Line:1 Column:\\d+"},
+           {"<features>\n<feature testModule=\"Foo\">\n</x>", "Error Parsing BFS File %1, Error:.+ Line:3 Column:\\d+"},
+           {"<features><module name=\"Foo\"/></features>", "No testcases in BFS File %1\\."}};
     for (const auto &row : rows) {
         SCOPED_TRACE(row[1]);
         const QString path = row[0] ? Features(row[0]) : m_dir.filePath(u"missing.xml"_s);

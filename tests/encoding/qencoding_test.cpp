@@ -171,8 +171,7 @@ const Conversion kConversions[] = {
     {"CP949 extension", ENCODING_CP949, kBoth, Bytes({0x81, 0x41, 0xB0, 0xA1}), Units({0xAC02, 0xAC00})},
     {"CP949 unmapped", ENCODING_CP949, kDecodes, Bytes({0xC9, 0xA1, 0x80, 0x41}), Units({' ', ' '})},
     {"CP949 unmapped", ENCODING_CP949, kEncodes, "?z", Units({0xE000, 'z'})},
-    {"CP949 stops at NUL", ENCODING_CP949, kDecodes, Bytes({0x41, 0x00, 0x42}), Units({'A'})},
-};
+    {"CP949 stops at NUL", ENCODING_CP949, kDecodes, Bytes({0x41, 0x00, 0x42}), Units({'A'})}};
 
 class Converts : public ::testing::TestWithParam<Conversion>
 {

@@ -35,12 +35,10 @@ SysResource Program(const QByteArray &name)
 TEST(OatNames, DerivesHandsetNamesFromTheModuleName)
 {
     // Module name, information file name; handset folder, information file, log base.
-    const char *rows[][5] = {
-        {"OatTimer", "", "oattimer", "oattimer.mif", "fs:/shared/pek/log/timer"},
-        {"Timer", "", "oattimer", "oattimer.mif", "fs:/shared/pek/log/timer"},
-        {"OATNet", "Net_Suite.mif", "oatnet", "Net_Suite.mif", "fs:/shared/pek/log/net"},
-        {"", "", "oat", "oat.mif", "fs:/shared/pek/log/"},
-    };
+    const char *rows[][5] = {{"OatTimer", "", "oattimer", "oattimer.mif", "fs:/shared/pek/log/timer"},
+                             {"Timer", "", "oattimer", "oattimer.mif", "fs:/shared/pek/log/timer"},
+                             {"OATNet", "Net_Suite.mif", "oatnet", "Net_Suite.mif", "fs:/shared/pek/log/net"},
+                             {"", "", "oat", "oat.mif", "fs:/shared/pek/log/"}};
     for (const auto &row : rows) {
         SCOPED_TRACE(row[0]);
         OatTestModule module;
@@ -229,12 +227,10 @@ TEST_F(OatPostProcess, FrameworkPostProcessCoversTheWholeRawFolder)
 
 TEST_F(OatPostProcess, MissingEntryStopsWithItsMessageAndKeepsTheRawLogs)
 {
-    const char *rows[][2] = {
-        {"OatRawLogPath", "OatTestModule::PostProcess missing oat source log directory"},
-        {"LogPath", "OatTestModule::PostProcess missing destination log directory"},
-        {"DSOCacheFilePath", "OatTestModule::PostProcess missing devicePack file."},
-        {"Platform", "OatTestModule::PostProcess missing platform directory."},
-    };
+    const char *rows[][2] = {{"OatRawLogPath", "OatTestModule::PostProcess missing oat source log directory"},
+                             {"LogPath", "OatTestModule::PostProcess missing destination log directory"},
+                             {"DSOCacheFilePath", "OatTestModule::PostProcess missing devicePack file."},
+                             {"Platform", "OatTestModule::PostProcess missing platform directory."}};
     for (const auto &[key, message] : rows) {
         QMap<QString, QString> partial = env;
         partial.remove(QLatin1String(key));

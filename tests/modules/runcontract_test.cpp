@@ -159,13 +159,12 @@ TEST_F(RunContract, EachKindStampsItsHeaderAtItsAnchorAndKeepsTheBytes)
     // suite line or at the end, OAT before the last module version line ahead
     // of any header, UT text after the first line. No Perl cache: OAT logs are
     // only stamped.
-    const std::tuple<_TestModule *, QString, QByteArray, QByteArray> rows[] = {
-        {&ctf, u"a.log"_s, latin + "Test: t1\nTest: t2\n", latin + header + "Test: t1\nTest: t2\n\n"},
-        {&ctf, u"b.log"_s, "no anchor", "no anchor\n" + header},
-        {&oat, u"t.oat"_s, "@Timer\nModuleVer: 1\nModuleVer: 2\nGUID:old\nModuleVer: 3\n",
-         "@Timer\nModuleVer: 1\n" + header + "ModuleVer: 2\nGUID:old\nModuleVer: 3\n\n"},
-        {&ut, u"r.TXT"_s, "first\nsecond\n", "first\n" + header + "second\n\n"},
-    };
+    const std::tuple<_TestModule *, QString, QByteArray, QByteArray> rows[]
+        = {{&ctf, u"a.log"_s, latin + "Test: t1\nTest: t2\n", latin + header + "Test: t1\nTest: t2\n\n"},
+           {&ctf, u"b.log"_s, "no anchor", "no anchor\n" + header},
+           {&oat, u"t.oat"_s, "@Timer\nModuleVer: 1\nModuleVer: 2\nGUID:old\nModuleVer: 3\n",
+            "@Timer\nModuleVer: 1\n" + header + "ModuleVer: 2\nGUID:old\nModuleVer: 3\n\n"},
+           {&ut, u"r.TXT"_s, "first\nsecond\n", "first\n" + header + "second\n\n"}};
     for (const auto &[module, file, text, stamped] : rows) {
         module->moduleName = u"Timer"_s;
         module->idHash = u"#5"_s;

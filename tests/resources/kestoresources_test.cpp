@@ -51,11 +51,9 @@ TEST(KestoResources, StoresStringsWithTheirMark)
         QString text;
         const char *block;
         Getter getter;
-    } rows[] = {
-        {6, 0, u"AB"_s, "FFFE41004200", &KestoResources::GetCompanyName},
-        {8, 6, u"1.0"_s, "02312E30", &KestoResources::GetApplicationVersion},
-        {7, 1, u"\u00a9 K"_s, "03A9204B", &KestoResources::GetCopyright},
-    };
+    } rows[] = {{6, 0, u"AB"_s, "FFFE41004200", &KestoResources::GetCompanyName},
+                {8, 6, u"1.0"_s, "02312E30", &KestoResources::GetApplicationVersion},
+                {7, 1, u"\u00a9 K"_s, "03A9204B", &KestoResources::GetCopyright}};
     KestoResources resources;
     for (const auto &row : rows) {
         ASSERT_TRUE(resources.AddString(1, row.id, row.format, row.text));

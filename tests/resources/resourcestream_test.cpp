@@ -232,15 +232,14 @@ TEST(ResourceStream, At65535PairsSavesAndOneMoreIsRefused)
 // leaves the stream as it was.
 TEST(ResourceStream, CorruptInputIsRefusedAndChangesNothing)
 {
-    QList<QPair<QString, QByteArray>> inputs = {
-        {u"HugeResourceCount"_s, Compose({}, {}, QByteArray(), 0xFFFFFFFFu)},
-        {u"MapCountPastInput"_s, Compose({{1, 1, 0, 0}}, {48, 49}, "x", 1).left(40)},
-        {u"OffsetsRunBackwards"_s, Compose({{1, 1, 0, 0}, {1, 2, 0, 1}}, {60, 62, 61}, "xy", 2)},
-        {u"OffsetPastInput"_s, Compose({{1, 1, 0, 0}}, {48, 4000}, "x", 1)},
-        {u"OffsetIndexPastBlocks"_s, Compose({{1, 1, 0, 1}}, {48, 49}, "x", 1)},
-        {u"RangePastBlocks"_s, Compose({{5, 10, 3, 0}}, {52, 53, 55, 58}, "ABBCCC", 3)},
-        {u"RangesCoverMoreIdsThanInputBytes"_s, ManyRanges(123)},
-    };
+    QList<QPair<QString, QByteArray>> inputs
+        = {{u"HugeResourceCount"_s, Compose({}, {}, QByteArray(), 0xFFFFFFFFu)},
+           {u"MapCountPastInput"_s, Compose({{1, 1, 0, 0}}, {48, 49}, "x", 1).left(40)},
+           {u"OffsetsRunBackwards"_s, Compose({{1, 1, 0, 0}, {1, 2, 0, 1}}, {60, 62, 61}, "xy", 2)},
+           {u"OffsetPastInput"_s, Compose({{1, 1, 0, 0}}, {48, 4000}, "x", 1)},
+           {u"OffsetIndexPastBlocks"_s, Compose({{1, 1, 0, 1}}, {48, 49}, "x", 1)},
+           {u"RangePastBlocks"_s, Compose({{5, 10, 3, 0}}, {52, 53, 55, 58}, "ABBCCC", 3)},
+           {u"RangesCoverMoreIdsThanInputBytes"_s, ManyRanges(123)}};
     const QByteArray file = RichFile();
     for (int length = 0; length < file.size(); ++length)
         inputs.append({u"the first %1 bytes"_s.arg(length), file.left(length)});
