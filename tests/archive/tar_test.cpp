@@ -51,8 +51,7 @@ QStringList Names(const Tar &tar)
     return names;
 }
 
-// A header block with a valid checksum (summed over signed bytes when asked).
-// size is the raw 12-byte size field.
+// A header block with a valid checksum (summed over signed bytes when asked). size is the raw 12-byte size field.
 QByteArray Header(const QByteArray &name, const QByteArray &size, char type = '0', const QByteArray &link = {},
                   bool signedSum = false)
 {

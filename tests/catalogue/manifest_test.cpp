@@ -1,5 +1,4 @@
-// Building a catalogue by scanning kits made at test time, the cached
-// catalogue file and the queries on a catalogue.
+// Building a catalogue by scanning kits made at test time, the cached catalogue file and the queries on a catalogue.
 
 #include "catalogue/framework.h"
 #include "catalogue/manifest.h"
@@ -154,11 +153,9 @@ TEST_F(ManifestScanTest, PlatformManifestWalksTestframeworksLikeAnyFolder)
     EXPECT_EQ(module->source + u' ' + module->family + u'/' + module->subFamily, u"PVS testframeworks/ctf"_s);
 }
 
-// Families come from the description or else from the path; broken
-// descriptions are skipped; the first
-// description of a name wins and later ones add their package targets; source
-// modules get targets and prebuilt ones do not; oat modules find their
-// baseline file.
+// Families come from the description or else from the path; broken descriptions are skipped; the first description of a
+// name wins and later ones add their package targets; source modules get targets and prebuilt ones do not; oat modules
+// find their baseline file.
 TEST_F(ManifestScanTest, ModulesTakeTheirRecordsFromDescriptionPathAndPackages)
 {
     kit->AddSourceModule(u"tests/multimedia/audio"_s, MakeModule(u"ctf"_s, u"Audio"_s));
@@ -317,8 +314,7 @@ TEST_F(ManifestScanTest, ModuleInformationComesFromTheFirstMatchingMemberThatLoa
                     {{u"Other/Other.mif"_s, testutil::BuildMif(other)},
                      {u"Mif/MIF.MIF.bak"_s, QByteArray("not a resource file")},
                      {u"Mif/Mif.mif"_s, testutil::BuildMif(module.package)}});
-    // A package that is not an archive, and one cut short, are refused with
-    // their reason: neither becomes a target.
+    // A package that is not an archive, and one cut short, are refused with their reason: neither becomes a target.
     kit->AddFile(u"tests/mif/package/Mif_armgcc_Release.kestix"_s, QByteArray(700, 'x'));
     kit->AddFile(u"tests/mif/package/Mif_Win32_Release.kestix"_s,
                  testutil::ReadFile(kit->Path(u"tests/mif/package/Mif_Win32_Debug.kestix"_s)).left(1500));
@@ -462,8 +458,7 @@ TEST_F(ManifestCacheTest, ReadingKeepsKnownKindsAndNamedFrameworksOnlyAndReplace
     EXPECT_EQ(manifest.frameworks.keys(), (QStringList{"OAT", "ctf", "oat"}));
 }
 
-// A kit with a module of every kind, records in their packages, and
-// frameworks of both origins.
+// A kit with a module of every kind, records in their packages, and frameworks of both origins.
 TEST_F(ManifestCacheTest, WrittenCatalogueIsWellFormedAndReadsBackTheSame)
 {
     Module ctf = MakeModule(u"ctf"_s, u"Timer"_s);
@@ -507,8 +502,7 @@ TEST_F(ManifestCacheTest, WrittenCatalogueIsWellFormedAndReadsBackTheSame)
     EXPECT_EQ(root.lastChildElement().tagName(), u"frameworks"_s);
     EXPECT_EQ(root.firstChildElement().childNodes().size(), 6);
     testutil::ExpectXmllintAccepts(scanned.cacheFile);
-    // The tool scans in a process of its own, with its own hash seed: the
-    // catalogue it writes must hold the same bytes.
+    // The tool scans in a process of its own, with its own hash seed: the catalogue it writes must hold the same bytes.
     QByteArray output;
     ASSERT_EQ(testutil::RunProgram(u"" HARNESS_BINARY_DIR "/harness"_s,
                                    {u"manifest"_s, u"--kit"_s, kit->Root(), u"-o"_s, TempPath(u"tool"_s)}, &output),
@@ -519,8 +513,7 @@ TEST_F(ManifestCacheTest, WrittenCatalogueIsWellFormedAndReadsBackTheSame)
     Manifest read(kit->Root(), false);
     ASSERT_TRUE(read.IsVersionOkay());
     ASSERT_TRUE(read.ReadManifest());
-    // What the scan found is really there; the kinds and hashes come back as
-    // the byte comparison below shows.
+    // What the scan found is really there; the kinds and hashes come back as the byte comparison below shows.
     ASSERT_EQ(read.testModules.size(), scanned.testModules.size());
     const auto timer = read.FindTestModule(u"TIMER"_s).dynamicCast<CtfTestModule>();
     ASSERT_TRUE(timer);
@@ -538,9 +531,8 @@ TEST_F(ManifestCacheTest, WrittenCatalogueIsWellFormedAndReadsBackTheSame)
     EXPECT_EQ(frameworks[0]->name, u"ctf"_s);
     EXPECT_TRUE(frameworks[1].dynamicCast<_OatFramework>());
 
-    // Everything, including the kinds' own elements, survives: the read
-    // catalogue writes the same bytes, except for the empty "data" marks of
-    // program records, whose bytes the manifest never holds.
+    // Everything, including the kinds' own elements, survives: the read catalogue writes the same bytes, except for the
+    // empty "data" marks of program records, whose bytes the manifest never holds.
     const QString again = TempPath(u"again.xml"_s);
     ASSERT_TRUE(read.WriteManifest(again));
     QByteArray expected = bytes;
@@ -560,8 +552,7 @@ TEST_F(ManifestCacheTest, EmptyCatalogueIsNeverWrittenNorOneToAnUnwritablePlace)
     EXPECT_FALSE(manifest.WriteManifest(TempPath(u"empty.xml"_s)));
     EXPECT_FALSE(QFile::exists(TempPath(u"empty.xml"_s)));
 
-    // Writing recreates a missing cache folder, but an unwritable
-    // destination answers false with a message.
+    // Writing recreates a missing cache folder, but an unwritable destination answers false with a message.
     kit->AddSourceModule(u"tests/a"_s, MakeModule(u"ctf"_s, u"A"_s));
     ASSERT_TRUE(QDir(manifest.cacheDirectory).removeRecursively());
     ASSERT_TRUE(manifest.GenerateManifest(true));
@@ -617,8 +608,7 @@ TEST_F(ManifestQueryTest, NamePatternsUseLeadingAndTrailingWildCards)
     EXPECT_EQ(Select({u"*NET*"_s}), (QStringList{"EtherNet", "Net", "NetWork", "SubNetTool"}));
     EXPECT_EQ(Select({u"net"_s}), QStringList{"Net"});
     EXPECT_EQ(Select({u"nothing"_s}), QStringList{});
-    // Each module is taken once, on the first pattern that fits; the family
-    // filters do not apply to names.
+    // Each module is taken once, on the first pattern that fits; the family filters do not apply to names.
     EXPECT_EQ(Select({u"*net"_s, u"net*"_s, u"audio"_s}, u"none"_s),
               (QStringList{"Audio", "EtherNet", "Net", "NetWork"}));
     EXPECT_EQ(Select({u"*"_s}).size(), 5);

@@ -1,5 +1,4 @@
-// The catalogue's records: compiler variants, frameworks, test cases and the
-// modules' own entries.
+// The catalogue's records: compiler variants, frameworks, test cases and the modules' own entries.
 
 #include "catalogue/compilervariant.h"
 #include "catalogue/framework.h"
@@ -137,9 +136,8 @@ TEST(Framework, WritesClassIdInDecimalAndPaddedHexAndGivesTheFirstVariantByNameF
     EXPECT_EQ(element.firstChildElement().attribute(u"name"_s), u"0"_s);
 }
 
-// IsLoaded asks the module, then the class directory; Load hands the package
-// path over unchanged, even when empty; Unload falls back to the directory
-// named after the framework.
+// IsLoaded asks the module, then the class directory; Load hands the package path over unchanged, even when empty;
+// Unload falls back to the directory named after the framework.
 TEST(Framework, LoadsAndUnloadsThroughTheHandset)
 {
     MockDevice device;
@@ -299,8 +297,7 @@ TEST(TestModuleRecord, ManifestEntryRoundTrips)
     EXPECT_EQ(written.attribute(u"flagshex"_s), u"0x001f"_s);
     EXPECT_EQ(element.firstChildElement(u"secondary_modules"_s).childNodes().size(), 1);
 
-    // Whole catalogues read back the same (manifest_test); here the fields a
-    // scanned kit leaves at their defaults.
+    // Whole catalogues read back the same (manifest_test); here the fields a scanned kit leaves at their defaults.
     RecordModule back;
     ASSERT_TRUE(back.ReadFromManifest(element));
     EXPECT_EQ(back.IDHash(), module.IDHash());

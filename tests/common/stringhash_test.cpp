@@ -6,9 +6,8 @@ using namespace Qt::StringLiterals;
 
 namespace {
 
-// Values of the stored-file hash, worked out independently of this code
-// (long inputs exercise the fold of the top nibble; the last one a
-// surrogate pair, hashed as two UTF-16 units).
+// Values of the stored-file hash, worked out independently of this code (long inputs exercise the fold of the top
+// nibble; the last one a surrogate pair, hashed as two UTF-16 units).
 TEST(StringHash, MatchesTheStoredHashOfEveryCacheName)
 {
     const std::pair<QString, unsigned int> rows[] = {{u""_s, 0},

@@ -23,9 +23,8 @@ QDomDocument Parse(const QString &text)
     return doc;
 }
 
-// Documents as read and as written: attributes ordered by name (Qt's own
-// serialiser orders them by a per-process seed), one blank per level, and only
-// the nodes the document holds (a declaration, no document type).
+// Documents as read and as written: attributes ordered by name (Qt's own serialiser orders them by a per-process seed),
+// one blank per level, and only the nodes the document holds (a declaration, no document type).
 TEST(XmlWriter, WritesParsedDocumentsInOneOrderAndIndentation)
 {
     const std::pair<QString, QString> rows[]
@@ -117,9 +116,8 @@ TEST(XmlWriterDeclarations, AsciiStringEscapesEverythingBeyondAscii)
     EXPECT_EQ(back.documentElement().text(), u"caf\u00e9 & \u65e5a\u00e9]]>b"_s);
 }
 
-// Writing a document piece by piece gives the bytes of writing it whole,
-// escaping and attribute order included; an opened element that receives
-// nothing closes as an empty one.
+// Writing a document piece by piece gives the bytes of writing it whole, escaping and attribute order included; an
+// opened element that receives nothing closes as an empty one.
 TEST(XmlWriterStream, PiecesGiveTheBytesOfTheWholeDocument)
 {
     const QDomDocument whole
@@ -149,8 +147,7 @@ TEST(XmlWriterStream, PiecesGiveTheBytesOfTheWholeDocument)
 
 TEST(XmlWriterStream, ADeviceReceivesTheSameBytesPieceByPiece)
 {
-    // Enough text to be passed on in several pieces, with characters whose
-    // UTF-8 takes more than one byte.
+    // Enough text to be passed on in several pieces, with characters whose UTF-8 takes more than one byte.
     const auto write = [](XmlWriter::DocumentStream &out) {
         XmlNode root(u"kit"_s);
         root.SetAttribute(u"name"_s, u"caf\u00e9"_s);

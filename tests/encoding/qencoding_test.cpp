@@ -78,9 +78,8 @@ INSTANTIATE_TEST_SUITE_P(Marks, DetectFormat,
                                            // An empty block leaves the format as it was.
                                            Detection{QByteArray(), KestoEncodingFormat(12345), false, false}));
 
-// Each converter created for a format is the one detection picks for its
-// mark (KSC5601, which shares CP949's mark, decodes as CP949). There is no
-// converter for Unicode, None or an unknown format.
+// Each converter created for a format is the one detection picks for its mark (KSC5601, which shares CP949's mark,
+// decodes as CP949). There is no converter for Unicode, None or an unknown format.
 TEST(CreateEncoder, MarkOfEachFormatSelectsAConverterThatReadsIt)
 {
     const QString text = u"Ab1"_s;
@@ -109,9 +108,8 @@ TEST(CreateEncoder, MarkOfEachFormatSelectsAConverterThatReadsIt)
     FreeEncoder(nullptr);
 }
 
-// Bytes and text that a converter turns into each other. Encoding replaces
-// what the output held; decoding replaces it too in UTF-8 and appends to it
-// in the other converters.
+// Bytes and text that a converter turns into each other. Encoding replaces what the output held; decoding replaces it
+// too in UTF-8 and appends to it in the other converters.
 enum Ways { kDecodes = 1, kEncodes = 2, kBoth = 3 };
 
 struct Conversion

@@ -1,5 +1,4 @@
-// The library's view of the host: platforms, test sets, its own folders,
-// helper programs and device packs.
+// The library's view of the host: platforms, test sets, its own folders, helper programs and device packs.
 
 #include "environment/devicexml.h"
 #include "environment/platforms.h"
@@ -19,8 +18,7 @@ using namespace Qt::StringLiterals;
 
 namespace {
 
-// A private data root, platforms root and test sets root, with none of the
-// user's settings.
+// A private data root, platforms root and test sets root, with none of the user's settings.
 class EnvironmentTest : public ::testing::Test
 {
 protected:
@@ -192,8 +190,7 @@ TEST_F(PlatformsTest, DefaultTestKitIsTheNamedOneExactlyOrTheGreatestName)
         EXPECT_EQ(untouched.type, TestKit::USER_KIT);
     }
 
-    // A test set ending in a separator picks the greatest name, ordinally:
-    // lower-case names sort after upper-case ones.
+    // A test set ending in a separator picks the greatest name, ordinally: lower-case names sort after upper-case ones.
     const QString more = temp.path() + u"/more"_s;
     MakeDirs(more, {"alpha", "Zeta", "beta"});
     env.Set("KESTIX_TESTSETS_ALL", more);
@@ -428,8 +425,7 @@ protected:
         return path;
     }
 
-    // Flattens from another current directory, so that includes can only be
-    // found beside the device pack.
+    // Flattens from another current directory, so that includes can only be found beside the device pack.
     QByteArray Flatten(const QString &source)
     {
         testutil::CurrentDirectory cd(temp.path());

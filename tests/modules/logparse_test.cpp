@@ -22,10 +22,9 @@ using LogFiles = moduletest::ModuleFolder;
 
 } // namespace
 
-// Each kind's own format: CTF pairs results with test names in either order,
-// the applet takes the first word of a test name and drops "_K" from the
-// suite, OAT maps status words and marks cases without one unexecuted, UT
-// reads the result table between its rules and drops the "UT" prefix.
+// Each kind's own format: CTF pairs results with test names in either order, the applet takes the first word of a test
+// name and drops "_K" from the suite, OAT maps status words and marks cases without one unexecuted, UT reads the result
+// table between its rules and drops the "UT" prefix.
 TEST_F(LogFiles, EachKindReadsItsHeaderAndPairsItsVerdicts)
 {
     CtfTestModule ctf;
@@ -127,8 +126,7 @@ TEST_F(LogFiles, BaseParseStopsAtTheFirstRecognisedLogAndSecondaryModulesParseNo
     EXPECT_FALSE(secondary.ParseLog(results));
 }
 
-// Whatever a handset leaves in a log file, the parsers return and keep what
-// they can read.
+// Whatever a handset leaves in a log file, the parsers return and keep what they can read.
 TEST_F(LogFiles, HostileBytesLeaveEveryParserStanding)
 {
     const QByteArray rows[] = {QByteArray(),

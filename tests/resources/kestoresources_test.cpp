@@ -89,9 +89,8 @@ class KestoString : public ::testing::TestWithParam<StringCase>
 {
 };
 
-// A string read back is the string that was stored, in every format: the mark
-// is not decoded as text and the last character is not lost. Text encoded by
-// iconv, not by our converters, reads back too.
+// A string read back is the string that was stored, in every format: the mark is not decoded as text and the last
+// character is not lost. Text encoded by iconv, not by our converters, reads back too.
 TEST_P(KestoString, ReadsBackTheStoredText)
 {
     const StringCase &c = GetParam();

@@ -160,8 +160,7 @@ TEST(SysResource, DecodesEachKindOfRecordInsideItsBlock)
     for (quint16 id = 1; id <= std::size(blocks); ++id)
         resources.AddBinary(0x6000, id, blocks[id - 1]);
 
-    // Each record's properties as "name=value", separated by "|"; a name
-    // alone: the record has no such property.
+    // Each record's properties as "name=value", separated by "|"; a name alone: the record has no such property.
     const std::pair<quint16, const char *> expected[]
         = {{1, "Key=tests|main id=2|Privildedge Index=8|arg len=0|Arguments"},
            {2, "Key=other|Arguments=-v x|main id=2"},

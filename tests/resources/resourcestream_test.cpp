@@ -25,8 +25,7 @@ using resourcebytes::U32s;
 // {type, first ID, additional IDs, offset index}
 using MapEntry = std::array<quint16, 4>;
 
-// A resource file put together by hand: the header's resource count as given,
-// the map entries and the offsets as given.
+// A resource file put together by hand: the header's resource count as given, the map entries and the offsets as given.
 QByteArray Compose(const QVector<MapEntry> &map, const QVector<quint32> &offsets, const QByteArray &data,
                    quint32 resourceCount)
 {
@@ -228,8 +227,7 @@ TEST(ResourceStream, At65535PairsSavesAndOneMoreIsRefused)
     EXPECT_EQ(more, QByteArray("keep"));
 }
 
-// Corrupt input, every prefix of a valid file among it, is refused and
-// leaves the stream as it was.
+// Corrupt input, every prefix of a valid file among it, is refused and leaves the stream as it was.
 TEST(ResourceStream, CorruptInputIsRefusedAndChangesNothing)
 {
     QList<QPair<QString, QByteArray>> inputs

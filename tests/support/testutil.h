@@ -56,20 +56,17 @@ int RunProgram(const QString &program, const QStringList &arguments, QByteArray 
 // True when a program of that name is on PATH.
 bool HaveProgram(const QString &program);
 
-// When the program is installed, runs it and expects exit status 0; its
-// output is shown on failure.
+// When the program is installed, runs it and expects exit status 0; its output is shown on failure.
 void ExpectProgramAccepts(const QString &program, const QStringList &arguments);
 
-// xmllint finds the file well formed (and valid against a schema of
-// tests/data when one is named).
+// xmllint finds the file well formed (and valid against a schema of tests/data when one is named).
 void ExpectXmllintAccepts(const QString &path, const QString &schema = QString());
 
 // The folder of data files committed under tests/data.
 QString DataPath(const QString &relative);
 
-// Points the library's data root and handset folder into root, makes every
-// wait instant and forgets the platforms, kits and tool set the user has, so
-// that a test or benchmark program touches none of the user's folders.
+// Points the library's data root and handset folder into root, makes every wait instant and forgets the platforms, kits
+// and tool set the user has, so that a test or benchmark program touches none of the user's folders.
 void IsolateEnvironment(const QTemporaryDir &root);
 
 } // namespace testutil
