@@ -3,7 +3,6 @@
 #include "support/testutil.h"
 
 #include <QDir>
-#include <QDirIterator>
 #include <QFile>
 #include <QRandomGenerator>
 #include <QSet>
@@ -198,12 +197,8 @@ TEST_P(ForeignArchive, ReadsEveryMemberAsGnuTarExtractsIt)
             EXPECT_EQ(tar.EntryData(entry), ReadFile(extracted.filePath()));
         }
     }
-    QSet<QString> onDisk;
-    QDirIterator it(out, QDir::AllEntries | QDir::NoDotAndDotDot | QDir::Hidden | QDir::System,
-                    QDirIterator::Subdirectories);
-    while (it.hasNext())
-        onDisk.insert(QDir(out).relativeFilePath(it.next()));
-    EXPECT_EQ(listed, onDisk);
+    const QStringList onDisk = testutil::Tree(out);
+    EXPECT_EQ(listed, QSet<QString>(onDisk.begin(), onDisk.end()));
     EXPECT_EQ(listed.contains(u"pkg/sparse"_s), writer.sparse);
 }
 

@@ -115,10 +115,9 @@ TEST_F(InspectTool, EncodeMatchesIconvAfterTheMarkAndDecodeReadsItBack)
         GTEST_SKIP() << "iconv not installed";
     const QString text = u"\u4e2d\u6587 A"_s; // 中文 A
     WriteFile(u"text.txt"_s, text.toUtf8());
-    const std::tuple<const char *, const char *, QByteArray> rows[] = {// format, iconv's name for it, mark
-                                                                       {"S-JIS", "SHIFT_JIS", "\xfd\xfe"},
-                                                                       {"GB2312", "GB2312", "\xfc\xfe"},
-                                                                       {"UTF-8", "UTF-8", "\x02"}};
+    // Format, iconv's name for it, mark.
+    const std::tuple<const char *, const char *, QByteArray> rows[]
+        = {{"S-JIS", "SHIFT_JIS", "\xfd\xfe"}, {"GB2312", "GB2312", "\xfc\xfe"}, {"UTF-8", "UTF-8", "\x02"}};
     for (const auto &[format, iconvName, mark] : rows) {
         SCOPED_TRACE(format);
         QByteArray expected;

@@ -27,9 +27,9 @@ QDomDocument Parse(const QString &text)
 // one blank per level, and only the nodes the document holds (a declaration, no document type).
 TEST(XmlWriter, WritesParsedDocumentsInOneOrderAndIndentation)
 {
+    // As read, as written.
     const std::pair<QString, QString> rows[]
-        = {// as read, as written
-           {u"<manifest><module zeta='ZETA' name='NAME' alpha='ALPHA' type='TYPE' id='ID' b='B'>"
+        = {{u"<manifest><module zeta='ZETA' name='NAME' alpha='ALPHA' type='TYPE' id='ID' b='B'>"
             "<testcase>Run &amp; &lt;check></testcase></module></manifest>"_s,
             u"<manifest>\n"
             " <module alpha=\"ALPHA\" b=\"B\" id=\"ID\" name=\"NAME\" type=\"TYPE\" zeta=\"ZETA\">\n"

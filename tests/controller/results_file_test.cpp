@@ -9,8 +9,8 @@ namespace {
 
 TEST(ResultPrecedence, KeepsTheStrongerVerdict)
 {
-    const char *rows[][3] = {// stored, reported, kept
-                             {"", "unexecuted", "unexecuted"},
+    // Stored, reported, kept.
+    const char *rows[][3] = {{"", "unexecuted", "unexecuted"},
                              {"pass", "fail", "pass"},
                              {"fail", "pass", "pass"},
                              {"fail", "unsupported", "unsupported"},

@@ -90,9 +90,9 @@ TEST_F(FeatureListTest, FilterSelectionAppendsKitThenPlatformAndAPlatformOnlySel
 
 TEST_F(FeatureListTest, BadFeatureFilesSelectNothingAndSayWhy)
 {
+    // Content (null: no file at all), the message as a pattern where %1 is the file's path.
     const char *rows[][2]
-        = {// content (null: no file at all), the message as a pattern where %1 is the file's path
-           {nullptr, "BFS File %1 not found\\."},
+        = {{nullptr, "BFS File %1 not found\\."},
            {"<features><feature testModule=\"Foo\">", "Error Parsing BFS File %1, Error:.+ Line:1 Column:\\d+"},
            {"<features>\n<feature testModule=\"Foo\">\n</x>", "Error Parsing BFS File %1, Error:.+ Line:3 Column:\\d+"},
            {"<features><module name=\"Foo\"/></features>", "No testcases in BFS File %1\\."}};

@@ -10,7 +10,6 @@
 #include "support/testutil.h"
 
 #include <QDir>
-#include <QDirIterator>
 #include <QFile>
 #include <QFileInfo>
 
@@ -28,21 +27,10 @@ namespace {
 
 using testutil::HandsetFixture;
 using testutil::ModuleSpec;
+using testutil::Tree;
 
 constexpr unsigned int kClass = 0x01020304;
 constexpr unsigned int kApplet = 0x0103abcd;
-
-// Every file and folder below a folder, relative, sorted.
-QStringList Tree(const QString &folder)
-{
-    QStringList entries;
-    QDirIterator it(folder, QDir::AllEntries | QDir::NoDotAndDotDot | QDir::Hidden | QDir::System,
-                    QDirIterator::Subdirectories);
-    while (it.hasNext())
-        entries.append(QDir(folder).relativeFilePath(it.next()));
-    entries.sort();
-    return entries;
-}
 
 QStringList FileNames(const QSharedPointer<_DirectoryInfo> &info)
 {

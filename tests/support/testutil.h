@@ -48,6 +48,9 @@ private:
 void WriteFile(const QString &path, const QByteArray &bytes);
 QByteArray ReadFile(const QString &path);
 
+// Every file and folder below a folder, relative, sorted.
+QStringList Tree(const QString &folder);
+
 // Runs a program to completion; returns its exit code (-1 when it could not
 // start). Standard output and error go to output when given.
 int RunProgram(const QString &program, const QStringList &arguments, QByteArray *output = nullptr,
