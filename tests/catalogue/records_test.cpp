@@ -45,8 +45,6 @@ QSharedPointer<_CompilerVariant> Variant(const QString &name, IKestoDevice::Plat
     return variant;
 }
 
-} // namespace
-
 TEST(CompilerVariant, ReadsFilesListInAnyCaseAndSkipsEntriesWithoutPathOrName)
 {
     QDomDocument document;
@@ -173,8 +171,6 @@ TEST(Framework, LoadsAndUnloadsThroughTheHandset)
     framework.Unload(&device, env);
 }
 
-namespace {
-
 // The smallest concrete module: the catalogue side only.
 class RecordModule : public _TestModule
 {
@@ -206,8 +202,6 @@ protected:
     QTemporaryDir dir;
     RecordModule module;
 };
-
-} // namespace
 
 TEST_F(ModuleXml, ReadsUpperCaseAttributesBeforeLowerCaseOnesAndOatModuleElements)
 {
@@ -341,3 +335,5 @@ TEST(TestModuleRecord, GetCompilerVariantPrefersTheBuildAskedFor)
     EXPECT_EQ(module.GetCompilerVariant(IKestoDevice::PLATFORM_WIN32, false)->name, u"d"_s);
     EXPECT_TRUE(module.GetCompilerVariant(IKestoDevice::PLATFORM_UNKNOWN, false).isNull());
 }
+
+} // namespace

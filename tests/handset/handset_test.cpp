@@ -283,8 +283,7 @@ using PackageTest = EmulatedHandsetTest;
 
 TEST_F(PackageTest, InstalledModuleIsFoundByClassAndAppletAndByItsClassDirectory)
 {
-    const QString package = fixture.MakePackage(u"ctfmod.kestix"_s, layout);
-    ASSERT_EQ(device->InstallPackage(package), 0u);
+    ASSERT_EQ(device->InstallPackage(fixture.MakePackage(u"ctfmod.kestix"_s, layout)), 0u);
     EXPECT_EQ(testutil::ReadFile(Host("fs:/usermods/ctfmod/data/table.txt")), QByteArray("rows"));
 
     QString directory;

@@ -30,8 +30,6 @@ SysResource Program(const QByteArray &name)
     return program;
 }
 
-} // namespace
-
 TEST(OatNames, DerivesHandsetNamesFromTheModuleName)
 {
     // Module name, information file name; handset folder, information file, log base.
@@ -49,8 +47,6 @@ TEST(OatNames, DerivesHandsetNamesFromTheModuleName)
         EXPECT_EQ(module.LogBasePath(), QLatin1String(row[4]));
     }
 }
-
-namespace {
 
 class OatRun : public moduletest::ModuleFolder
 {
@@ -80,8 +76,6 @@ protected:
     NiceMock<MockDevice> device;
     QMap<QString, QString> env;
 };
-
-} // namespace
 
 TEST_F(OatRun, ArgumentsNameTheModeTheProgramAndTheCases)
 {
@@ -161,8 +155,6 @@ TEST_F(OatRun, FrameworkIsLoadedUsesTheFixedClassIdAndUnloadRemovesEveryOatFolde
     framework.Unload(&device, env);
 }
 
-namespace {
-
 class OatPostProcess : public moduletest::ModuleFolder
 {
 protected:
@@ -192,8 +184,6 @@ protected:
     OatTestModule module;
     QMap<QString, QString> env;
 };
-
-} // namespace
 
 TEST_F(OatPostProcess, RunsTheScriptAndCollectsItsOutput)
 {
@@ -254,3 +244,5 @@ TEST_F(OatPostProcess, WithoutScriptOrPerlOnlyStamps)
     module.PostProcess(env);
     EXPECT_TRUE(LogText().contains(u" Post Processing Failed.  A Perl Instance can not be found."_s));
 }
+
+} // namespace
