@@ -64,15 +64,6 @@ protected:
         return manifest;
     }
 
-    // The names of the modules in key order.
-    static QStringList Names(const QList<QSharedPointer<_TestModule>> &modules)
-    {
-        QStringList names;
-        for (const auto &module : modules)
-            names.append(module->moduleName);
-        return names;
-    }
-
     // A cache file of the manifest's kit holding text.
     void WriteCache(const Manifest &manifest, const QByteArray &text) { testutil::WriteFile(manifest.cacheFile, text); }
 
@@ -293,7 +284,7 @@ TEST_F(ManifestScanTest, SecondaryModulesAreMovedInOnlyWhenNoModuleTakesTheirNam
     // Never offered for selection, whatever the pattern.
     QList<QSharedPointer<_TestModule>> selected;
     EXPECT_EQ(manifest.GetTestModules(selected, {}, QString(), QString()), 1u);
-    EXPECT_EQ(Names(selected), QStringList{"Foo"});
+    EXPECT_EQ(testutil::ModuleNames(selected), QStringList{"Foo"});
     selected.clear();
     EXPECT_EQ(manifest.GetTestModules(selected, {u"*e*"_s, u"oatbar"_s}, QString(), QString()), 0u);
 }
@@ -595,7 +586,7 @@ protected:
         QList<QSharedPointer<_TestModule>> out;
         const unsigned int count = manifest->GetTestModules(out, names, family, subFamily);
         EXPECT_EQ(count, static_cast<unsigned int>(out.size()));
-        return Names(out);
+        return testutil::ModuleNames(out);
     }
 
     std::unique_ptr<Manifest> manifest;

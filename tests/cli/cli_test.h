@@ -14,8 +14,7 @@
 struct ToolResult
 {
     int status = -1;
-    QByteArray out;
-    QByteArray err;
+    QByteArray out, err;
 };
 
 // The tool's program file.

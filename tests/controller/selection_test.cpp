@@ -8,14 +8,7 @@
 namespace {
 
 using Modules = QList<QSharedPointer<_TestModule>>;
-
-QStringList Names(const Modules &modules)
-{
-    QStringList names;
-    for (const QSharedPointer<_TestModule> &module : modules)
-        names.append(module->moduleName);
-    return names;
-}
+using testutil::ModuleNames;
 
 class FeatureListTest : public CatalogueHarnessTest
 {
@@ -44,8 +37,7 @@ TEST_F(FeatureListTest, FeaturesSelectTheirModulesAndUnknownNamesAreWarnedOneByO
     const struct
     {
         QByteArray xml;
-        QStringList selected;
-        QStringList warned;
+        QStringList selected, warned;
     } rows[] = {{"<features><feature testModule=\"Bar\"/><feature name=\"no module\"/></features>", {u"Bar"_s}, {}},
                 // Any letter case, any depth.
                 {"<root><group><sub><feature testModule=\"foo\"/></sub></group><Feature testModule=\"SHELL\"/></root>",
@@ -62,7 +54,7 @@ TEST_F(FeatureListTest, FeaturesSelectTheirModulesAndUnknownNamesAreWarnedOneByO
         const qsizetype logged = m_log.Text().size();
         Modules modules{QSharedPointer<_TestModule>(new ScriptedModule(u"stale"_s))};
         EXPECT_EQ(m_harness.GetTestModules(modules, Features(row.xml)), uint(row.selected.size()));
-        EXPECT_EQ(Names(modules), row.selected);
+        EXPECT_EQ(ModuleNames(modules), row.selected);
         QString expected;
         for (const QString &name : row.warned)
             expected += u"   Warning: Testmodule \"%1\" not found in test manifests."_s.arg(name);
@@ -74,18 +66,18 @@ TEST_F(FeatureListTest, FilterSelectionAppendsKitThenPlatformAndAPlatformOnlySel
 {
     Modules kept{QSharedPointer<_TestModule>(new ScriptedModule(u"kept"_s))};
     EXPECT_EQ(m_harness.GetTestModules(kept, QStringList{u"foo*"_s}, QString(), QString()), 3u);
-    EXPECT_EQ(Names(kept), (QStringList{u"kept"_s, u"Foo"_s, u"FooPlus"_s}));
+    EXPECT_EQ(ModuleNames(kept), (QStringList{u"kept"_s, u"Foo"_s, u"FooPlus"_s}));
 
     HarnessTestAccess::SetKitNotSelected(m_harness, true);
     const QString path = Features("<f><feature testModule=\"Foo\"/><feature testModule=\"FooPlus\"/></f>");
     Modules modules;
     EXPECT_EQ(m_harness.GetTestModules(modules, path), 1u);
-    EXPECT_EQ(Names(modules), QStringList{u"FooPlus"_s});
+    EXPECT_EQ(ModuleNames(modules), QStringList{u"FooPlus"_s});
     EXPECT_TRUE(m_log.Text().contains(u"   Warning: Testmodule \"Foo\" not found in test manifests."_s));
 
     Modules filtered;
     EXPECT_EQ(m_harness.GetTestModules(filtered, QStringList{u"*"_s}, QString(), QString()), 2u);
-    EXPECT_EQ(Names(filtered), (QStringList{u"FooPlus"_s, u"Shell"_s}));
+    EXPECT_EQ(ModuleNames(filtered), (QStringList{u"FooPlus"_s, u"Shell"_s}));
 }
 
 TEST_F(FeatureListTest, BadFeatureFilesSelectNothingAndSayWhy)
@@ -153,7 +145,7 @@ TEST_F(CatalogueSetupTest, StaleKitCacheIsRegeneratedAndTheDefaultDevicePackTake
     ChooseBoth(m_harness);
     Modules modules;
     EXPECT_EQ(m_harness.GetTestModules(modules, QStringList(), QString(), QString()), 2u);
-    EXPECT_EQ(Names(modules), (QStringList{u"Audio"_s, u"Shell"_s}));
+    EXPECT_EQ(ModuleNames(modules), (QStringList{u"Audio"_s, u"Shell"_s}));
 
     const QString log = m_log.Text();
     const int outOfDate = log.indexOf(u"Manifest out of date for "_s + KitPath());

@@ -186,8 +186,7 @@ ModuleTimings::Run At(qint64 ms, const QString &host, int minute)
 TEST(ModuleTimingsTest, RecordsMergesAndKeepsTheRecentRunsAndRefusesBadOrForeignFiles)
 {
     QTemporaryDir dir;
-    const QString a = dir.filePath(u"a.json"_s);
-    const QString b = dir.filePath(u"b.json"_s);
+    const QString a = dir.filePath(u"a.json"_s), b = dir.filePath(u"b.json"_s);
     QString error;
     for (int i = 0; i < 12; ++i) // 100, 200, ... 1200 ms on host a
         ASSERT_TRUE(ModuleTimings::Record(a, u"Audio"_s, u"KVK"_s, At(100 * (i + 1), u"a"_s, i), &error))

@@ -39,8 +39,7 @@ struct Detection
 {
     QByteArray data;
     KestoEncodingFormat format;
-    bool result;
-    bool hasEncoder;
+    bool result, hasEncoder;
 };
 
 class DetectFormat : public ::testing::TestWithParam<Detection>

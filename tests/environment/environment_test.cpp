@@ -40,9 +40,7 @@ protected:
     }
 
     QTemporaryDir temp;
-    QString base;
-    QString root;
-    QString kits;
+    QString base, root, kits;
     testutil::EnvGuard env;
 };
 using PlatformsTest = EnvironmentTest;
@@ -343,9 +341,7 @@ TEST_F(TestDirectoriesTest, GenerateProPlatformMatchesNameThenDefault)
 
 TEST_F(TestDirectoriesTest, ResolveXmlPathSearchOrder)
 {
-    const QString work = temp.path() + u"/work"_s;
-    const QString home = temp.path() + u"/home"_s;
-    const QString pack = temp.path() + u"/pack"_s;
+    const QString work = temp.path() + u"/work"_s, home = temp.path() + u"/home"_s, pack = temp.path() + u"/pack"_s;
     for (const QString &file : {work + u"/here.xml"_s, home + u"/athome.xml"_s, pack + u"/device.xml"_s,
                                 pack + u"/beside.xml"_s, pack + u"/sub/deep.xml"_s, pack + u"/flat.xml"_s})
         testutil::WriteFile(file, "<a/>");
@@ -436,8 +432,7 @@ protected:
     // xmllint's verdict on the flattened file, when it is installed.
     void ExpectWellFormed() { testutil::ExpectXmllintAccepts(output); }
 
-    QString pack;
-    QString output;
+    QString pack, output;
 };
 
 TEST_F(FlattenDeviceXmlTest, ExpandsIncludesAndMergesSections)
@@ -532,8 +527,7 @@ TEST_F(FlattenDeviceXmlTest, PacksInOtherEncodingsAreExpandedToo)
 
 TEST_F(FlattenDeviceXmlTest, FailsWithoutWritingOnBadSourceOrDestinationAndReadsRelativeSources)
 {
-    const QString good = Write(u"good.xml"_s, "<pack/>");
-    const QString bad = Write(u"bad.xml"_s, "<pack><open></pack>");
+    const QString good = Write(u"good.xml"_s, "<pack/>"), bad = Write(u"bad.xml"_s, "<pack><open></pack>");
     EXPECT_FALSE(FlattenDeviceXml(pack + u"/missing.xml"_s, output));
     EXPECT_FALSE(FlattenDeviceXml(u"missing-relative.xml"_s, output));
     EXPECT_FALSE(FlattenDeviceXml(bad, output));

@@ -65,8 +65,7 @@ protected:
 
     HandsetFixture fixture;
     Log log;
-    QString folder;
-    QString outside;
+    QString folder, outside;
     HandsetFixture::Device device;
     ModuleSpec layout;
 };

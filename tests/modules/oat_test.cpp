@@ -178,9 +178,7 @@ protected:
                {u"DSOCacheFilePath"_s, u"/cache/dp.dso"_s},
                {u"Platform"_s, u"/sdk/pvs/platform"_s}};
     }
-    QString perlCache;
-    QString logs;
-    QString raw;
+    QString perlCache, logs, raw;
     OatTestModule module;
     QMap<QString, QString> env;
 };

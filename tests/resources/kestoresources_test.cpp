@@ -46,8 +46,7 @@ TEST(KestoResources, StoresStringsWithTheirMark)
     using Getter = QString (KestoResources::*)();
     const struct
     {
-        quint16 id;
-        quint16 format;
+        quint16 id, format;
         QString text;
         const char *block;
         Getter getter;

@@ -51,6 +51,15 @@ QByteArray ReadFile(const QString &path);
 // Every file and folder below a folder, relative, sorted.
 QStringList Tree(const QString &folder);
 
+// The moduleName of each module of a list, in its order.
+template <typename Modules> QStringList ModuleNames(const Modules &modules)
+{
+    QStringList names;
+    for (const auto &module : modules)
+        names.append(module->moduleName);
+    return names;
+}
+
 // Runs a program to completion; returns its exit code (-1 when it could not
 // start). Standard output and error go to output when given.
 int RunProgram(const QString &program, const QStringList &arguments, QByteArray *output = nullptr,
