@@ -3,7 +3,6 @@
 #include "support/testutil.h"
 
 #include <QDir>
-#include <QDirIterator>
 #include <QFile>
 #include <QRandomGenerator>
 #include <QSet>
@@ -51,8 +50,7 @@ QStringList Names(const Tar &tar)
     return names;
 }
 
-// A header block with a valid checksum (summed over signed bytes when asked).
-// size is the raw 12-byte size field.
+// A header block with a valid checksum (summed over signed bytes when asked). size is the raw 12-byte size field.
 QByteArray Header(const QByteArray &name, const QByteArray &size, char type = '0', const QByteArray &link = {},
                   bool signedSum = false)
 {
@@ -199,12 +197,8 @@ TEST_P(ForeignArchive, ReadsEveryMemberAsGnuTarExtractsIt)
             EXPECT_EQ(tar.EntryData(entry), ReadFile(extracted.filePath()));
         }
     }
-    QSet<QString> onDisk;
-    QDirIterator it(out, QDir::AllEntries | QDir::NoDotAndDotDot | QDir::Hidden | QDir::System,
-                    QDirIterator::Subdirectories);
-    while (it.hasNext())
-        onDisk.insert(QDir(out).relativeFilePath(it.next()));
-    EXPECT_EQ(listed, onDisk);
+    const QStringList onDisk = testutil::Tree(out);
+    EXPECT_EQ(listed, QSet<QString>(onDisk.begin(), onDisk.end()));
     EXPECT_EQ(listed.contains(u"pkg/sparse"_s), writer.sparse);
 }
 
@@ -291,8 +285,7 @@ const Crafted kCrafted[] = {
         "unexpected end of archive at offset 1124"),
     Row("RandomBytes", RandomBytes(5000, 17), {}, {}, kNotATar),
     Row("TextFile", QByteArray("Package archives are tar files.\n").repeated(40), {}, {}, kNotATar),
-    Row("ShortTextFile", "not an archive\n", {}, {}, kNotATar),
-    Row("EmptyFile", {}),
+    Row("ShortTextFile", "not an archive\n", {}, {}, kNotATar), Row("EmptyFile", {}),
     Row("NothingAfterTheEndBlocksIsListed", Member("a", "x") + kEnd + Member("late", "y") + kEnd, {"a"}, "x"),
     Row("DanglingLongNameNeverNamesTheEndBlocks", Member("././@LongLink", QByteArray("evil\0", 5), 'L') + kEnd),
     Row("VendorRecordsAreNotMembers",
@@ -317,8 +310,7 @@ const Crafted kCrafted[] = {
     Row("PaxRecordLongerThanItsHeader", Member("x", "99 path=a\n", 'x') + Member("a", "x") + kEnd, {}, {},
         "malformed extended header at offset 0"),
     Row("OversizedPaxHeader", Header("x", Octal(8 << 20), 'x') + kEnd, {}, {}, "extended header too large at offset 0"),
-    Row("NameThatIsNotUtf8", Member("caf\xe9.mif", "x") + kEnd, {"caf\\351.mif"}, "x"),
-};
+    Row("NameThatIsNotUtf8", Member("caf\xe9.mif", "x") + kEnd, {"caf\\351.mif"}, "x")};
 
 class CraftedArchive : public TarTest, public ::testing::WithParamInterface<Crafted>
 {

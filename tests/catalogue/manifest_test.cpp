@@ -1,5 +1,4 @@
-// Building a catalogue by scanning kits made at test time, the cached
-// catalogue file and the queries on a catalogue.
+// Building a catalogue by scanning kits made at test time, the cached catalogue file and the queries on a catalogue.
 
 #include "catalogue/framework.h"
 #include "catalogue/manifest.h"
@@ -63,15 +62,6 @@ protected:
         manifest.SetLogger(&logger);
         EXPECT_TRUE(manifest.GenerateManifest(true));
         return manifest;
-    }
-
-    // The names of the modules in key order.
-    static QStringList Names(const QList<QSharedPointer<_TestModule>> &modules)
-    {
-        QStringList names;
-        for (const auto &module : modules)
-            names.append(module->moduleName);
-        return names;
     }
 
     // A cache file of the manifest's kit holding text.
@@ -154,11 +144,9 @@ TEST_F(ManifestScanTest, PlatformManifestWalksTestframeworksLikeAnyFolder)
     EXPECT_EQ(module->source + u' ' + module->family + u'/' + module->subFamily, u"PVS testframeworks/ctf"_s);
 }
 
-// Families come from the description or else from the path; broken
-// descriptions are skipped; the first
-// description of a name wins and later ones add their package targets; source
-// modules get targets and prebuilt ones do not; oat modules find their
-// baseline file.
+// Families come from the description or else from the path; broken descriptions are skipped; the first description of a
+// name wins and later ones add their package targets; source modules get targets and prebuilt ones do not; oat modules
+// find their baseline file.
 TEST_F(ManifestScanTest, ModulesTakeTheirRecordsFromDescriptionPathAndPackages)
 {
     kit->AddSourceModule(u"tests/multimedia/audio"_s, MakeModule(u"ctf"_s, u"Audio"_s));
@@ -246,12 +234,10 @@ TEST_F(ManifestScanTest, ModulesTakeTheirRecordsFromDescriptionPathAndPackages)
 TEST_F(ManifestScanTest, LastClassifyingEntryDecidesBetweenSourceAndPrebuilt)
 {
     // The entry, whether it is a folder, whether the module counts as source.
-    const std::tuple<const char *, bool, bool> rows[] = {
-        {"src", true, true}, // "src" after "m.MOD"
-        {"a.c", false, false}, // before it
-        {"Include", true, false}, // "include" < "m.mod"
-        {"z_inc", true, true},
-    };
+    const std::tuple<const char *, bool, bool> rows[] = {{"src", true, true}, // "src" after "m.MOD"
+                                                         {"a.c", false, false}, // before it
+                                                         {"Include", true, false}, // "include" < "m.mod"
+                                                         {"z_inc", true, true}};
     for (int i = 0; i < 4; ++i) {
         const auto &[entry, isDirectory, source] = rows[i];
         const QString folder = u"tests/m/mixed%1"_s.arg(i);
@@ -298,7 +284,7 @@ TEST_F(ManifestScanTest, SecondaryModulesAreMovedInOnlyWhenNoModuleTakesTheirNam
     // Never offered for selection, whatever the pattern.
     QList<QSharedPointer<_TestModule>> selected;
     EXPECT_EQ(manifest.GetTestModules(selected, {}, QString(), QString()), 1u);
-    EXPECT_EQ(Names(selected), QStringList{"Foo"});
+    EXPECT_EQ(testutil::ModuleNames(selected), QStringList{"Foo"});
     selected.clear();
     EXPECT_EQ(manifest.GetTestModules(selected, {u"*e*"_s, u"oatbar"_s}, QString(), QString()), 0u);
 }
@@ -319,8 +305,7 @@ TEST_F(ManifestScanTest, ModuleInformationComesFromTheFirstMatchingMemberThatLoa
                     {{u"Other/Other.mif"_s, testutil::BuildMif(other)},
                      {u"Mif/MIF.MIF.bak"_s, QByteArray("not a resource file")},
                      {u"Mif/Mif.mif"_s, testutil::BuildMif(module.package)}});
-    // A package that is not an archive, and one cut short, are refused with
-    // their reason: neither becomes a target.
+    // A package that is not an archive, and one cut short, are refused with their reason: neither becomes a target.
     kit->AddFile(u"tests/mif/package/Mif_armgcc_Release.kestix"_s, QByteArray(700, 'x'));
     kit->AddFile(u"tests/mif/package/Mif_Win32_Release.kestix"_s,
                  testutil::ReadFile(kit->Path(u"tests/mif/package/Mif_Win32_Debug.kestix"_s)).left(1500));
@@ -358,12 +343,10 @@ TEST_F(ManifestScanTest, ASymbolicLinkLoopIsWalkedOnce)
 
 TEST(ManifestLogKind, ModuleKindFollowsTheLogName)
 {
-    const std::pair<const char *, const char *> rows[] = {
-        {"Run-CTF-1.LOG", "ctf"}, {"/logs/Timer-ctf-2026.log", "ctf"},
-        {"run.log", "ctfapplet"}, {"result.TXT", "uitf"},
-        {"/a/b.xml", "uitf"},     {"module.oat", "oat"},
-        {"x.bin", nullptr},       {"noextension", nullptr},
-    };
+    const std::pair<const char *, const char *> rows[] = {{"Run-CTF-1.LOG", "ctf"}, {"/logs/Timer-ctf-2026.log", "ctf"},
+                                                          {"run.log", "ctfapplet"}, {"result.TXT", "uitf"},
+                                                          {"/a/b.xml", "uitf"},     {"module.oat", "oat"},
+                                                          {"x.bin", nullptr},       {"noextension", nullptr}};
     for (const auto &[path, type] : rows) {
         const auto module = Manifest::CreateTestModuleFromLog(QString::fromLatin1(path));
         EXPECT_EQ(module ? module->TestType() : QString(), QString::fromLatin1(type)) << path;
@@ -390,17 +373,15 @@ TEST_F(ManifestCacheTest, OnlyAFormatOfFiveOrLaterIsCurrent)
     Manifest manifest(kit->Root(), false);
     EXPECT_FALSE(manifest.IsVersionOkay()) << "no cache";
     EXPECT_FALSE(manifest.ReadManifest());
-    const std::pair<const char *, bool> rows[] = {
-        {"<testkit version='5'/>", true},
-        {"<TestKit version='7' path='/elsewhere'/>", true},
-        {"<testkit version='4'/>", false},
-        {"<testkit/>", false},
-        {"<testkit version='-7'/>", false},
-        {"<testkit version='99999999999'/>", false},
-        {"<manifest version='5'/>", false},
-        {"<testkit version='5'>", false},
-        {"", false},
-    };
+    const std::pair<const char *, bool> rows[] = {{"<testkit version='5'/>", true},
+                                                  {"<TestKit version='7' path='/elsewhere'/>", true},
+                                                  {"<testkit version='4'/>", false},
+                                                  {"<testkit/>", false},
+                                                  {"<testkit version='-7'/>", false},
+                                                  {"<testkit version='99999999999'/>", false},
+                                                  {"<manifest version='5'/>", false},
+                                                  {"<testkit version='5'>", false},
+                                                  {"", false}};
     for (const auto &[text, current] : rows) {
         WriteCache(manifest, text);
         EXPECT_EQ(manifest.IsVersionOkay(), current) << text;
@@ -468,8 +449,7 @@ TEST_F(ManifestCacheTest, ReadingKeepsKnownKindsAndNamedFrameworksOnlyAndReplace
     EXPECT_EQ(manifest.frameworks.keys(), (QStringList{"OAT", "ctf", "oat"}));
 }
 
-// A kit with a module of every kind, records in their packages, and
-// frameworks of both origins.
+// A kit with a module of every kind, records in their packages, and frameworks of both origins.
 TEST_F(ManifestCacheTest, WrittenCatalogueIsWellFormedAndReadsBackTheSame)
 {
     Module ctf = MakeModule(u"ctf"_s, u"Timer"_s);
@@ -513,8 +493,7 @@ TEST_F(ManifestCacheTest, WrittenCatalogueIsWellFormedAndReadsBackTheSame)
     EXPECT_EQ(root.lastChildElement().tagName(), u"frameworks"_s);
     EXPECT_EQ(root.firstChildElement().childNodes().size(), 6);
     testutil::ExpectXmllintAccepts(scanned.cacheFile);
-    // The tool scans in a process of its own, with its own hash seed: the
-    // catalogue it writes must hold the same bytes.
+    // The tool scans in a process of its own, with its own hash seed: the catalogue it writes must hold the same bytes.
     QByteArray output;
     ASSERT_EQ(testutil::RunProgram(u"" HARNESS_BINARY_DIR "/harness"_s,
                                    {u"manifest"_s, u"--kit"_s, kit->Root(), u"-o"_s, TempPath(u"tool"_s)}, &output),
@@ -525,8 +504,7 @@ TEST_F(ManifestCacheTest, WrittenCatalogueIsWellFormedAndReadsBackTheSame)
     Manifest read(kit->Root(), false);
     ASSERT_TRUE(read.IsVersionOkay());
     ASSERT_TRUE(read.ReadManifest());
-    // What the scan found is really there; the kinds and hashes come back as
-    // the byte comparison below shows.
+    // What the scan found is really there; the kinds and hashes come back as the byte comparison below shows.
     ASSERT_EQ(read.testModules.size(), scanned.testModules.size());
     const auto timer = read.FindTestModule(u"TIMER"_s).dynamicCast<CtfTestModule>();
     ASSERT_TRUE(timer);
@@ -544,9 +522,8 @@ TEST_F(ManifestCacheTest, WrittenCatalogueIsWellFormedAndReadsBackTheSame)
     EXPECT_EQ(frameworks[0]->name, u"ctf"_s);
     EXPECT_TRUE(frameworks[1].dynamicCast<_OatFramework>());
 
-    // Everything, including the kinds' own elements, survives: the read
-    // catalogue writes the same bytes, except for the empty "data" marks of
-    // program records, whose bytes the manifest never holds.
+    // Everything, including the kinds' own elements, survives: the read catalogue writes the same bytes, except for the
+    // empty "data" marks of program records, whose bytes the manifest never holds.
     const QString again = TempPath(u"again.xml"_s);
     ASSERT_TRUE(read.WriteManifest(again));
     QByteArray expected = bytes;
@@ -566,8 +543,7 @@ TEST_F(ManifestCacheTest, EmptyCatalogueIsNeverWrittenNorOneToAnUnwritablePlace)
     EXPECT_FALSE(manifest.WriteManifest(TempPath(u"empty.xml"_s)));
     EXPECT_FALSE(QFile::exists(TempPath(u"empty.xml"_s)));
 
-    // Writing recreates a missing cache folder, but an unwritable
-    // destination answers false with a message.
+    // Writing recreates a missing cache folder, but an unwritable destination answers false with a message.
     kit->AddSourceModule(u"tests/a"_s, MakeModule(u"ctf"_s, u"A"_s));
     ASSERT_TRUE(QDir(manifest.cacheDirectory).removeRecursively());
     ASSERT_TRUE(manifest.GenerateManifest(true));
@@ -610,7 +586,7 @@ protected:
         QList<QSharedPointer<_TestModule>> out;
         const unsigned int count = manifest->GetTestModules(out, names, family, subFamily);
         EXPECT_EQ(count, static_cast<unsigned int>(out.size()));
-        return Names(out);
+        return testutil::ModuleNames(out);
     }
 
     std::unique_ptr<Manifest> manifest;
@@ -623,8 +599,7 @@ TEST_F(ManifestQueryTest, NamePatternsUseLeadingAndTrailingWildCards)
     EXPECT_EQ(Select({u"*NET*"_s}), (QStringList{"EtherNet", "Net", "NetWork", "SubNetTool"}));
     EXPECT_EQ(Select({u"net"_s}), QStringList{"Net"});
     EXPECT_EQ(Select({u"nothing"_s}), QStringList{});
-    // Each module is taken once, on the first pattern that fits; the family
-    // filters do not apply to names.
+    // Each module is taken once, on the first pattern that fits; the family filters do not apply to names.
     EXPECT_EQ(Select({u"*net"_s, u"net*"_s, u"audio"_s}, u"none"_s),
               (QStringList{"Audio", "EtherNet", "Net", "NetWork"}));
     EXPECT_EQ(Select({u"*"_s}).size(), 5);

@@ -1,5 +1,4 @@
-// The catalogue's records: compiler variants, frameworks, test cases and the
-// modules' own entries.
+// The catalogue's records: compiler variants, frameworks, test cases and the modules' own entries.
 
 #include "catalogue/compilervariant.h"
 #include "catalogue/framework.h"
@@ -45,8 +44,6 @@ QSharedPointer<_CompilerVariant> Variant(const QString &name, IKestoDevice::Plat
     variant->build = build;
     return variant;
 }
-
-} // namespace
 
 TEST(CompilerVariant, ReadsFilesListInAnyCaseAndSkipsEntriesWithoutPathOrName)
 {
@@ -137,9 +134,8 @@ TEST(Framework, WritesClassIdInDecimalAndPaddedHexAndGivesTheFirstVariantByNameF
     EXPECT_EQ(element.firstChildElement().attribute(u"name"_s), u"0"_s);
 }
 
-// IsLoaded asks the module, then the class directory; Load hands the package
-// path over unchanged, even when empty; Unload falls back to the directory
-// named after the framework.
+// IsLoaded asks the module, then the class directory; Load hands the package path over unchanged, even when empty;
+// Unload falls back to the directory named after the framework.
 TEST(Framework, LoadsAndUnloadsThroughTheHandset)
 {
     MockDevice device;
@@ -175,8 +171,6 @@ TEST(Framework, LoadsAndUnloadsThroughTheHandset)
     framework.Unload(&device, env);
 }
 
-namespace {
-
 // The smallest concrete module: the catalogue side only.
 class RecordModule : public _TestModule
 {
@@ -208,8 +202,6 @@ protected:
     QTemporaryDir dir;
     RecordModule module;
 };
-
-} // namespace
 
 TEST_F(ModuleXml, ReadsUpperCaseAttributesBeforeLowerCaseOnesAndOatModuleElements)
 {
@@ -299,8 +291,7 @@ TEST(TestModuleRecord, ManifestEntryRoundTrips)
     EXPECT_EQ(written.attribute(u"flagshex"_s), u"0x001f"_s);
     EXPECT_EQ(element.firstChildElement(u"secondary_modules"_s).childNodes().size(), 1);
 
-    // Whole catalogues read back the same (manifest_test); here the fields a
-    // scanned kit leaves at their defaults.
+    // Whole catalogues read back the same (manifest_test); here the fields a scanned kit leaves at their defaults.
     RecordModule back;
     ASSERT_TRUE(back.ReadFromManifest(element));
     EXPECT_EQ(back.IDHash(), module.IDHash());
@@ -344,3 +335,5 @@ TEST(TestModuleRecord, GetCompilerVariantPrefersTheBuildAskedFor)
     EXPECT_EQ(module.GetCompilerVariant(IKestoDevice::PLATFORM_WIN32, false)->name, u"d"_s);
     EXPECT_TRUE(module.GetCompilerVariant(IKestoDevice::PLATFORM_UNKNOWN, false).isNull());
 }
+
+} // namespace

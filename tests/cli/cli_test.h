@@ -14,8 +14,7 @@
 struct ToolResult
 {
     int status = -1;
-    QByteArray out;
-    QByteArray err;
+    QByteArray out, err;
 };
 
 // The tool's program file.
@@ -41,8 +40,7 @@ template <typename... Parts> ToolResult Tool(const Parts &...parts)
     return RunTool(Args(parts...));
 }
 
-// Module name -> "[handset ]passed failed unsupported unexecuted" of each row
-// of a summary table.
+// Module name -> "[handset ]passed failed unsupported unexecuted" of each row of a summary table.
 QMap<QString, QString> Rows(const QByteArray &out);
 
 // The file as a document; fails the test when it does not parse.
@@ -51,8 +49,7 @@ QDomDocument ReadXml(const QString &path);
 // The standard output of a run; fails the test unless it exited with status 0.
 QByteArray OutputOf(const ToolResult &result);
 
-// Fails the test for each part the text lacks (ExpectContains) or holds
-// (ExpectLacks), showing the text.
+// Fails the test for each part the text lacks (ExpectContains) or holds (ExpectLacks), showing the text.
 void ExpectContains(const QByteArray &text, std::initializer_list<QByteArrayView> parts);
 void ExpectLacks(const QByteArray &text, std::initializer_list<QByteArrayView> parts);
 

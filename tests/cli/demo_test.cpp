@@ -48,8 +48,7 @@ TEST_F(DemoInit, PrintsTheVariablesThatPointAtIt)
                    {u"export KESTIX_TESTSET='%1/kits/DemoKit'\n"_s.arg(root).toUtf8(),
                     u"export KESTIX_PLATFORM='%1/platforms/Kesto5 Pro/'\n"_s.arg(root).toUtf8()});
     EXPECT_EQ(testutil::ReadFile(root + u"/env.sh"_s), env);
-    // A second init into the same folder is refused rather than mixed in;
-    // an empty folder is taken.
+    // A second init into the same folder is refused rather than mixed in; an empty folder is taken.
     ExpectRefused(Tool("demo init", root), "exists and is not empty");
     ASSERT_TRUE(QDir().mkpath(u"empty"_s));
     EXPECT_EQ(Tool("demo init empty").status, 0);

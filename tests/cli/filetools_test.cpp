@@ -52,14 +52,13 @@ TEST_F(InspectTool, BadSourcesAndForeignFilesAreUsageErrors)
     WriteFile(u"twice.xml"_s,
               "<resources><string id=\"3\">a</string><object id=\"4\">b</object>\n"
               "<string id=\"3\">c</string></resources>");
-    const std::pair<const char *, const char *> rows[] = {
-        {"res compile bad.xml o.kar", "bad id"},
-        {"res compile twice.xml o.kar", "line 2: duplicate resource ID 3 of type 0x1"},
-        {"res compile src.xml missing/o.kar", "missing/o.kar"},
-        {"res list junk.kar", "junk.kar"},
-        {"mif missing.mif", "missing.mif"},
-        {"res frobnicate junk.kar", "expected 'dump FILE'"},
-    };
+    const std::pair<const char *, const char *> rows[]
+        = {{"res compile bad.xml o.kar", "bad id"},
+           {"res compile twice.xml o.kar", "line 2: duplicate resource ID 3 of type 0x1"},
+           {"res compile src.xml missing/o.kar", "missing/o.kar"},
+           {"res list junk.kar", "junk.kar"},
+           {"mif missing.mif", "missing.mif"},
+           {"res frobnicate junk.kar", "expected 'dump FILE'"}};
     for (const auto &[arguments, message] : rows) {
         const ToolResult r = Tool(arguments);
         ExpectRefused(r, message);
@@ -92,13 +91,12 @@ TEST_F(InspectTool, TarListAndCatReadAnArchiveMadeByGnuTar)
     // A name is found as the listing shows it too.
     EXPECT_EQ(Tool("tar cat p.tar", u"mod/red\\033[31m\\t\\n"_s).out, QByteArray("x"));
     WriteFile(u"cut.tar"_s, archive.left(1300));
-    const std::pair<const char *, const char *> refusals[] = {
-        {"p.tar mod/none", "no member mod/none"},
-        {"p.tar mod/", "mod/ is a directory"},
-        {"p.tar mod/link", "mod/link is a symbolic link to a.txt"},
-        {"cut.tar mod/a.txt", "cut.tar: unexpected end of archive at offset 1300"},
-        {"pkg/mod/a.txt a", "a.txt: does not look like a tar archive"},
-    };
+    const std::pair<const char *, const char *> refusals[]
+        = {{"p.tar mod/none", "no member mod/none"},
+           {"p.tar mod/", "mod/ is a directory"},
+           {"p.tar mod/link", "mod/link is a symbolic link to a.txt"},
+           {"cut.tar mod/a.txt", "cut.tar: unexpected end of archive at offset 1300"},
+           {"pkg/mod/a.txt a", "a.txt: does not look like a tar archive"}};
     for (const auto &[arguments, message] : refusals) {
         const ToolResult r = Tool("tar cat", arguments);
         ExpectRefused(r, message);
@@ -117,12 +115,9 @@ TEST_F(InspectTool, EncodeMatchesIconvAfterTheMarkAndDecodeReadsItBack)
         GTEST_SKIP() << "iconv not installed";
     const QString text = u"\u4e2d\u6587 A"_s; // 中文 A
     WriteFile(u"text.txt"_s, text.toUtf8());
-    const std::tuple<const char *, const char *, QByteArray> rows[] = {
-        // format, iconv's name for it, mark
-        {"S-JIS", "SHIFT_JIS", "\xfd\xfe"},
-        {"GB2312", "GB2312", "\xfc\xfe"},
-        {"UTF-8", "UTF-8", "\x02"},
-    };
+    // Format, iconv's name for it, mark.
+    const std::tuple<const char *, const char *, QByteArray> rows[]
+        = {{"S-JIS", "SHIFT_JIS", "\xfd\xfe"}, {"GB2312", "GB2312", "\xfc\xfe"}, {"UTF-8", "UTF-8", "\x02"}};
     for (const auto &[format, iconvName, mark] : rows) {
         SCOPED_TRACE(format);
         QByteArray expected;
@@ -141,12 +136,11 @@ TEST_F(InspectTool, EncodeMatchesIconvAfterTheMarkAndDecodeReadsItBack)
 TEST_F(InspectTool, TextAnEncodingCannotHoldIsNamedAndNothingIsStored)
 {
     // Format, text, and the line on standard error (empty when every character is held).
-    const std::tuple<const char *, QString, QByteArray> rows[] = {
-        {"1", u"H\u00e9llo \u30c6"_s, "character 7 U+30C6 '\xe3\x83\x86'"},
-        {"ISOLATIN1", u"H\u00e9llo"_s, {}},
-        {"S-JIS", u"\u00e9\u30c6"_s, "character 1 U+00E9 '\xc3\xa9'"},
-        {"UTF-8", u"\u30c6\U0001F600"_s, {}},
-    };
+    const std::tuple<const char *, QString, QByteArray> rows[]
+        = {{"1", u"H\u00e9llo \u30c6"_s, "character 7 U+30C6 '\xe3\x83\x86'"},
+           {"ISOLATIN1", u"H\u00e9llo"_s, {}},
+           {"S-JIS", u"\u00e9\u30c6"_s, "character 1 U+00E9 '\xc3\xa9'"},
+           {"UTF-8", u"\u30c6\U0001F600"_s, {}}};
     for (const auto &[format, text, lost] : rows) {
         SCOPED_TRACE(format);
         const ToolResult r = Tool("encode", format, text);

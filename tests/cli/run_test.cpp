@@ -146,12 +146,9 @@ protected:
     }
 
     QTemporaryDir dir;
-    const QString root = dir.filePath(u"demo"_s);
-    const QString targets = root + u"/data/Norvane/Targets"_s;
-    const QString results = Results(u"demo-phone"_s);
-    const QString ini = root + u"/handsets/demo-phone/handset.ini"_s;
-    const QString testData = root + u"/testdata/demo.ksx"_s;
-    const QString junit = dir.filePath(u"junit.xml"_s);
+    const QString root = dir.filePath(u"demo"_s), targets = root + u"/data/Norvane/Targets"_s;
+    const QString results = Results(u"demo-phone"_s), ini = root + u"/handsets/demo-phone/handset.ini"_s;
+    const QString testData = root + u"/testdata/demo.ksx"_s, junit = dir.filePath(u"junit.xml"_s);
     QString handsets;
     QProcessEnvironment env = QProcessEnvironment::systemEnvironment();
 };

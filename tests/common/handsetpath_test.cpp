@@ -50,8 +50,7 @@ protected:
     QString Host(const char *path) { return HandsetPath::ToHost(handset, QString::fromUtf8(path)); }
 
     QTemporaryDir dir;
-    const QString handset = dir.filePath(u"phone"_s);
-    const QString outside = dir.filePath(u"outside"_s);
+    const QString handset = dir.filePath(u"phone"_s), outside = dir.filePath(u"outside"_s);
 };
 
 TEST_F(HandsetPathHost, MapsPathsBelowTheFsFolderBothWaysAndRefusesTheRest)

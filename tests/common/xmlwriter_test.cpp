@@ -23,28 +23,26 @@ QDomDocument Parse(const QString &text)
     return doc;
 }
 
-// Documents as read and as written: attributes ordered by name (Qt's own
-// serialiser orders them by a per-process seed), one blank per level, and only
-// the nodes the document holds (a declaration, no document type).
+// Documents as read and as written: attributes ordered by name (Qt's own serialiser orders them by a per-process seed),
+// one blank per level, and only the nodes the document holds (a declaration, no document type).
 TEST(XmlWriter, WritesParsedDocumentsInOneOrderAndIndentation)
 {
-    const std::pair<QString, QString> rows[] = {
-        // as read, as written
-        {u"<manifest><module zeta='ZETA' name='NAME' alpha='ALPHA' type='TYPE' id='ID' b='B'>"
-         "<testcase>Run &amp; &lt;check></testcase></module></manifest>"_s,
-         u"<manifest>\n"
-         " <module alpha=\"ALPHA\" b=\"B\" id=\"ID\" name=\"NAME\" type=\"TYPE\" zeta=\"ZETA\">\n"
-         "  <testcase>Run &amp; &lt;check&gt;</testcase>\n"
-         " </module>\n"
-         "</manifest>\n"_s},
-        {u"<a q=\"1\" w=\"2\" e=\"3\" r=\"4\" t=\"5\" y=\"6\" u=\"7\" i=\"8\"><b x=\"1\" y=\"2\"/></a>"_s,
-         u"<a e=\"3\" i=\"8\" q=\"1\" r=\"4\" t=\"5\" u=\"7\" w=\"2\" y=\"6\">\n <b x=\"1\" y=\"2\"/>\n</a>\n"_s},
-        {u"<r/>"_s, u"<r/>\n"_s},
-        {u"<?xml version=\"1.0\" encoding=\"UTF-8\"?><r><!--c--><?pi x?></r>"_s,
-         u"<?xml version='1.0' encoding='UTF-8'?>\n<r>\n <!--c-->\n <?pi x?>\n</r>\n"_s},
-        {u"<?xml version=\"1.0\"?><a/>"_s, u"<?xml version='1.0'?>\n<a/>\n"_s},
-        {u"<!DOCTYPE a SYSTEM \"a.dtd\"><a/>"_s, u"<a/>\n"_s},
-    };
+    // As read, as written.
+    const std::pair<QString, QString> rows[]
+        = {{u"<manifest><module zeta='ZETA' name='NAME' alpha='ALPHA' type='TYPE' id='ID' b='B'>"
+            "<testcase>Run &amp; &lt;check></testcase></module></manifest>"_s,
+            u"<manifest>\n"
+            " <module alpha=\"ALPHA\" b=\"B\" id=\"ID\" name=\"NAME\" type=\"TYPE\" zeta=\"ZETA\">\n"
+            "  <testcase>Run &amp; &lt;check&gt;</testcase>\n"
+            " </module>\n"
+            "</manifest>\n"_s},
+           {u"<a q=\"1\" w=\"2\" e=\"3\" r=\"4\" t=\"5\" y=\"6\" u=\"7\" i=\"8\"><b x=\"1\" y=\"2\"/></a>"_s,
+            u"<a e=\"3\" i=\"8\" q=\"1\" r=\"4\" t=\"5\" u=\"7\" w=\"2\" y=\"6\">\n <b x=\"1\" y=\"2\"/>\n</a>\n"_s},
+           {u"<r/>"_s, u"<r/>\n"_s},
+           {u"<?xml version=\"1.0\" encoding=\"UTF-8\"?><r><!--c--><?pi x?></r>"_s,
+            u"<?xml version='1.0' encoding='UTF-8'?>\n<r>\n <!--c-->\n <?pi x?>\n</r>\n"_s},
+           {u"<?xml version=\"1.0\"?><a/>"_s, u"<?xml version='1.0'?>\n<a/>\n"_s},
+           {u"<!DOCTYPE a SYSTEM \"a.dtd\"><a/>"_s, u"<a/>\n"_s}};
     for (const auto &[read, written] : rows) {
         const QDomDocument doc = Parse(read);
         EXPECT_EQ(XmlWriter::ToString(doc), written);
@@ -118,9 +116,8 @@ TEST(XmlWriterDeclarations, AsciiStringEscapesEverythingBeyondAscii)
     EXPECT_EQ(back.documentElement().text(), u"caf\u00e9 & \u65e5a\u00e9]]>b"_s);
 }
 
-// Writing a document piece by piece gives the bytes of writing it whole,
-// escaping and attribute order included; an opened element that receives
-// nothing closes as an empty one.
+// Writing a document piece by piece gives the bytes of writing it whole, escaping and attribute order included; an
+// opened element that receives nothing closes as an empty one.
 TEST(XmlWriterStream, PiecesGiveTheBytesOfTheWholeDocument)
 {
     const QDomDocument whole
@@ -150,8 +147,7 @@ TEST(XmlWriterStream, PiecesGiveTheBytesOfTheWholeDocument)
 
 TEST(XmlWriterStream, ADeviceReceivesTheSameBytesPieceByPiece)
 {
-    // Enough text to be passed on in several pieces, with characters whose
-    // UTF-8 takes more than one byte.
+    // Enough text to be passed on in several pieces, with characters whose UTF-8 takes more than one byte.
     const auto write = [](XmlWriter::DocumentStream &out) {
         XmlNode root(u"kit"_s);
         root.SetAttribute(u"name"_s, u"caf\u00e9"_s);

@@ -101,6 +101,5 @@ protected:
     QTemporaryDir m_dir;
     CapturedLog m_log;
     Harness m_harness;
-    QSharedPointer<Manifest> m_kit;
-    QSharedPointer<Manifest> m_platform;
+    QSharedPointer<Manifest> m_kit, m_platform;
 };

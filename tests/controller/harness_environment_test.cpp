@@ -50,8 +50,7 @@ TEST_F(HarnessCompileTest, UpperCaseKsxIsConvertedThenCompiledWithItsNamePassedU
     m_toolset.InstallAltCompiler();
     CurrentDirectory cwd(m_root.path());
     const QString name = u"my data \"q\" 'x' $HOME $(touch injected) `touch injected2`; x"_s;
-    const QString source = RootPath(name + u".KSX"_s);
-    const QString car = RootPath(name + u".car"_s);
+    const QString source = RootPath(name + u".KSX"_s), car = RootPath(name + u".car"_s);
     const QString output = RootPath(u"out $PATH \"1\".kar"_s);
     WriteFile(source, "<resources/>\n");
 
@@ -83,17 +82,14 @@ TEST_F(HarnessCompileTest, OnlyKsxIsConvertedAndAFailedStepKeepsTheSourceAndNoIn
     {
         const char *source, *failing, *compileInput;
         bool compiled;
-    } rows[] = {
-        {"data.kar", nullptr, "data.kar", true},
-        {"data.ksx.txt", nullptr, "data.ksx.txt", true},
-        {"ksx", nullptr, "ksx", true},
-        {"strings.ksx", "convert_fails", "strings.ksx", true},
-        {"strings.ksx", "compile_fails", "car", false},
-    };
+    } rows[] = {{"data.kar", nullptr, "data.kar", true},
+                {"data.ksx.txt", nullptr, "data.ksx.txt", true},
+                {"ksx", nullptr, "ksx", true},
+                {"strings.ksx", "convert_fails", "strings.ksx", true},
+                {"strings.ksx", "compile_fails", "car", false}};
     for (const auto &row : rows) {
         SCOPED_TRACE(row.source + std::string(" ") + (row.failing ? row.failing : ""));
-        const QString source = RootPath(QString::fromLatin1(row.source));
-        const QString car = RootPath(u"strings.car"_s);
+        const QString source = RootPath(QString::fromLatin1(row.source)), car = RootPath(u"strings.car"_s);
         WriteFile(source, "src");
         if (row.failing)
             m_toolset.SetFlag(row.failing, true);
@@ -114,8 +110,7 @@ TEST_F(HarnessCompileTest, OnlyKsxIsConvertedAndAFailedStepKeepsTheSourceAndNoIn
 
 TEST_F(HarnessCompileTest, MissingUnstartableOrFailingCompilersFailAtOnceWithTheCommandAndTheToolOutput)
 {
-    const QString source = RootPath(u"strings.ksx"_s);
-    const QString output = RootPath(u"out.kar"_s);
+    const QString source = RootPath(u"strings.ksx"_s), output = RootPath(u"out.kar"_s);
     WriteFile(source, "src");
     // A stale output from an earlier run must not pass for a compiled one.
     WriteFile(output, "stale");
@@ -169,8 +164,7 @@ TEST_F(HarnessEnvironmentTest, RelativeAndAbsolutePathsShareOneCache)
 {
     m_toolset.InstallCompiler();
     m_toolset.InstallAltCompiler();
-    const QString data = OldFile(u"sub/data.kar"_s, "data");
-    const QString pack = OldFile(u"sub/pack.dso"_s, "<device/>");
+    const QString data = OldFile(u"sub/data.kar"_s, "data"), pack = OldFile(u"sub/pack.dso"_s, "<device/>");
     {
         CurrentDirectory cwd(RootPath(u"sub"_s));
         m_harness.SetTestData(u"../sub/./data.kar"_s);
@@ -229,8 +223,7 @@ TEST_F(HarnessEnvironmentTest, FailedTestDataCompileDropsTheCacheEntryAndTriesAg
 TEST_F(HarnessEnvironmentTest, DevicePackIsCompiledAndFlattenedOrOnFailureKeepsItsOtherEntries)
 {
     m_toolset.InstallAltCompiler();
-    const QString source = OldFile(u"device.dso"_s, "<device><a/></device>\n");
-    const QString key = StringHashName(source);
+    const QString source = OldFile(u"device.dso"_s, "<device><a/></device>\n"), key = StringHashName(source);
 
     m_harness.SetDPK(source);
     const Env &env = EnvOf(m_harness);
@@ -292,12 +285,10 @@ TEST_F(HarnessSetupTest, KitAndPlatformAreTheDefaultsTheFirstListedEntryNamedOrA
     {
         const char *kit, *platform, *expectedKit, *expectedPlatform;
         bool kitNotSelected;
-    } rows[] = {
-        {"", "", "kits/KitTwo", "platforms/Beta Pro/pvs/platform", false},
-        {"", "ALPHA", "kits/KitTwo", "platforms/Alpha Pro/pvs/platform", true},
-        {"Kit", "a", "kits/KitOne", "platforms/Alpha Pro/pvs/platform", false},
-        {"elsewhere/kit", "sdk/../sdk/p", "elsewhere/kit", "sdk/p/pvs/platform", false},
-    };
+    } rows[] = {{"", "", "kits/KitTwo", "platforms/Beta Pro/pvs/platform", false},
+                {"", "ALPHA", "kits/KitTwo", "platforms/Alpha Pro/pvs/platform", true},
+                {"Kit", "a", "kits/KitOne", "platforms/Alpha Pro/pvs/platform", false},
+                {"elsewhere/kit", "sdk/../sdk/p", "elsewhere/kit", "sdk/p/pvs/platform", false}};
     for (const auto &row : rows) {
         SCOPED_TRACE(row.kit + std::string(" ") + row.platform);
         CapturedLog log;

@@ -35,11 +35,10 @@ TEST_F(HarnessTargetTest, ConnectsToTheFirstTargetWhoseNameOrDescriptionContains
     AddHandset(u"Alpha-1234"_s, u"Kesto Phone Red"_s);
     AddHandset(u"Beta-5678"_s, u"Kesto Phone Blue"_s);
     AddHandset(u"Gamma-9012"_s, u"Tablet"_s);
-    const char *rows[][3] = {
-        // stored target, request, connected
-        {"", "5678", "Beta-5678"}, {"", "bEtA", "Beta-5678"}, {"", "BLUE", "Beta-5678"}, {"", "phone", "Alpha-1234"},
-        {"", "tab", "Gamma-9012"}, {"", "", "Alpha-1234"},    {"blue", "", "Beta-5678"},
-    };
+    // Stored target, request, connected.
+    const char *rows[][3]
+        = {{"", "5678", "Beta-5678"}, {"", "bEtA", "Beta-5678"}, {"", "BLUE", "Beta-5678"}, {"", "phone", "Alpha-1234"},
+           {"", "tab", "Gamma-9012"}, {"", "", "Alpha-1234"},    {"blue", "", "Beta-5678"}};
     for (const auto &row : rows) {
         SCOPED_TRACE(row[0] + std::string(" ") + row[1]);
         m_harness.SetTarget(QString::fromLatin1(row[0]));

@@ -65,8 +65,7 @@ TEST_F(ProcessTest, WholeTreeFeedsOneResultsFileWithIndentedMessagesAndALinkBack
                                       {u"Menu/m1"_s, u"pass"_s},
                                       {u"Menu/m2"_s, u"pass"_s}}));
 
-    const QString a = LogFolder() + u"/a-run"_s;
-    const QString b = LogFolder() + u"/b-run"_s;
+    const QString a = LogFolder() + u"/a-run"_s, b = LogFolder() + u"/b-run"_s;
     const QString expected = QStringLiteral("   Parsing Logs"
                                             "   Processing Log audio-ctf-2026-12-03.log"
                                             "   Processing Log menu-2026-12-03.txt"

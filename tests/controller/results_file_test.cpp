@@ -9,17 +9,15 @@ namespace {
 
 TEST(ResultPrecedence, KeepsTheStrongerVerdict)
 {
-    const char *rows[][3] = {
-        // stored, reported, kept
-        {"", "unexecuted", "unexecuted"},
-        {"pass", "fail", "pass"},
-        {"fail", "pass", "pass"},
-        {"fail", "unsupported", "unsupported"},
-        {"fail", "crashed", "fail"},
-        {"unsupported", "fail", "fail"},
-        {"unsupported", "unexecuted", "unsupported"},
-        {"crashed", "timeout", "timeout"},
-    };
+    // Stored, reported, kept.
+    const char *rows[][3] = {{"", "unexecuted", "unexecuted"},
+                             {"pass", "fail", "pass"},
+                             {"fail", "pass", "pass"},
+                             {"fail", "unsupported", "unsupported"},
+                             {"fail", "crashed", "fail"},
+                             {"unsupported", "fail", "fail"},
+                             {"unsupported", "unexecuted", "unsupported"},
+                             {"crashed", "timeout", "timeout"}};
     for (const auto &row : rows)
         EXPECT_EQ(ProcessedResults::Precedence(QString::fromLatin1(row[0]), QString::fromLatin1(row[1])),
                   QLatin1String(row[2]))

@@ -58,8 +58,7 @@ public:
         return true;
     }
 
-    bool runs = true;
-    bool copies = true;
+    bool runs = true, copies = true;
     int pollsNeeded = 1;
     std::function<void(IKestoDevice *)> onPoll;
     QList<qint64> pollTimes;
@@ -80,8 +79,7 @@ public:
     bool PostLoad(IKestoDevice *, QMap<QString, QString> &) override { return Note(m_events, u"postload "_s + name); }
     void Unload(IKestoDevice *, QMap<QString, QString> &) override { Note(m_events, u"unload "_s + name); }
 
-    bool onHandset = false;
-    bool loads = true;
+    bool onHandset = false, loads = true;
 
 private:
     QStringList *m_events;
@@ -162,8 +160,7 @@ protected:
 
     HandsetFixture m_handsets;
     QStringList m_events;
-    QSharedPointer<RecordingFramework> m_ctf;
-    QSharedPointer<RecordingFramework> m_oat;
+    QSharedPointer<RecordingFramework> m_ctf, m_oat;
     Watcher m_watcher;
 };
 
@@ -239,8 +236,7 @@ TEST_F(RunLoopTest, NoDeleteKeepsModulesCopyDelayPausesBeforeEachCopyAndTestCase
     m_harness.SetCopyDelay(u"1500"_s);
     m_harness.SetTestCases({u"t1"_s, u"t2"_s});
     m_harness.SetRunOption(u"-fast"_s);
-    QSharedPointer<RecordingModule> second = Queue(u"B"_s, u"ctf"_s);
-    QSharedPointer<RecordingModule> first = Queue(u"A"_s, u"ctf"_s);
+    QSharedPointer<RecordingModule> second = Queue(u"B"_s, u"ctf"_s), first = Queue(u"A"_s, u"ctf"_s);
 
     EXPECT_TRUE(m_harness.Run());
     EXPECT_FALSE(m_events.join(u',').contains(u"remove"_s));

@@ -8,14 +8,7 @@
 namespace {
 
 using Modules = QList<QSharedPointer<_TestModule>>;
-
-QStringList Names(const Modules &modules)
-{
-    QStringList names;
-    for (const QSharedPointer<_TestModule> &module : modules)
-        names.append(module->moduleName);
-    return names;
-}
+using testutil::ModuleNames;
 
 class FeatureListTest : public CatalogueHarnessTest
 {
@@ -44,27 +37,24 @@ TEST_F(FeatureListTest, FeaturesSelectTheirModulesAndUnknownNamesAreWarnedOneByO
     const struct
     {
         QByteArray xml;
-        QStringList selected;
-        QStringList warned;
-    } rows[] = {
-        {"<features><feature testModule=\"Bar\"/><feature name=\"no module\"/></features>", {u"Bar"_s}, {}},
-        // Any letter case, any depth.
-        {"<root><group><sub><feature testModule=\"foo\"/></sub></group><Feature testModule=\"SHELL\"/></root>",
-         {u"Foo"_s, u"Shell"_s},
-         {}},
-        // A secondary module is never selected, and a pattern is not a module name.
-        {"<f><feature testModule=\"Ghost\"/><feature testModule=\"Bar\"/>"
-         "<feature testModule=\"Lib\"/><feature testModule=\"Fo*\"/></f>",
-         {u"Bar"_s, u"Foo"_s, u"FooPlus"_s},
-         {u"Ghost"_s, u"Lib"_s, u"Fo*"_s}},
-        {deep, {u"Bar"_s, u"Foo"_s, u"Shell"_s}, {}},
-    };
+        QStringList selected, warned;
+    } rows[] = {{"<features><feature testModule=\"Bar\"/><feature name=\"no module\"/></features>", {u"Bar"_s}, {}},
+                // Any letter case, any depth.
+                {"<root><group><sub><feature testModule=\"foo\"/></sub></group><Feature testModule=\"SHELL\"/></root>",
+                 {u"Foo"_s, u"Shell"_s},
+                 {}},
+                // A secondary module is never selected, and a pattern is not a module name.
+                {"<f><feature testModule=\"Ghost\"/><feature testModule=\"Bar\"/>"
+                 "<feature testModule=\"Lib\"/><feature testModule=\"Fo*\"/></f>",
+                 {u"Bar"_s, u"Foo"_s, u"FooPlus"_s},
+                 {u"Ghost"_s, u"Lib"_s, u"Fo*"_s}},
+                {deep, {u"Bar"_s, u"Foo"_s, u"Shell"_s}, {}}};
     for (const auto &row : rows) {
         SCOPED_TRACE(row.xml.left(200).toStdString());
         const qsizetype logged = m_log.Text().size();
         Modules modules{QSharedPointer<_TestModule>(new ScriptedModule(u"stale"_s))};
         EXPECT_EQ(m_harness.GetTestModules(modules, Features(row.xml)), uint(row.selected.size()));
-        EXPECT_EQ(Names(modules), row.selected);
+        EXPECT_EQ(ModuleNames(modules), row.selected);
         QString expected;
         for (const QString &name : row.warned)
             expected += u"   Warning: Testmodule \"%1\" not found in test manifests."_s.arg(name);
@@ -76,29 +66,28 @@ TEST_F(FeatureListTest, FilterSelectionAppendsKitThenPlatformAndAPlatformOnlySel
 {
     Modules kept{QSharedPointer<_TestModule>(new ScriptedModule(u"kept"_s))};
     EXPECT_EQ(m_harness.GetTestModules(kept, QStringList{u"foo*"_s}, QString(), QString()), 3u);
-    EXPECT_EQ(Names(kept), (QStringList{u"kept"_s, u"Foo"_s, u"FooPlus"_s}));
+    EXPECT_EQ(ModuleNames(kept), (QStringList{u"kept"_s, u"Foo"_s, u"FooPlus"_s}));
 
     HarnessTestAccess::SetKitNotSelected(m_harness, true);
     const QString path = Features("<f><feature testModule=\"Foo\"/><feature testModule=\"FooPlus\"/></f>");
     Modules modules;
     EXPECT_EQ(m_harness.GetTestModules(modules, path), 1u);
-    EXPECT_EQ(Names(modules), QStringList{u"FooPlus"_s});
+    EXPECT_EQ(ModuleNames(modules), QStringList{u"FooPlus"_s});
     EXPECT_TRUE(m_log.Text().contains(u"   Warning: Testmodule \"Foo\" not found in test manifests."_s));
 
     Modules filtered;
     EXPECT_EQ(m_harness.GetTestModules(filtered, QStringList{u"*"_s}, QString(), QString()), 2u);
-    EXPECT_EQ(Names(filtered), (QStringList{u"FooPlus"_s, u"Shell"_s}));
+    EXPECT_EQ(ModuleNames(filtered), (QStringList{u"FooPlus"_s, u"Shell"_s}));
 }
 
 TEST_F(FeatureListTest, BadFeatureFilesSelectNothingAndSayWhy)
 {
-    const char *rows[][2] = {
-        // content (null: no file at all), the message as a pattern where %1 is the file's path
-        {nullptr, "BFS File %1 not found\\."},
-        {"<features><feature testModule=\"Foo\">", "Error Parsing BFS File %1, Error:.+ Line:1 Column:\\d+"},
-        {"<features>\n<feature testModule=\"Foo\">\n</x>", "Error Parsing BFS File %1, Error:.+ Line:3 Column:\\d+"},
-        {"<features><module name=\"Foo\"/></features>", "No testcases in BFS File %1\\."},
-    };
+    // Content (null: no file at all), the message as a pattern where %1 is the file's path.
+    const char *rows[][2]
+        = {{nullptr, "BFS File %1 not found\\."},
+           {"<features><feature testModule=\"Foo\">", "Error Parsing BFS File %1, Error:.+ Line:1 Column:\\d+"},
+           {"<features>\n<feature testModule=\"Foo\">\n</x>", "Error Parsing BFS File %1, Error:.+ Line:3 Column:\\d+"},
+           {"<features><module name=\"Foo\"/></features>", "No testcases in BFS File %1\\."}};
     for (const auto &row : rows) {
         SCOPED_TRACE(row[1]);
         const QString path = row[0] ? Features(row[0]) : m_dir.filePath(u"missing.xml"_s);
@@ -156,7 +145,7 @@ TEST_F(CatalogueSetupTest, StaleKitCacheIsRegeneratedAndTheDefaultDevicePackTake
     ChooseBoth(m_harness);
     Modules modules;
     EXPECT_EQ(m_harness.GetTestModules(modules, QStringList(), QString(), QString()), 2u);
-    EXPECT_EQ(Names(modules), (QStringList{u"Audio"_s, u"Shell"_s}));
+    EXPECT_EQ(ModuleNames(modules), (QStringList{u"Audio"_s, u"Shell"_s}));
 
     const QString log = m_log.Text();
     const int outOfDate = log.indexOf(u"Manifest out of date for "_s + KitPath());

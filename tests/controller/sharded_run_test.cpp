@@ -117,8 +117,7 @@ TEST_F(ShardedRunTest, AHandsetGoingOfflineHandsItsModuleToTheOthers)
     WriteFile(m_run.HandsetFolder(u"h2"_s) + u"/drop-at"_s, "2\n");
     ShardedRun run(m_run.log());
     AddWorkers(run, handsets);
-    const QList<QSharedPointer<_TestModule>> selection = m_run.Select();
-    ASSERT_TRUE(run.Run(selection)) << m_run.LogText().toStdString();
+    ASSERT_TRUE(run.Run(m_run.Select())) << m_run.LogText().toStdString();
 
     const QList<ShardedRun::HandsetResult> results = run.Handsets();
     ASSERT_EQ(results.size(), 2);

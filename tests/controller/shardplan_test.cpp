@@ -112,34 +112,33 @@ TEST(ShardSettingTest, ReadsOptionsAndEngineVariables)
     {
         const char *what, *index, *count, *variables, *error;
         int expectedIndex = 0, expectedCount = 0;
-    } rows[] = {
-        {"nothing", nullptr, nullptr, "", nullptr, -1, 1},
-        {"options", "2", "5", "", nullptr, 2, 5},
-        {"bazel", nullptr, nullptr, "TEST_SHARD_INDEX=0;TEST_TOTAL_SHARDS=4", nullptr, 0, 4},
-        {"gitlab is 1-based", nullptr, nullptr, "CI_NODE_INDEX=3;CI_NODE_TOTAL=3", nullptr, 2, 3},
-        {"gitlab job without parallel", nullptr, nullptr, "CI_NODE_TOTAL=1", nullptr, -1, 1},
-        {"kubernetes", nullptr, "6", "JOB_COMPLETION_INDEX=5", nullptr, 5, 6},
-        {"options win", "1", "2", "TEST_SHARD_INDEX=7;TEST_TOTAL_SHARDS=9;CI_NODE_INDEX=x", nullptr, 1, 2},
-        {"engines agree", nullptr, nullptr, "TEST_SHARD_INDEX=1;TEST_TOTAL_SHARDS=2;CI_NODE_INDEX=2;CI_NODE_TOTAL=2",
-         nullptr, 1, 2},
-        {"engines disagree", nullptr, nullptr, "TEST_SHARD_INDEX=0;TEST_TOTAL_SHARDS=2;CI_NODE_INDEX=2;CI_NODE_TOTAL=2",
-         "disagree"},
-        {"kubernetes against bazel", nullptr, "3", "JOB_COMPLETION_INDEX=1;TEST_SHARD_INDEX=1;TEST_TOTAL_SHARDS=4",
-         "disagree"},
-        {"kubernetes without a count", nullptr, nullptr, "JOB_COMPLETION_INDEX=1", "--shard-count"},
-        {"index not below count", "3", "3", "", "not below"},
-        {"bazel index not below total", nullptr, nullptr, "TEST_SHARD_INDEX=4;TEST_TOTAL_SHARDS=4", "not below"},
-        {"gitlab index 0", nullptr, nullptr, "CI_NODE_INDEX=0;CI_NODE_TOTAL=2", "outside 1..2"},
-        {"no shards", "0", "0", "", "must be 1 to"},
-        {"too many shards", "0", "999999999", "", "must be 1 to"},
-        {"negative", "-1", "3", "", "not a shard number"},
-        {"not a number", "1", "three", "", "not a number of shards"},
-        {"blank in a variable", nullptr, nullptr, "TEST_SHARD_INDEX= 1;TEST_TOTAL_SHARDS=2", "not a shard number"},
-        {"bazel half set", nullptr, nullptr, "TEST_TOTAL_SHARDS=2", "TEST_TOTAL_SHARDS is set without"},
-        {"gitlab total without index", nullptr, nullptr, "CI_NODE_TOTAL=4", "without CI_NODE_INDEX"},
-        {"index without count", "1", nullptr, "", "needs --shard-count"},
-        {"count without index", nullptr, "4", "", "needs --shard-index"},
-    };
+    } rows[]
+        = {{"nothing", nullptr, nullptr, "", nullptr, -1, 1},
+           {"options", "2", "5", "", nullptr, 2, 5},
+           {"bazel", nullptr, nullptr, "TEST_SHARD_INDEX=0;TEST_TOTAL_SHARDS=4", nullptr, 0, 4},
+           {"gitlab is 1-based", nullptr, nullptr, "CI_NODE_INDEX=3;CI_NODE_TOTAL=3", nullptr, 2, 3},
+           {"gitlab job without parallel", nullptr, nullptr, "CI_NODE_TOTAL=1", nullptr, -1, 1},
+           {"kubernetes", nullptr, "6", "JOB_COMPLETION_INDEX=5", nullptr, 5, 6},
+           {"options win", "1", "2", "TEST_SHARD_INDEX=7;TEST_TOTAL_SHARDS=9;CI_NODE_INDEX=x", nullptr, 1, 2},
+           {"engines agree", nullptr, nullptr, "TEST_SHARD_INDEX=1;TEST_TOTAL_SHARDS=2;CI_NODE_INDEX=2;CI_NODE_TOTAL=2",
+            nullptr, 1, 2},
+           {"engines disagree", nullptr, nullptr,
+            "TEST_SHARD_INDEX=0;TEST_TOTAL_SHARDS=2;CI_NODE_INDEX=2;CI_NODE_TOTAL=2", "disagree"},
+           {"kubernetes against bazel", nullptr, "3", "JOB_COMPLETION_INDEX=1;TEST_SHARD_INDEX=1;TEST_TOTAL_SHARDS=4",
+            "disagree"},
+           {"kubernetes without a count", nullptr, nullptr, "JOB_COMPLETION_INDEX=1", "--shard-count"},
+           {"index not below count", "3", "3", "", "not below"},
+           {"bazel index not below total", nullptr, nullptr, "TEST_SHARD_INDEX=4;TEST_TOTAL_SHARDS=4", "not below"},
+           {"gitlab index 0", nullptr, nullptr, "CI_NODE_INDEX=0;CI_NODE_TOTAL=2", "outside 1..2"},
+           {"no shards", "0", "0", "", "must be 1 to"},
+           {"too many shards", "0", "999999999", "", "must be 1 to"},
+           {"negative", "-1", "3", "", "not a shard number"},
+           {"not a number", "1", "three", "", "not a number of shards"},
+           {"blank in a variable", nullptr, nullptr, "TEST_SHARD_INDEX= 1;TEST_TOTAL_SHARDS=2", "not a shard number"},
+           {"bazel half set", nullptr, nullptr, "TEST_TOTAL_SHARDS=2", "TEST_TOTAL_SHARDS is set without"},
+           {"gitlab total without index", nullptr, nullptr, "CI_NODE_TOTAL=4", "without CI_NODE_INDEX"},
+           {"index without count", "1", nullptr, "", "needs --shard-count"},
+           {"count without index", nullptr, "4", "", "needs --shard-index"}};
     for (const auto &row : rows) {
         SCOPED_TRACE(row.what);
         QMap<QString, QString> variables;
@@ -187,8 +186,7 @@ ModuleTimings::Run At(qint64 ms, const QString &host, int minute)
 TEST(ModuleTimingsTest, RecordsMergesAndKeepsTheRecentRunsAndRefusesBadOrForeignFiles)
 {
     QTemporaryDir dir;
-    const QString a = dir.filePath(u"a.json"_s);
-    const QString b = dir.filePath(u"b.json"_s);
+    const QString a = dir.filePath(u"a.json"_s), b = dir.filePath(u"b.json"_s);
     QString error;
     for (int i = 0; i < 12; ++i) // 100, 200, ... 1200 ms on host a
         ASSERT_TRUE(ModuleTimings::Record(a, u"Audio"_s, u"KVK"_s, At(100 * (i + 1), u"a"_s, i), &error))
@@ -232,8 +230,7 @@ TEST(ModuleTimingsTest, RecordsMergesAndKeepsTheRecentRunsAndRefusesBadOrForeign
         {head + "{}}", "\"modules\" is not a list"},
         {module + "}]}", "module 0 needs"},
         {run + "\"ms\": -5, \"at\": \"2026-12-06T20:00:00Z\"}]}]}", "whole milliseconds"},
-        {run + "\"ms\": 5, \"at\": \"yesterday\"}]}]}", "ISO date"},
-    };
+        {run + "\"ms\": 5, \"at\": \"yesterday\"}]}]}", "ISO date"}};
     for (const auto &[bytes, message] : rows) {
         WriteFile(path, bytes);
         EXPECT_FALSE(again.Merge(path)) << message;
@@ -307,11 +304,9 @@ TEST(ResultsMergeTest, RefusesFilesItCannotMergeAndKeepsWhatItHas)
     QTemporaryDir dir;
     const QString good = dir.filePath(u"good.xml"_s);
     WriteFile(good, ResultsFile({u"pass"_s}));
-    const QList<QPair<QByteArray, const char *>> rows{
-        {"<testmodules><module name=", "is not a processed-results file"},
-        {"<manifest/>", "its root is <manifest>"},
-        {ResultsFile({u"fail"_s}, "#2"), "another test kit"},
-    };
+    const QList<QPair<QByteArray, const char *>> rows{{"<testmodules><module name=", "is not a processed-results file"},
+                                                      {"<manifest/>", "its root is <manifest>"},
+                                                      {ResultsFile({u"fail"_s}, "#2"), "another test kit"}};
     for (const auto &[bytes, message] : rows) {
         const QString bad = dir.filePath(u"bad.xml"_s);
         WriteFile(bad, bytes);

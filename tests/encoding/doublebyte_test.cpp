@@ -40,10 +40,9 @@ INSTANTIATE_TEST_SUITE_P(Converters, MultiByteConverter,
                          ::testing::Values(ENCODING_UTF8, ENCODING_GB2312, ENCODING_SJIS, ENCODING_KSC5601,
                                            ENCODING_CP949));
 
-// Arbitrary bytes, biased towards lead bytes, NULs and marks. Each prefix is
-// decoded from a buffer whose next byte is first a NUL, then a byte that
-// would complete a code: a decoder reading past the block would notice. Null
-// output pointers are refused, not followed.
+// Arbitrary bytes, biased towards lead bytes, NULs and marks. Each prefix is decoded from a buffer whose next byte is
+// first a NUL, then a byte that would complete a code: a decoder reading past the block would notice. Null output
+// pointers are refused, not followed.
 TEST_P(Converter, NeverReadsPastTheBlock)
 {
     EncoderPtr encoding = Make(GetParam());

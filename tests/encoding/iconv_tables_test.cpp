@@ -91,8 +91,7 @@ struct TableCase
     const char *iconvName;
     bool (*isLead)(unsigned char);
     std::size_t expectedTwoByteCodes;
-    Known decodeDifferences;
-    Known encodeDifferences;
+    Known decodeDifferences, encodeDifferences;
 };
 
 bool KsLead(unsigned char b)

@@ -39,8 +39,7 @@ struct Detection
 {
     QByteArray data;
     KestoEncodingFormat format;
-    bool result;
-    bool hasEncoder;
+    bool result, hasEncoder;
 };
 
 class DetectFormat : public ::testing::TestWithParam<Detection>
@@ -78,9 +77,8 @@ INSTANTIATE_TEST_SUITE_P(Marks, DetectFormat,
                                            // An empty block leaves the format as it was.
                                            Detection{QByteArray(), KestoEncodingFormat(12345), false, false}));
 
-// Each converter created for a format is the one detection picks for its
-// mark (KSC5601, which shares CP949's mark, decodes as CP949). There is no
-// converter for Unicode, None or an unknown format.
+// Each converter created for a format is the one detection picks for its mark (KSC5601, which shares CP949's mark,
+// decodes as CP949). There is no converter for Unicode, None or an unknown format.
 TEST(CreateEncoder, MarkOfEachFormatSelectsAConverterThatReadsIt)
 {
     const QString text = u"Ab1"_s;
@@ -109,9 +107,8 @@ TEST(CreateEncoder, MarkOfEachFormatSelectsAConverterThatReadsIt)
     FreeEncoder(nullptr);
 }
 
-// Bytes and text that a converter turns into each other. Encoding replaces
-// what the output held; decoding replaces it too in UTF-8 and appends to it
-// in the other converters.
+// Bytes and text that a converter turns into each other. Encoding replaces what the output held; decoding replaces it
+// too in UTF-8 and appends to it in the other converters.
 enum Ways { kDecodes = 1, kEncodes = 2, kBoth = 3 };
 
 struct Conversion
@@ -171,8 +168,7 @@ const Conversion kConversions[] = {
     {"CP949 extension", ENCODING_CP949, kBoth, Bytes({0x81, 0x41, 0xB0, 0xA1}), Units({0xAC02, 0xAC00})},
     {"CP949 unmapped", ENCODING_CP949, kDecodes, Bytes({0xC9, 0xA1, 0x80, 0x41}), Units({' ', ' '})},
     {"CP949 unmapped", ENCODING_CP949, kEncodes, "?z", Units({0xE000, 'z'})},
-    {"CP949 stops at NUL", ENCODING_CP949, kDecodes, Bytes({0x41, 0x00, 0x42}), Units({'A'})},
-};
+    {"CP949 stops at NUL", ENCODING_CP949, kDecodes, Bytes({0x41, 0x00, 0x42}), Units({'A'})}};
 
 class Converts : public ::testing::TestWithParam<Conversion>
 {

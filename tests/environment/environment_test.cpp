@@ -1,5 +1,4 @@
-// The library's view of the host: platforms, test sets, its own folders,
-// helper programs and device packs.
+// The library's view of the host: platforms, test sets, its own folders, helper programs and device packs.
 
 #include "environment/devicexml.h"
 #include "environment/platforms.h"
@@ -19,8 +18,7 @@ using namespace Qt::StringLiterals;
 
 namespace {
 
-// A private data root, platforms root and test sets root, with none of the
-// user's settings.
+// A private data root, platforms root and test sets root, with none of the user's settings.
 class EnvironmentTest : public ::testing::Test
 {
 protected:
@@ -42,9 +40,7 @@ protected:
     }
 
     QTemporaryDir temp;
-    QString base;
-    QString root;
-    QString kits;
+    QString base, root, kits;
     testutil::EnvGuard env;
 };
 using PlatformsTest = EnvironmentTest;
@@ -72,15 +68,8 @@ TEST_F(PlatformsTest, ListsSubDirectoriesByNameStrippingTheProWord)
     env.Set("KESTIX_PLATFORMS_ALL", root);
     ASSERT_EQ(GetPlatforms(platforms), 7u);
     EXPECT_EQ(Describe(platforms, root),
-              (QStringList{
-                  "abc|R/abc|0|0",
-                  "Bar 2|R/Bar PRO 2|1|0",
-                  "Foo|R/Foo Pro|1|0",
-                  "My Project|R/My Project|1|0",
-                  "Pro|R/Pro|1|0",
-                  "Product|R/Product|1|0",
-                  "zed|R/zed|0|0",
-              }));
+              (QStringList{"abc|R/abc|0|0", "Bar 2|R/Bar PRO 2|1|0", "Foo|R/Foo Pro|1|0", "My Project|R/My Project|1|0",
+                           "Pro|R/Pro|1|0", "Product|R/Product|1|0", "zed|R/zed|0|0"}));
 }
 
 TEST_F(PlatformsTest, DefaultPlatformIsMatchedIgnoringCase)
@@ -126,15 +115,14 @@ TEST_F(PlatformsTest, ProAndNonProListsAppendWithoutClearing)
 
 TEST(DefaultPlatform, CutsAtLastBackslashThenLastSlash)
 {
-    const std::tuple<const char *, bool, const char *> rows[] = {
-        {"", false, ""},
-        {"C:\\sdk\\platforms\\abc\\", true, "C:\\sdk\\platforms\\abc"},
-        {"C:\\sdk\\platforms\\abc", true, "C:\\sdk\\platforms"},
-        {"/opt/sdk/abc/", true, "/opt/sdk/abc"},
-        {"/opt/sdk/abc", true, "/opt/sdk"},
-        {"a/b\\c/d", true, "a/b"}, // a backslash anywhere wins over later forward slashes
-        {"abc", true, "abc"},
-    };
+    const std::tuple<const char *, bool, const char *> rows[]
+        = {{"", false, ""},
+           {"C:\\sdk\\platforms\\abc\\", true, "C:\\sdk\\platforms\\abc"},
+           {"C:\\sdk\\platforms\\abc", true, "C:\\sdk\\platforms"},
+           {"/opt/sdk/abc/", true, "/opt/sdk/abc"},
+           {"/opt/sdk/abc", true, "/opt/sdk"},
+           {"a/b\\c/d", true, "a/b"}, // a backslash anywhere wins over later forward slashes
+           {"abc", true, "abc"}};
     testutil::EnvGuard env;
     for (const auto &[setting, found, path] : rows) {
         env.Set("KESTIX_PLATFORM", QString::fromUtf8(setting));
@@ -200,8 +188,7 @@ TEST_F(PlatformsTest, DefaultTestKitIsTheNamedOneExactlyOrTheGreatestName)
         EXPECT_EQ(untouched.type, TestKit::USER_KIT);
     }
 
-    // A test set ending in a separator picks the greatest name, ordinally:
-    // lower-case names sort after upper-case ones.
+    // A test set ending in a separator picks the greatest name, ordinally: lower-case names sort after upper-case ones.
     const QString more = temp.path() + u"/more"_s;
     MakeDirs(more, {"alpha", "Zeta", "beta"});
     env.Set("KESTIX_TESTSETS_ALL", more);
@@ -235,18 +222,17 @@ TEST(TestKitNames, DefaultTestKitNameIsTheLastComponentAndTypesHaveNames)
 
 TEST(BreakPackageName, SplitsIntoNameVariantAndBuild)
 {
-    const std::tuple<const char *, bool, const char *, const char *, const char *> rows[] = {
-        {"my_mod_RVCT22arm9_Release.kestix", true, "my_mod", "RVCT22arm9", "Release"},
-        {"mod_GCCE_UDEB.KESTIX", true, "mod", "GCCE", "UDEB"},
-        {"a__b_c", true, "a", "b", "c"},
-        {"x_y__b_c", true, "x_y", "b", "c"},
-        {"_b_c", true, "", "b", "c"},
-        {"a_b_", true, "a", "b", ""},
-        {"a.kestix_b.kestix_c.kestix", true, "a", "b", "c"},
-        {"a_b.kestix", false, "", "2", "3"},
-        {"plain", false, "", "2", "3"},
-        {"", false, "", "2", "3"},
-    };
+    const std::tuple<const char *, bool, const char *, const char *, const char *> rows[]
+        = {{"my_mod_RVCT22arm9_Release.kestix", true, "my_mod", "RVCT22arm9", "Release"},
+           {"mod_GCCE_UDEB.KESTIX", true, "mod", "GCCE", "UDEB"},
+           {"a__b_c", true, "a", "b", "c"},
+           {"x_y__b_c", true, "x_y", "b", "c"},
+           {"_b_c", true, "", "b", "c"},
+           {"a_b_", true, "a", "b", ""},
+           {"a.kestix_b.kestix_c.kestix", true, "a", "b", "c"},
+           {"a_b.kestix", false, "", "2", "3"},
+           {"plain", false, "", "2", "3"},
+           {"", false, "", "2", "3"}};
     for (const auto &[package, split, first, middle, last] : rows) {
         // Too few parts leave the outputs as they were; callers pass first empty.
         QString parts[3] = {QString(), u"2"_s, u"3"_s};
@@ -295,17 +281,15 @@ TEST_F(TestDirectoriesTest, CacheAndResultsFoldersAreCreatedButNotTheirFiles)
 
 TEST_F(TestDirectoriesTest, TargetNameBecomesOneFolderBelowTargets)
 {
-    const std::pair<const char *, const char *> rows[] = {
-        {"My Phone:1", "My%20Phone%3A1"},
-        {"a/b\\c", "a%2Fb%5Cc"},
-        {"Az09-._~", "Az09-._~"},
-        {"100%", "100%25"},
-        {"..", "%2E%2E"},
-        {".", "%2E"},
-        {"a..b", "a..b"},
-        {"T\xc3\xa9l\xc3\xa9phone", "T%E9l%E9phone"},
-        {"\xe9\x9b\xbb\xe8\xa9\xb1", "%E9%9B%BB%E8%A9%B1"},
-    };
+    const std::pair<const char *, const char *> rows[] = {{"My Phone:1", "My%20Phone%3A1"},
+                                                          {"a/b\\c", "a%2Fb%5Cc"},
+                                                          {"Az09-._~", "Az09-._~"},
+                                                          {"100%", "100%25"},
+                                                          {"..", "%2E%2E"},
+                                                          {".", "%2E"},
+                                                          {"a..b", "a..b"},
+                                                          {"T\xc3\xa9l\xc3\xa9phone", "T%E9l%E9phone"},
+                                                          {"\xe9\x9b\xbb\xe8\xa9\xb1", "%E9%9B%BB%E8%A9%B1"}};
     const QString targets = base + u"/Norvane/Targets"_s;
     for (const auto &[target, folder] : rows) {
         const QString directory = TestDirectories::GetTargetDirectory(QString::fromUtf8(target));
@@ -357,9 +341,7 @@ TEST_F(TestDirectoriesTest, GenerateProPlatformMatchesNameThenDefault)
 
 TEST_F(TestDirectoriesTest, ResolveXmlPathSearchOrder)
 {
-    const QString work = temp.path() + u"/work"_s;
-    const QString home = temp.path() + u"/home"_s;
-    const QString pack = temp.path() + u"/pack"_s;
+    const QString work = temp.path() + u"/work"_s, home = temp.path() + u"/home"_s, pack = temp.path() + u"/pack"_s;
     for (const QString &file : {work + u"/here.xml"_s, home + u"/athome.xml"_s, pack + u"/device.xml"_s,
                                 pack + u"/beside.xml"_s, pack + u"/sub/deep.xml"_s, pack + u"/flat.xml"_s})
         testutil::WriteFile(file, "<a/>");
@@ -397,22 +379,21 @@ TEST_F(TestDirectoriesTest, AssociatedExecutableIsNamedByTheShebangThenTheSuffix
         executable(bin + u'/' + QString::fromLatin1(program));
     env.Set("PATH", bin);
     const QString own = executable(temp.path() + u"/tools/interp"_s);
-    const std::tuple<const char *, QByteArray, QString> rows[] = {
-        {"a", "#!/usr/bin/env perl\nprint;\n", bin + u"/perl"_s},
-        {"b.txt", "#! /usr/bin/env -S python3 -u\n", bin + u"/python3"_s},
-        {"c.pl", "#!/bin/sh\necho\n", u"/bin/sh"_s},
-        {"d", "#!perl -w\r\n", bin + u"/perl"_s},
-        {"e", "#!" + own.toUtf8() + " --x\n", own},
-        {"PostProcess3.pl", "print 1;\n", bin + u"/perl"_s},
-        {"Tool.PL", "", bin + u"/perl"_s},
-        {"x.py", "print(1)\n", bin + u"/python3"_s},
-        {"x.sh", "echo\n", bin + u"/sh"_s},
-        // A "#!" naming an interpreter that is not there falls back to the suffix.
-        {"y.pl", "#!/no/such/perl\n", bin + u"/perl"_s},
-        {"notes.txt", "hello\n", QString()},
-        {"noext", "", QString()},
-        {"z", "#!/usr/bin/env\n", QString()},
-    };
+    const std::tuple<const char *, QByteArray, QString> rows[]
+        = {{"a", "#!/usr/bin/env perl\nprint;\n", bin + u"/perl"_s},
+           {"b.txt", "#! /usr/bin/env -S python3 -u\n", bin + u"/python3"_s},
+           {"c.pl", "#!/bin/sh\necho\n", u"/bin/sh"_s},
+           {"d", "#!perl -w\r\n", bin + u"/perl"_s},
+           {"e", "#!" + own.toUtf8() + " --x\n", own},
+           {"PostProcess3.pl", "print 1;\n", bin + u"/perl"_s},
+           {"Tool.PL", "", bin + u"/perl"_s},
+           {"x.py", "print(1)\n", bin + u"/python3"_s},
+           {"x.sh", "echo\n", bin + u"/sh"_s},
+           // A "#!" naming an interpreter that is not there falls back to the suffix.
+           {"y.pl", "#!/no/such/perl\n", bin + u"/perl"_s},
+           {"notes.txt", "hello\n", QString()},
+           {"noext", "", QString()},
+           {"z", "#!/usr/bin/env\n", QString()}};
     for (const auto &[name, content, found] : rows)
         EXPECT_EQ(FindAssociatedExecutable(script(QString::fromLatin1(name), content)), found) << name;
     EXPECT_EQ(FindAssociatedExecutable(temp.path() + u"/missing.pl"_s), QString());
@@ -440,8 +421,7 @@ protected:
         return path;
     }
 
-    // Flattens from another current directory, so that includes can only be
-    // found beside the device pack.
+    // Flattens from another current directory, so that includes can only be found beside the device pack.
     QByteArray Flatten(const QString &source)
     {
         testutil::CurrentDirectory cd(temp.path());
@@ -452,8 +432,7 @@ protected:
     // xmllint's verdict on the flattened file, when it is installed.
     void ExpectWellFormed() { testutil::ExpectXmllintAccepts(output); }
 
-    QString pack;
-    QString output;
+    QString pack, output;
 };
 
 TEST_F(FlattenDeviceXmlTest, ExpandsIncludesAndMergesSections)
@@ -496,8 +475,7 @@ TEST_F(FlattenDeviceXmlTest, ExpandsIncludesAndMergesSections)
          "<pack><a>&gone;</a><b>x&broken;y</b>&good;</pack>\n",
          "<?xml version='1.0'?>\n<!DOCTYPE pack [\n<!ENTITY broken SYSTEM \"broken.xml\">\n"
          "<!ENTITY gone SYSTEM \"gone.xml\">\n<!ENTITY good SYSTEM \"good.xml\">\n]>\n"
-         "<pack>\n <a>&gone;</a>\n <b>x&broken;y</b>\n <good/>\n</pack>\n"},
-    };
+         "<pack>\n <a>&gone;</a>\n <b>x&broken;y</b>\n <good/>\n</pack>\n"}};
     for (const auto &[what, includes, source, expected] : rows) {
         SCOPED_TRACE(what);
         for (const auto &[name, bytes] : includes)
@@ -549,8 +527,7 @@ TEST_F(FlattenDeviceXmlTest, PacksInOtherEncodingsAreExpandedToo)
 
 TEST_F(FlattenDeviceXmlTest, FailsWithoutWritingOnBadSourceOrDestinationAndReadsRelativeSources)
 {
-    const QString good = Write(u"good.xml"_s, "<pack/>");
-    const QString bad = Write(u"bad.xml"_s, "<pack><open></pack>");
+    const QString good = Write(u"good.xml"_s, "<pack/>"), bad = Write(u"bad.xml"_s, "<pack><open></pack>");
     EXPECT_FALSE(FlattenDeviceXml(pack + u"/missing.xml"_s, output));
     EXPECT_FALSE(FlattenDeviceXml(u"missing-relative.xml"_s, output));
     EXPECT_FALSE(FlattenDeviceXml(bad, output));

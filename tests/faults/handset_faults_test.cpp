@@ -1,7 +1,6 @@
-// Faults met during whole runs on the emulated handset: the handset dropping
-// out at every step of a module's run, logs that never end or are huge,
-// packages whose module information is damaged, and host files (processed
-// results, catalogue cache) that cannot be written.
+// Faults met during whole runs on the emulated handset: the handset dropping out at every step of a module's run, logs
+// that never end or are huge, packages whose module information is damaged, and host files (processed results,
+// catalogue cache) that cannot be written.
 //
 // In every case the run must end (quickly, with the instant clock), report
 // what happened, and keep every verdict recorded before.
@@ -82,9 +81,8 @@ const QMap<QString, QString> kAllRecorded{{u"Audio/play"_s, u"pass"_s},
                                           {u"Video/show"_s, u"pass"_s},
                                           {u"Video/seek"_s, u"fail"_s}};
 
-// The step of a module's run at which the handset was lost, told from the
-// messages of one run; empty when it was not lost. Each step's message
-// follows those of the steps before it.
+// The step of a module's run at which the handset was lost, told from the messages of one run; empty when it was not
+// lost. Each step's message follows those of the steps before it.
 QString LostAt(const QString &log)
 {
     const QPair<QString, QString> steps[] = {
@@ -122,8 +120,7 @@ TEST_F(HandsetFaultTest, HandsetLostAtAnyStepEndsTheRunAndKeepsRecordedVerdicts)
         testutil::CapturedLog log;
         const bool result = RunModules({u"Video"_s}, log.log());
         completed = !QFileInfo::exists(InHandset(u"offline"_s));
-        // Wherever it was lost, the run says so and fails; the results file
-        // stays whole and no verdict is lost.
+        // Wherever it was lost, the run says so and fails; the results file stays whole and no verdict is lost.
         EXPECT_EQ(result, completed) << log.Text().toStdString();
         if (!completed)
             steps.insert(LostAt(log.Text()));
@@ -169,8 +166,7 @@ TEST_F(HandsetFaultTest, HugeLogIsCopiedParsedAndRecorded)
 
 TEST_F(HandsetFaultTest, ModuleWithDamagedInformationFileFailsToStartAndTheRunGoesOn)
 {
-    // Packages holding a truncated module information file, or bytes that are
-    // none at all, in place of their own.
+    // Packages holding a truncated module information file, or bytes that are none at all, in place of their own.
     unsigned int classId = 0x01230005;
     for (const QString &name : {u"Truncated"_s, u"Garbage"_s}) {
         const kitbuilder::Module broken = CtfModule(name, classId++, {u"a"_s, u"b"_s});

@@ -1,6 +1,5 @@
-// Files found by the fuzz targets (fuzz/) that once made a reader or a
-// writer misbehave, kept under tests/data/<format>/ and replayed here the way
-// the target used them.
+// Files found by the fuzz targets (fuzz/) that once made a reader or a writer misbehave, kept under
+// tests/data/<format>/ and replayed here the way the target used them.
 
 #include "catalogue/manifest.h"
 #include "catalogue/testmodule.h"
@@ -13,10 +12,9 @@
 
 using namespace Qt::StringLiterals;
 
-// A cached catalogue written and read back keeps every module, and from the
-// second write on its bytes no longer change, so a catalogue never drifts from
-// run to run. Properties without values are written as an empty list once
-// and then no more.
+// A cached catalogue written and read back keeps every module, and from the second write on its bytes no longer change,
+// so a catalogue never drifts from run to run. Properties without values are written as an empty list once and then no
+// more.
 TEST(HostileManifest, ProgramWhosePropertiesHaveNoValuesSettlesAfterOneWrite)
 {
     QTemporaryDir dir;

@@ -10,7 +10,6 @@
 #include "support/testutil.h"
 
 #include <QDir>
-#include <QDirIterator>
 #include <QFile>
 #include <QFileInfo>
 
@@ -28,21 +27,10 @@ namespace {
 
 using testutil::HandsetFixture;
 using testutil::ModuleSpec;
+using testutil::Tree;
 
 constexpr unsigned int kClass = 0x01020304;
 constexpr unsigned int kApplet = 0x0103abcd;
-
-// Every file and folder below a folder, relative, sorted.
-QStringList Tree(const QString &folder)
-{
-    QStringList entries;
-    QDirIterator it(folder, QDir::AllEntries | QDir::NoDotAndDotDot | QDir::Hidden | QDir::System,
-                    QDirIterator::Subdirectories);
-    while (it.hasNext())
-        entries.append(QDir(folder).relativeFilePath(it.next()));
-    entries.sort();
-    return entries;
-}
 
 QStringList FileNames(const QSharedPointer<_DirectoryInfo> &info)
 {
@@ -77,8 +65,7 @@ protected:
 
     HandsetFixture fixture;
     Log log;
-    QString folder;
-    QString outside;
+    QString folder, outside;
     HandsetFixture::Device device;
     ModuleSpec layout;
 };
@@ -232,8 +219,7 @@ const FailureCase kFailures[] = {
     Case("ExistsThroughLink", kBadPath,
          [](D d, Work) { return ErrorOf(d, d.FileExists(u"fs:/usermods/escape/keep.txt"_s)); }),
     Case("InstallEmptyArchive", kBadPackage, [](D d, Work w) { return d.InstallPackage(w + u"/empty.kestix"_s); }),
-    Case("InstallNotATar", kBadPackage, [](D d, Work w) { return d.InstallPackage(w + u"/outside/keep.txt"_s); }),
-};
+    Case("InstallNotATar", kBadPackage, [](D d, Work w) { return d.InstallPackage(w + u"/outside/keep.txt"_s); })};
 
 INSTANTIATE_TEST_SUITE_P(Operations, EmulatedHandsetFailure, ::testing::ValuesIn(kFailures),
                          [](const auto &info) { return std::string(info.param.what); });
@@ -296,8 +282,7 @@ using PackageTest = EmulatedHandsetTest;
 
 TEST_F(PackageTest, InstalledModuleIsFoundByClassAndAppletAndByItsClassDirectory)
 {
-    const QString package = fixture.MakePackage(u"ctfmod.kestix"_s, layout);
-    ASSERT_EQ(device->InstallPackage(package), 0u);
+    ASSERT_EQ(device->InstallPackage(fixture.MakePackage(u"ctfmod.kestix"_s, layout)), 0u);
     EXPECT_EQ(testutil::ReadFile(Host("fs:/usermods/ctfmod/data/table.txt")), QByteArray("rows"));
 
     QString directory;
@@ -405,11 +390,10 @@ TEST_F(PackageTest, DamagedPackageIsRefusedWithItsReasonAndInstallsNothing)
     const QString package = fixture.MakePackage(
         u"p.kestix"_s, testutil::Members{{u"m/a.txt"_s, "a"}, {u"m/big.bin"_s, QByteArray(4096, 'x')}});
     const QByteArray bytes = testutil::ReadFile(package);
-    const std::tuple<const char *, QByteArray, const char *> damaged[] = {
-        {"cut.kestix", bytes.left(512 + 512 + 512 + 1000), "unexpected end of archive at offset 2536"},
-        {"sum.kestix", bytes.left(1024) + "junk" + bytes.mid(1028), "checksum error at offset 1024"},
-        {"text.kestix", QByteArray("m/a.txt\n").repeated(100), "does not look like a tar archive"},
-    };
+    const std::tuple<const char *, QByteArray, const char *> damaged[]
+        = {{"cut.kestix", bytes.left(512 + 512 + 512 + 1000), "unexpected end of archive at offset 2536"},
+           {"sum.kestix", bytes.left(1024) + "junk" + bytes.mid(1028), "checksum error at offset 1024"},
+           {"text.kestix", QByteArray("m/a.txt\n").repeated(100), "does not look like a tar archive"}};
     for (const auto &[name, content, reason] : damaged) {
         const QString path = Work(name);
         testutil::WriteFile(path, content);
@@ -550,12 +534,10 @@ TEST_F(ConnectFactoryTest, ListsHandsetsSortedByNameIgnoringCaseWithTheirDescrip
 TEST_F(ConnectFactoryTest, ReadsPlatformAndVersionWithDefaults)
 {
     using P = IKestoDevice::Platform;
-    const std::tuple<QByteArray, P, const char *> rows[] = {
-        {"", P::PLATFORM_WIN32, ""},
-        {"platform=ARM\nversion=4.1.7\n", P::PLATFORM_ARM, "4.1.7"},
-        {"platform=z80\n", P::PLATFORM_UNKNOWN, ""},
-        {"platform=\nversion=\n", P::PLATFORM_WIN32, ""},
-    };
+    const std::tuple<QByteArray, P, const char *> rows[] = {{"", P::PLATFORM_WIN32, ""},
+                                                            {"platform=ARM\nversion=4.1.7\n", P::PLATFORM_ARM, "4.1.7"},
+                                                            {"platform=z80\n", P::PLATFORM_UNKNOWN, ""},
+                                                            {"platform=\nversion=\n", P::PLATFORM_WIN32, ""}};
     for (const auto &[text, platform, expectedVersion] : rows) {
         testutil::WriteFile(folder + u"/handset.ini"_s, text);
         auto device = fixture.Connect(u"phone"_s);

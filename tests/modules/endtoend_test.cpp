@@ -1,7 +1,6 @@
-// Every module kind run on an emulated handset through the controller's
-// order of calls: Run, IsLogComplete, CopyLog, RemoveTest, PostProcess,
-// ParseLog. The packages are built here; their behaviour scripts write logs
-// in the kind's format, as a real test would on a handset.
+// Every module kind run on an emulated handset through the controller's order of calls: Run, IsLogComplete, CopyLog,
+// RemoveTest, PostProcess, ParseLog. The packages are built here; their behaviour scripts write logs in the kind's
+// format, as a real test would on a handset.
 
 #include "moduletest.h"
 
@@ -59,8 +58,7 @@ protected:
         module.PostProcess(env);
     }
 
-    // The verdicts of the module's copied logs, which must name manifestName
-    // and be complete.
+    // The verdicts of the module's copied logs, which must name manifestName and be complete.
     Pairs Verdicts(_TestModule &module, const QString &manifestName)
     {
         TestResults results;
@@ -229,8 +227,7 @@ TEST_F(EndToEnd, SecondaryModulesAreInstalledAndRemovedWithTheirUser)
 
 TEST_F(EndToEnd, PackagesAreFoundUnderEveryNameTheKitUses)
 {
-    // A CTF package named with the "ctf" prefix, holding another module's
-    // information file first.
+    // A CTF package named with the "ctf" prefix, holding another module's information file first.
     testutil::ModuleSpec other;
     other.directory = u"other"_s;
     other.programs = {{u"Other_k"_s, QString(), 0x0102FAF7}};
@@ -254,8 +251,7 @@ TEST_F(EndToEnd, PackagesAreFoundUnderEveryNameTheKitUses)
     EXPECT_FALSE(missing.ProcessPackage(folder));
     EXPECT_TRUE(missing.programs.isEmpty());
 
-    // An OAT package takes the name of its information file and the suite
-    // program records only.
+    // An OAT package takes the name of its information file and the suite program records only.
     testutil::ModuleSpec oatSpec;
     oatSpec.directory = u"oat/suites"_s;
     oatSpec.mifName = u"suites_oatnet.mif"_s;

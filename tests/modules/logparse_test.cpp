@@ -22,10 +22,9 @@ using LogFiles = moduletest::ModuleFolder;
 
 } // namespace
 
-// Each kind's own format: CTF pairs results with test names in either order,
-// the applet takes the first word of a test name and drops "_K" from the
-// suite, OAT maps status words and marks cases without one unexecuted, UT
-// reads the result table between its rules and drops the "UT" prefix.
+// Each kind's own format: CTF pairs results with test names in either order, the applet takes the first word of a test
+// name and drops "_K" from the suite, OAT maps status words and marks cases without one unexecuted, UT reads the result
+// table between its rules and drops the "UT" prefix.
 TEST_F(LogFiles, EachKindReadsItsHeaderAndPairsItsVerdicts)
 {
     CtfTestModule ctf;
@@ -50,12 +49,11 @@ TEST_F(LogFiles, EachKindReadsItsHeaderAndPairsItsVerdicts)
         {"t1", "unexecuted"}, {"t2", "pass"}, {"t3", "fail"}, {"t4", "unsupported"}, {"t5", "unexecuted"}};
     const Pairs utVerdicts{{"t1", "pass"}, {"t3", "fail"}, {"t4", "unsupported"}, {"t5", "unexecuted"}};
     // Module, log file, text; manifest name, ID hash, complete, time stamp, verdicts.
-    const std::tuple<_TestModule *, QString, QByteArray, QString, QString, bool, QDateTime, Pairs> rows[] = {
-        {&ctf, u"a.LOG"_s, ctfLog, u"B"_s, u"#123"_s, true, time, {{"t1", "pass"}, {"t2 with words", "failed"}}},
-        {&applet, u"s.log"_s, appletLog, u"foo"_s, QString(), false, time, {{"t1", "pass"}}},
-        {&oat, u"timer_u.OAT"_s, oatLog, u"OatTimer"_s, u"#9"_s, true, time, oatVerdicts},
-        {&ut, u"ut.TXT"_s, utLog, u"Timer"_s, u"#77"_s, true, time, utVerdicts},
-    };
+    const std::tuple<_TestModule *, QString, QByteArray, QString, QString, bool, QDateTime, Pairs> rows[]
+        = {{&ctf, u"a.LOG"_s, ctfLog, u"B"_s, u"#123"_s, true, time, {{"t1", "pass"}, {"t2 with words", "failed"}}},
+           {&applet, u"s.log"_s, appletLog, u"foo"_s, QString(), false, time, {{"t1", "pass"}}},
+           {&oat, u"timer_u.OAT"_s, oatLog, u"OatTimer"_s, u"#9"_s, true, time, oatVerdicts},
+           {&ut, u"ut.TXT"_s, utLog, u"Timer"_s, u"#77"_s, true, time, utVerdicts}};
     for (const auto &[module, file, text, name, idHash, complete, stamp, verdicts] : rows) {
         SCOPED_TRACE(file.toStdString());
         TestResults results;
@@ -128,18 +126,15 @@ TEST_F(LogFiles, BaseParseStopsAtTheFirstRecognisedLogAndSecondaryModulesParseNo
     EXPECT_FALSE(secondary.ParseLog(results));
 }
 
-// Whatever a handset leaves in a log file, the parsers return and keep what
-// they can read.
+// Whatever a handset leaves in a log file, the parsers return and keep what they can read.
 TEST_F(LogFiles, HostileBytesLeaveEveryParserStanding)
 {
-    const QByteArray rows[] = {
-        QByteArray(),
-        QByteArray("\0\0Test:\0x\0\n", 12),
-        QByteArray("\xff\xfe\xc3(\x80 Result:\xed\xa0\x80"),
-        QByteArray(3 * 1024 * 1024, 'A'),
-        QByteArray("@:::::\nStatus:\n----\n----\nSuiteName:\n"),
-        QByteArray("\r\r\r\n\n\rTime: 9999/99/99 99:99:99\nTimeStamp: x\n"),
-    };
+    const QByteArray rows[] = {QByteArray(),
+                               QByteArray("\0\0Test:\0x\0\n", 12),
+                               QByteArray("\xff\xfe\xc3(\x80 Result:\xed\xa0\x80"),
+                               QByteArray(3 * 1024 * 1024, 'A'),
+                               QByteArray("@:::::\nStatus:\n----\n----\nSuiteName:\n"),
+                               QByteArray("\r\r\r\n\n\rTime: 9999/99/99 99:99:99\nTimeStamp: x\n")};
     CtfTestModule ctf;
     CtfAppletTestModule applet;
     OatTestModule oat;

@@ -62,9 +62,8 @@ protected:
     Log log;
 };
 
-// A stand-in for the kit's post-processing script: it records its arguments
-// and working folder, prints on both channels and leaves "pp-<name>" for each
-// raw log in the temporary folder, headed by the device pack and platform.
+// A stand-in for the kit's post-processing script: it records its arguments and working folder, prints on both channels
+// and leaves "pp-<name>" for each raw log in the temporary folder, headed by the device pack and platform.
 inline const QByteArray kPostProcessScript = R"perl(use strict;
 use Cwd;
 my ($source, $temp, $pack, $platform) = @ARGV;

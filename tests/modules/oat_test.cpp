@@ -30,17 +30,13 @@ SysResource Program(const QByteArray &name)
     return program;
 }
 
-} // namespace
-
 TEST(OatNames, DerivesHandsetNamesFromTheModuleName)
 {
     // Module name, information file name; handset folder, information file, log base.
-    const char *rows[][5] = {
-        {"OatTimer", "", "oattimer", "oattimer.mif", "fs:/shared/pek/log/timer"},
-        {"Timer", "", "oattimer", "oattimer.mif", "fs:/shared/pek/log/timer"},
-        {"OATNet", "Net_Suite.mif", "oatnet", "Net_Suite.mif", "fs:/shared/pek/log/net"},
-        {"", "", "oat", "oat.mif", "fs:/shared/pek/log/"},
-    };
+    const char *rows[][5] = {{"OatTimer", "", "oattimer", "oattimer.mif", "fs:/shared/pek/log/timer"},
+                             {"Timer", "", "oattimer", "oattimer.mif", "fs:/shared/pek/log/timer"},
+                             {"OATNet", "Net_Suite.mif", "oatnet", "Net_Suite.mif", "fs:/shared/pek/log/net"},
+                             {"", "", "oat", "oat.mif", "fs:/shared/pek/log/"}};
     for (const auto &row : rows) {
         SCOPED_TRACE(row[0]);
         OatTestModule module;
@@ -51,8 +47,6 @@ TEST(OatNames, DerivesHandsetNamesFromTheModuleName)
         EXPECT_EQ(module.LogBasePath(), QLatin1String(row[4]));
     }
 }
-
-namespace {
 
 class OatRun : public moduletest::ModuleFolder
 {
@@ -82,8 +76,6 @@ protected:
     NiceMock<MockDevice> device;
     QMap<QString, QString> env;
 };
-
-} // namespace
 
 TEST_F(OatRun, ArgumentsNameTheModeTheProgramAndTheCases)
 {
@@ -163,8 +155,6 @@ TEST_F(OatRun, FrameworkIsLoadedUsesTheFixedClassIdAndUnloadRemovesEveryOatFolde
     framework.Unload(&device, env);
 }
 
-namespace {
-
 class OatPostProcess : public moduletest::ModuleFolder
 {
 protected:
@@ -188,14 +178,10 @@ protected:
                {u"DSOCacheFilePath"_s, u"/cache/dp.dso"_s},
                {u"Platform"_s, u"/sdk/pvs/platform"_s}};
     }
-    QString perlCache;
-    QString logs;
-    QString raw;
+    QString perlCache, logs, raw;
     OatTestModule module;
     QMap<QString, QString> env;
 };
-
-} // namespace
 
 TEST_F(OatPostProcess, RunsTheScriptAndCollectsItsOutput)
 {
@@ -229,12 +215,10 @@ TEST_F(OatPostProcess, FrameworkPostProcessCoversTheWholeRawFolder)
 
 TEST_F(OatPostProcess, MissingEntryStopsWithItsMessageAndKeepsTheRawLogs)
 {
-    const char *rows[][2] = {
-        {"OatRawLogPath", "OatTestModule::PostProcess missing oat source log directory"},
-        {"LogPath", "OatTestModule::PostProcess missing destination log directory"},
-        {"DSOCacheFilePath", "OatTestModule::PostProcess missing devicePack file."},
-        {"Platform", "OatTestModule::PostProcess missing platform directory."},
-    };
+    const char *rows[][2] = {{"OatRawLogPath", "OatTestModule::PostProcess missing oat source log directory"},
+                             {"LogPath", "OatTestModule::PostProcess missing destination log directory"},
+                             {"DSOCacheFilePath", "OatTestModule::PostProcess missing devicePack file."},
+                             {"Platform", "OatTestModule::PostProcess missing platform directory."}};
     for (const auto &[key, message] : rows) {
         QMap<QString, QString> partial = env;
         partial.remove(QLatin1String(key));
@@ -258,3 +242,5 @@ TEST_F(OatPostProcess, WithoutScriptOrPerlOnlyStamps)
     module.PostProcess(env);
     EXPECT_TRUE(LogText().contains(u" Post Processing Failed.  A Perl Instance can not be found."_s));
 }
+
+} // namespace

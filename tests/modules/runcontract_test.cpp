@@ -1,6 +1,5 @@
-// The run-time behaviour the kinds share and the parts of each kind that a
-// real handset cannot provoke (failing copies, modules that never stop, logs
-// that never complete), driven through a mock handset.
+// The run-time behaviour the kinds share and the parts of each kind that a real handset cannot provoke (failing copies,
+// modules that never stop, logs that never complete), driven through a mock handset.
 
 #include "moduletest.h"
 
@@ -155,17 +154,15 @@ TEST_F(RunContract, EachKindStampsItsHeaderAtItsAnchorAndKeepsTheBytes)
     UTTestModule ut;
     const QByteArray header = "GUID:{run-1}\nManifest Name:Timer\nID Hash:#5\n";
     const QByteArray latin = "Suite: caf\xe9\r\n";
-    // Module, log file, its text, and the text once stamped: CTF after the
-    // suite line or at the end, OAT before the last module version line ahead
-    // of any header, UT text after the first line. No Perl cache: OAT logs are
-    // only stamped.
-    const std::tuple<_TestModule *, QString, QByteArray, QByteArray> rows[] = {
-        {&ctf, u"a.log"_s, latin + "Test: t1\nTest: t2\n", latin + header + "Test: t1\nTest: t2\n\n"},
-        {&ctf, u"b.log"_s, "no anchor", "no anchor\n" + header},
-        {&oat, u"t.oat"_s, "@Timer\nModuleVer: 1\nModuleVer: 2\nGUID:old\nModuleVer: 3\n",
-         "@Timer\nModuleVer: 1\n" + header + "ModuleVer: 2\nGUID:old\nModuleVer: 3\n\n"},
-        {&ut, u"r.TXT"_s, "first\nsecond\n", "first\n" + header + "second\n\n"},
-    };
+    // Module, log file, its text, and the text once stamped: CTF after the suite line or at the end, OAT before the
+    // last module version line ahead of any header, UT text after the first line. No Perl cache: OAT logs are only
+    // stamped.
+    const std::tuple<_TestModule *, QString, QByteArray, QByteArray> rows[]
+        = {{&ctf, u"a.log"_s, latin + "Test: t1\nTest: t2\n", latin + header + "Test: t1\nTest: t2\n\n"},
+           {&ctf, u"b.log"_s, "no anchor", "no anchor\n" + header},
+           {&oat, u"t.oat"_s, "@Timer\nModuleVer: 1\nModuleVer: 2\nGUID:old\nModuleVer: 3\n",
+            "@Timer\nModuleVer: 1\n" + header + "ModuleVer: 2\nGUID:old\nModuleVer: 3\n\n"},
+           {&ut, u"r.TXT"_s, "first\nsecond\n", "first\n" + header + "second\n\n"}};
     for (const auto &[module, file, text, stamped] : rows) {
         module->moduleName = u"Timer"_s;
         module->idHash = u"#5"_s;
@@ -188,8 +185,7 @@ TEST_F(RunContract, EachKindStampsItsHeaderAtItsAnchorAndKeepsTheBytes)
     EXPECT_EQ(root.firstChildElement().attribute(u"name"_s), u"t1"_s);
     EXPECT_EQ(testutil::ReadFile(dir.filePath(u"bad.xml"_s)), QByteArray("<TestRunLog>"));
 
-    // A second stamping finds the first header and appends another at the
-    // end; the parser reads the header back.
+    // A second stamping finds the first header and appends another at the end; the parser reads the header back.
     ctf.PostProcess(env);
     const QByteArray twice = testutil::ReadFile(dir.filePath(u"a.log"_s));
     EXPECT_EQ(twice.count("GUID:{run-1}"), 2);

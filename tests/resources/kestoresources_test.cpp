@@ -46,16 +46,13 @@ TEST(KestoResources, StoresStringsWithTheirMark)
     using Getter = QString (KestoResources::*)();
     const struct
     {
-        quint16 id;
-        quint16 format;
+        quint16 id, format;
         QString text;
         const char *block;
         Getter getter;
-    } rows[] = {
-        {6, 0, u"AB"_s, "FFFE41004200", &KestoResources::GetCompanyName},
-        {8, 6, u"1.0"_s, "02312E30", &KestoResources::GetApplicationVersion},
-        {7, 1, u"\u00a9 K"_s, "03A9204B", &KestoResources::GetCopyright},
-    };
+    } rows[] = {{6, 0, u"AB"_s, "FFFE41004200", &KestoResources::GetCompanyName},
+                {8, 6, u"1.0"_s, "02312E30", &KestoResources::GetApplicationVersion},
+                {7, 1, u"\u00a9 K"_s, "03A9204B", &KestoResources::GetCopyright}};
     KestoResources resources;
     for (const auto &row : rows) {
         ASSERT_TRUE(resources.AddString(1, row.id, row.format, row.text));
@@ -91,9 +88,8 @@ class KestoString : public ::testing::TestWithParam<StringCase>
 {
 };
 
-// A string read back is the string that was stored, in every format: the mark
-// is not decoded as text and the last character is not lost. Text encoded by
-// iconv, not by our converters, reads back too.
+// A string read back is the string that was stored, in every format: the mark is not decoded as text and the last
+// character is not lost. Text encoded by iconv, not by our converters, reads back too.
 TEST_P(KestoString, ReadsBackTheStoredText)
 {
     const StringCase &c = GetParam();

@@ -25,8 +25,7 @@ using resourcebytes::U32s;
 // {type, first ID, additional IDs, offset index}
 using MapEntry = std::array<quint16, 4>;
 
-// A resource file put together by hand: the header's resource count as given,
-// the map entries and the offsets as given.
+// A resource file put together by hand: the header's resource count as given, the map entries and the offsets as given.
 QByteArray Compose(const QVector<MapEntry> &map, const QVector<quint32> &offsets, const QByteArray &data,
                    quint32 resourceCount)
 {
@@ -228,19 +227,17 @@ TEST(ResourceStream, At65535PairsSavesAndOneMoreIsRefused)
     EXPECT_EQ(more, QByteArray("keep"));
 }
 
-// Corrupt input, every prefix of a valid file among it, is refused and
-// leaves the stream as it was.
+// Corrupt input, every prefix of a valid file among it, is refused and leaves the stream as it was.
 TEST(ResourceStream, CorruptInputIsRefusedAndChangesNothing)
 {
-    QList<QPair<QString, QByteArray>> inputs = {
-        {u"HugeResourceCount"_s, Compose({}, {}, QByteArray(), 0xFFFFFFFFu)},
-        {u"MapCountPastInput"_s, Compose({{1, 1, 0, 0}}, {48, 49}, "x", 1).left(40)},
-        {u"OffsetsRunBackwards"_s, Compose({{1, 1, 0, 0}, {1, 2, 0, 1}}, {60, 62, 61}, "xy", 2)},
-        {u"OffsetPastInput"_s, Compose({{1, 1, 0, 0}}, {48, 4000}, "x", 1)},
-        {u"OffsetIndexPastBlocks"_s, Compose({{1, 1, 0, 1}}, {48, 49}, "x", 1)},
-        {u"RangePastBlocks"_s, Compose({{5, 10, 3, 0}}, {52, 53, 55, 58}, "ABBCCC", 3)},
-        {u"RangesCoverMoreIdsThanInputBytes"_s, ManyRanges(123)},
-    };
+    QList<QPair<QString, QByteArray>> inputs
+        = {{u"HugeResourceCount"_s, Compose({}, {}, QByteArray(), 0xFFFFFFFFu)},
+           {u"MapCountPastInput"_s, Compose({{1, 1, 0, 0}}, {48, 49}, "x", 1).left(40)},
+           {u"OffsetsRunBackwards"_s, Compose({{1, 1, 0, 0}, {1, 2, 0, 1}}, {60, 62, 61}, "xy", 2)},
+           {u"OffsetPastInput"_s, Compose({{1, 1, 0, 0}}, {48, 4000}, "x", 1)},
+           {u"OffsetIndexPastBlocks"_s, Compose({{1, 1, 0, 1}}, {48, 49}, "x", 1)},
+           {u"RangePastBlocks"_s, Compose({{5, 10, 3, 0}}, {52, 53, 55, 58}, "ABBCCC", 3)},
+           {u"RangesCoverMoreIdsThanInputBytes"_s, ManyRanges(123)}};
     const QByteArray file = RichFile();
     for (int length = 0; length < file.size(); ++length)
         inputs.append({u"the first %1 bytes"_s.arg(length), file.left(length)});

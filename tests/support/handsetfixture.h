@@ -63,8 +63,7 @@ public:
         void operator()(IKestoDevice *device) const;
     };
     using Device = std::unique_ptr<IKestoDevice, Disconnect>;
-    // ConnectFactory::ConnectToTarget to the handset of that name (null when
-    // it refuses), reporting to log.
+    // ConnectFactory::ConnectToTarget to the handset of that name (null when it refuses), reporting to log.
     Device Connect(const QString &name, Log *log = nullptr) const;
 
 private:

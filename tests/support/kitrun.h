@@ -83,8 +83,7 @@ public:
     Harness &NewHarness(const QString &handset, Log *log = nullptr);
     // Every module of the kit (and platform) the filter selects.
     QList<QSharedPointer<_TestModule>> Select(const QString &filter = QStringLiteral("*"));
-    // Queues the modules of those names (each must exist once), runs them and
-    // disconnects; the result of Harness::Run.
+    // Queues the modules of those names (each must exist once), runs them and disconnects; the result of Harness::Run.
     bool RunModules(Harness &harness, const QStringList &names);
 
     Log *log() { return m_log.log(); }
@@ -104,14 +103,11 @@ private:
     std::vector<std::unique_ptr<Harness>> m_harnesses;
 };
 
-// Adds CTF modules "Ctf00", "Ctf01", ... and CTF applet modules "App00", ...
-// with their frameworks to kit; returns the module names. Each behaviour
-// sleeps `seconds` (a text for sleep(1)), reports test case "first" passed
-// and "second" passed, failed or unsupported for module i modulo 3 equal to
-// 0, 1 or 2, and appends "start <module> <handset>" and, once its log is
-// written, "done <module> <handset>" to runs.txt in the handsets folder. A
-// handset folder holding "drop-at" (a number n) goes offline in the n-th
-// module it starts, before that module writes its log.
+// Adds CTF modules "Ctf00", "Ctf01", ... and CTF applet modules "App00", ... with their frameworks to kit; returns the
+// module names. Each behaviour sleeps `seconds` (a text for sleep(1)), reports test case "first" passed and "second"
+// passed, failed or unsupported for module i modulo 3 equal to 0, 1 or 2, and appends "start <module> <handset>" and,
+// once its log is written, "done <module> <handset>" to runs.txt in the handsets folder. A handset folder holding
+// "drop-at" (a number n) goes offline in the n-th module it starts, before that module writes its log.
 QStringList AddShardModules(kitbuilder::KitBuilder &kit, int ctfModules, int appletModules, const QString &seconds);
 
 } // namespace testutil

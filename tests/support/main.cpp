@@ -5,9 +5,8 @@
 
 #include <gtest/gtest.h>
 
-// Every test program starts with a private data root and an instant clock, so
-// that no test touches the user's folders or waits for real time to pass.
-// Tests that need other values set them themselves.
+// Every test program starts with a private data root and an instant clock, so that no test touches the user's folders
+// or waits for real time to pass. Tests that need other values set them themselves.
 int main(int argc, char **argv)
 {
     QCoreApplication app(argc, argv);

@@ -4,9 +4,8 @@
 
 #include <gmock/gmock.h>
 
-// A handset whose every operation is a mock, for tests of call sequences and
-// of answers that the emulated handset cannot give (a module that runs for
-// ever, a failing copy).
+// A handset whose every operation is a mock, for tests of call sequences and of answers that the emulated handset
+// cannot give (a module that runs for ever, a failing copy).
 class MockDevice : public IKestoDevice
 {
 public:

@@ -48,6 +48,18 @@ private:
 void WriteFile(const QString &path, const QByteArray &bytes);
 QByteArray ReadFile(const QString &path);
 
+// Every file and folder below a folder, relative, sorted.
+QStringList Tree(const QString &folder);
+
+// The moduleName of each module of a list, in its order.
+template <typename Modules> QStringList ModuleNames(const Modules &modules)
+{
+    QStringList names;
+    for (const auto &module : modules)
+        names.append(module->moduleName);
+    return names;
+}
+
 // Runs a program to completion; returns its exit code (-1 when it could not
 // start). Standard output and error go to output when given.
 int RunProgram(const QString &program, const QStringList &arguments, QByteArray *output = nullptr,
@@ -56,20 +68,17 @@ int RunProgram(const QString &program, const QStringList &arguments, QByteArray 
 // True when a program of that name is on PATH.
 bool HaveProgram(const QString &program);
 
-// When the program is installed, runs it and expects exit status 0; its
-// output is shown on failure.
+// When the program is installed, runs it and expects exit status 0; its output is shown on failure.
 void ExpectProgramAccepts(const QString &program, const QStringList &arguments);
 
-// xmllint finds the file well formed (and valid against a schema of
-// tests/data when one is named).
+// xmllint finds the file well formed (and valid against a schema of tests/data when one is named).
 void ExpectXmllintAccepts(const QString &path, const QString &schema = QString());
 
 // The folder of data files committed under tests/data.
 QString DataPath(const QString &relative);
 
-// Points the library's data root and handset folder into root, makes every
-// wait instant and forgets the platforms, kits and tool set the user has, so
-// that a test or benchmark program touches none of the user's folders.
+// Points the library's data root and handset folder into root, makes every wait instant and forgets the platforms, kits
+// and tool set the user has, so that a test or benchmark program touches none of the user's folders.
 void IsolateEnvironment(const QTemporaryDir &root);
 
 } // namespace testutil
