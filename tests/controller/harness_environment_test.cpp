@@ -303,6 +303,12 @@ TEST_F(HarnessSetupTest, KitAndPlatformAreTheDefaultsTheFirstListedEntryNamedOrA
         EXPECT_EQ(EnvOf(harness).value(u"PerlCache"_s), TestDirectories::GetOatPerlScripts());
         EXPECT_EQ(log.Text(), u"KVK: %1Platform: %2"_s.arg(harness.GetTestkit(), harness.GetPlatform()));
     }
+    // The host's lists replace what they are given: the professional platforms, every kit.
+    QList<Platform> platforms(3);
+    QList<TestKit> kits(3);
+    EXPECT_EQ(Harness::ListPlatforms(platforms), 2u);
+    EXPECT_EQ(Harness::ListTestKits(kits), 3u);
+    EXPECT_EQ(platforms.at(0).name + u' ' + kits.at(0).name, u"Alpha KitOne"_s);
 }
 
 TEST_F(HarnessSetupTest, SettingUpAgainKeepsTheRunAndTheUnselectedKitUntilTheHostChoosesAKit)
