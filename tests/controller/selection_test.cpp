@@ -165,6 +165,16 @@ TEST_F(CatalogueSetupTest, StaleKitCacheIsRegeneratedAndTheDefaultDevicePackTake
     Modules more;
     EXPECT_EQ(again.GetTestModules(more, QStringList{u"audio"_s}, QString(), QString()), 1u);
     EXPECT_FALSE(second.Text().contains(u"Generating manifest"_s));
+
+    // A kit without modules still leaves the platform's to run.
+    ASSERT_TRUE(QDir().mkpath(m_run.Path(u"empty-kit"_s)));
+    Harness platformOnly;
+    platformOnly.SetLogger(second.log());
+    platformOnly.SetTestkit(m_run.Path(u"empty-kit"_s));
+    platformOnly.SetPlatform(PlatformSetting());
+    Modules shell;
+    EXPECT_EQ(platformOnly.GetTestModules(shell, QStringList(), QString(), QString()), 1u);
+    EXPECT_EQ(ModuleNames(shell), QStringList{u"Shell"_s});
 }
 
 TEST_F(CatalogueSetupTest, DevicePackGivenBeforehandIsKeptAndGenerateManifestWritesEachCatalogueToItsCache)

@@ -281,6 +281,7 @@ TEST(ResultsMergeTest, AModuleRunTwiceKeepsTheVerdictThatWins)
     selection[0]->testCases = {TestCase(u"x"_s, u"t"_s)};
     selection[1]->moduleName = u"M"_s;
     selection[1]->SetSource(u"KVK"_s);
+    selection.append(selection.at(1)); // selected twice, reported once
     merge.Expect(ResultsMerge::ExpectedOf(selection));
     const QList<ResultsMerge::Row> rows = merge.Rows();
     ASSERT_EQ(rows.size(), 2); // "Idle" ran nowhere and was not expected

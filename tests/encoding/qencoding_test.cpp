@@ -199,8 +199,11 @@ TEST(UnicodeToChar, WritesOneCodeOrRefuses)
     EXPECT_FALSE(Make(ENCODING_CP949)->UnicodeToChar(0xE000, bytes));
     EXPECT_EQ(QByteArray(bytes), " ");
     EncoderPtr utf8 = Make(ENCODING_UTF8);
-    ASSERT_TRUE(utf8->UnicodeToChar(0x10FFFF, bytes));
-    EXPECT_EQ(QByteArray(bytes), Bytes({0xF4, 0x8F, 0xBF, 0xBF}));
+    for (const auto &[unit, hex] :
+         {std::pair<unsigned int, const char *>{0x1F600, "f09f9880"}, {0x10FFFF, "f48fbfbf"}}) {
+        ASSERT_TRUE(utf8->UnicodeToChar(unit, bytes));
+        EXPECT_EQ(QByteArray(bytes).toHex(), hex);
+    }
     EXPECT_FALSE(utf8->UnicodeToChar(0x110000, bytes));
 }
 
