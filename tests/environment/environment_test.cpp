@@ -208,7 +208,8 @@ TEST(TestKitNames, DefaultTestKitNameIsTheLastComponentAndTypesHaveNames)
 {
     testutil::EnvGuard env;
     const std::pair<const char *, const char *> cases[]
-        = {{"", ""}, {"kit", "kit"}, {"/a/b/kit", "kit"}, {"C:\\a\\kit", "kit"}, {"a\\kit/x", "kit/x"}, {"/a/b/", ""}};
+        = {{"", ""},      {"kit", "kit"}, {"/a/b/kit", "kit"}, {"C:\\a\\kit", "kit"}, {"a\\kit/x", "kit/x"},
+           {"/a/b/", ""}, {"/kit", "kit"}};
     for (const auto &[setting, name] : cases) {
         env.Set("KESTIX_TESTSET", QString::fromUtf8(setting));
         EXPECT_EQ(GetDefaultTestKitName(), QString::fromUtf8(name)) << setting;
@@ -453,9 +454,9 @@ TEST_F(FlattenDeviceXmlTest, ExpandsIncludesAndMergesSections)
         {"MergesSectionsOfTheSameNameInDocumentOrder",
          {{u"more.xml"_s, "<x><display><mode n=\"3\"/></display></x>"}},
          "<?xml version=\"1.0\"?>\n<!DOCTYPE pack [<!ENTITY more SYSTEM \"more.xml\">]>\n<pack>\n"
-         "  <display a=\"first\"><mode n=\"1\"/>text</display>\n  <keys><k/></keys>\n"
+         "  <display a=\"first\"><mode n=\"1\"/>t&amp;t</display>\n  <keys><k/></keys>\n"
          "  <display a=\"second\"><mode n=\"2\"/><!--c--></display>\n  &more;\n  <keys/>\n</pack>\n",
-         "<?xml version='1.0'?>\n<pack>\n <display a=\"first\">\n  <mode n=\"1\"/>text<mode n=\"2\"/>\n"
+         "<?xml version='1.0'?>\n<pack>\n <display a=\"first\">\n  <mode n=\"1\"/>t&amp;t<mode n=\"2\"/>\n"
          "  <!--c-->\n  <mode n=\"3\"/>\n </display>\n <keys>\n  <k/>\n </keys>\n</pack>\n"},
         // Without an XML declaration the doctype stays.
         {"PackWithoutXmlDeclarationKeepsItsDoctype",
