@@ -27,7 +27,7 @@ TEST_F(InspectTool, CompiledSourceListsDecodedStringsObjectsAndClassIds)
     const QString source = u"<resources>\n"
                            " <string id=\"1\" format=\"UTF-8\">Gr\u00fc\u00dfe</string>\n"
                            " <string id=\"7\" format=\"GB2312\">\u4e2d\u6587</string>\n"
-                           " <object id=\"2\" mime=\"text/plain\">abc</object>\n"
+                           " <object id=\"65535\" mime=\"text/plain\">abc</object>\n"
                            " <binary type=\"0x5000\" id=\"0\" hex=\"%1\"/>\n"
                            " <binary type=\"0x5000\" id=\"1\" hex=\"78563412 efbeadde 00000000 11111111\"/>\n"
                            "</resources>\n"_s;

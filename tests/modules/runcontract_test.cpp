@@ -206,7 +206,13 @@ TEST_F(RunContract, LogWaitsGiveUpWhenTheEndMarkerNeverComes)
         .WillRepeatedly(Invoke([&copies](const QString &, const QString &host) {
             return CopiesContent(QByteArray(++copies, 'x'))(QString(), host);
         }));
+    testing::internal::CaptureStdout();
     EXPECT_FALSE(ctf.IsLogComplete(&device));
+    // A dot whenever the log grew, forty to a line.
+    const QList<QByteArray> lines = QByteArray::fromStdString(testing::internal::GetCapturedStdout()).split('\n');
+    ASSERT_GT(lines.size(), 2);
+    EXPECT_EQ(lines.at(0), QByteArray(39, '.'));
+    EXPECT_EQ(lines.at(1), "   " + QByteArray(40, '.'));
     // Delays of 100, 200, ... 2000 ms, then 2000 ms each, until ten minutes.
     EXPECT_GT(copies, 300);
     EXPECT_LT(copies, 330);

@@ -150,7 +150,7 @@ TEST(SysResource, DecodesEachKindOfRecordInsideItsBlock)
         SysBlock(8, 0x0102C305, QByteArray("other\0\0\0", 8), {1, 2, 3, 4, 5, 6, 7, 8, 6}, QByteArray("-v x\0\0", 6)),
         SysBlock(4, 0x0103C6D9, Hex("2A000000"), {3, 5}, "prog!"),
         SysBlock(0, 0x01089D3C, {}, {1, 2, 3, 4, 5, 6, 7, 8, 9}),
-        SysBlock(0, 0x0108AC1E, {}, {1, 2, 3, 2, 9, 3, 7, 10, 11, 20, 21, 30, 31}, QByteArray("ab\0junk", 7)),
+        SysBlock(0, 0x0108AC1E, {}, {1, 2, 3, 2, 9, 1, 7, 10, 11, 20, 21, 30, 31}, QByteArray("a\0junk", 6)),
         SysBlock(0, 0x0108BFD2, {}, {12}), SysBlock(10, 0x01010100, "a::prog:x", {}),
         SysBlock(4, 0x01010100, "ab:c", {}), SysBlock(0, 0x010C02E5, {}, {1, 2, 3, 4}),
         // Override count of 4 billion, argument length of 4 GiB, key of 64 KiB, a cut keysize.
@@ -166,7 +166,7 @@ TEST(SysResource, DecodesEachKindOfRecordInsideItsBlock)
            {2, "Key=other|Arguments=-v x|main id=2"},
            {3, "Key=42|Program Name=prog!"},
            {4, "transport id=2|Privildedge Index=9"},
-           {5, "overrides=2|flags=7|override 1=11|override IIDs 0=20|override served 1=31|Arguments=ab"},
+           {5, "overrides=2|flags=7|override 1=11|override IIDs 0=20|override served 1=31|Arguments=a"},
            {6, "Privildedge Index=12"},
            {7, "Program Name=prog"},
            {8, "Key=1664770657|Program Name"}, // the four key bytes as a number

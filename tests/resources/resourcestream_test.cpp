@@ -109,6 +109,14 @@ TEST(ResourceStream, OnePairOfFiveBytesSavesAs53BytesAndDumpsAsWritten)
 
 // Equal blocks are stored once (the first one's index wins, an empty block
 // keeps an index of its own) and the offset table repeats its end.
+TEST(ResourceEntry, OrdersByTypeThenIdOrInModeOneByTheBlockAsText)
+{
+    const ResourceEntry a{0, 1, 9, "b"}, b{0, 2, 1, "a"}, c{0, 2, 3, "a"};
+    EXPECT_TRUE(a < b && b < c && !(c < b) && !(b < b));
+    const ResourceEntry x{1, 1, 9, "b"}, y{1, 2, 1, "a"}, z{1, 2, 3, "a"};
+    EXPECT_TRUE(y < x && !(x < y) && !(y < z));
+}
+
 TEST(ResourceStream, EqualBlocksAreStoredOnce)
 {
     ResourceStream stream;
