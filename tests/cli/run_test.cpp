@@ -333,6 +333,7 @@ TEST_F(DemoRun, SetUpFailuresAndBadFiltersAreRefusedBeforeAnythingRuns)
         {Args("run --json", missing), {}, {}, "cannot write --json"},
         {Args("run --copy-delay soon"), {}, {}, "--copy-delay"},
         {Args("modules --kit nowhere"), {}, {}, "harness modules: no test kit 'nowhere'"},
+        {Args("manifest --kit nowhere"), {}, {}, "harness manifest: no test kit 'nowhere'"},
         {Args("run IClock Nope"), {}, {}, "no module matches 'Nope'"},
         {Args("run --family media I*"), {}, {}, "no module matches 'I*' in family 'media'"},
         {Args("run --subfamily timer"), {}, {}, "--subfamily needs --family"},

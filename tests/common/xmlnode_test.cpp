@@ -36,6 +36,7 @@ const char *const kWellFormed[] = {
     "<r/>",
     "<?xml version=\"1.0\"?>\n<r a='1'/>",
     "<?xml version='1.0' encoding='utf-8' standalone='yes'?><r/>",
+    "<?xml version = '1.0' encoding =\n'utf-8'?><r/>",
     "\xEF\xBB\xBF<r>bom</r>",
     "<!-- before --><?pi before?>\n<r/>\n<!-- after -->",
     "<r>\n  <a/>\n  <b>text</b>\n</r>",
