@@ -239,6 +239,11 @@ TEST_F(DemoRun, AHandsetLostMidRunReportsErrorsNotAnEarlierRunsVerdicts)
     EXPECT_EQ(page.count("<tr class=\"module\""), 6);
     EXPECT_EQ(page.count("<span class=\"outcome notfinished\">not finished</span>"), 6);
     EXPECT_FALSE(QString::fromUtf8(page).contains(QRegularExpression(u"(src|href)=\"(https?:|//)"_s)));
+
+    // What the library only logs reaches the console with --verbose: here the start the lost handset refused.
+    WriteFile(ini, ReadFile(ini).replace("offlineAfter=12", "offlineAfter=5"));
+    ASSERT_TRUE(QFile::remove(handsets + u"/demo-phone/offline"_s));
+    ExpectContains(Tool("run --verbose IClock").err, {"CtfTestModule::Run error: IClock_k"});
 }
 
 TEST_F(DemoRun, AnInterruptedRunEndsTheModuleInHandAndReportsTheRest)
