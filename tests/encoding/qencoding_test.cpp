@@ -51,7 +51,8 @@ TEST_P(DetectFormat, FromLeadingMark)
     const Detection &d = GetParam();
     QEncoding *encoder = nullptr;
     CreateEncoder(ENCODING_UTF8, &encoder); // a held converter is released first
-    KestoEncodingFormat format = static_cast<KestoEncodingFormat>(12345);
+    // No format, yet a value the enumeration can hold: what a block without a mark leaves alone.
+    KestoEncodingFormat format = static_cast<KestoEncodingFormat>(1000);
     EXPECT_EQ(CreateEncoder(d.data, &encoder, format), d.result);
     EXPECT_EQ(format, d.format);
     EXPECT_EQ(encoder != nullptr, d.hasEncoder);
@@ -75,7 +76,7 @@ INSTANTIATE_TEST_SUITE_P(Marks, DetectFormat,
                                            Detection{Bytes({0xFB, 0xFE}), ENCODING_NONE, false, false},
                                            Detection{Bytes({0x41, 0x42}), ENCODING_NONE, false, false},
                                            // An empty block leaves the format as it was.
-                                           Detection{QByteArray(), KestoEncodingFormat(12345), false, false}));
+                                           Detection{QByteArray(), KestoEncodingFormat(1000), false, false}));
 
 // Each converter created for a format is the one detection picks for its mark (KSC5601, which shares CP949's mark,
 // decodes as CP949). There is no converter for Unicode, None or an unknown format.
